@@ -1,0 +1,52 @@
+# Shared settings for the project's own targets.
+
+if(KXL_SANITIZE)
+  add_compile_options(-fsanitize=address,undefined -fno-omit-frame-pointer -fno-sanitize-recover=undefined)
+  add_link_options(-fsanitize=address,undefined)
+endif()
+
+if(WIN32)
+  # One self-contained executable per program: no runtime DLLs to ship to Wine.
+  add_link_options(-static -static-libgcc -static-libstdc++)
+  set(KXL_WINDOWS ON)
+else()
+  set(KXL_WINDOWS OFF)
+endif()
+
+# kxl_warnings(target): the house warning level on our own code.
+function(kxl_warnings target)
+  target_compile_options(${target} PRIVATE -Wall -Wextra -Werror)
+endfunction()
+
+# Test framework: the system package natively; built from Debian's GoogleTest
+# sources for the cross build, which has no packaged libraries.
+if(KXL_BUILD_TESTS)
+  enable_testing()
+  if(WIN32)
+    set(gtest_disable_pthreads OFF CACHE BOOL "" FORCE)
+    set(INSTALL_GTEST OFF CACHE BOOL "" FORCE)
+    add_subdirectory(/usr/src/googletest ${CMAKE_BINARY_DIR}/googletest EXCLUDE_FROM_ALL)
+    if(NOT TARGET GTest::gtest_main)
+      add_library(GTest::gtest ALIAS gtest)
+      add_library(GTest::gtest_main ALIAS gtest_main)
+      add_library(GTest::gmock ALIAS gmock)
+    endif()
+  else()
+    find_package(GTest REQUIRED)
+  endif()
+  include(GoogleTest)
+endif()
+
+# kxl_add_gtest(name SOURCES ... LIBS ...): one test executable registered with CTest.
+# Cross-built tests run through CMAKE_CROSSCOMPILING_EMULATOR (Wine).
+function(kxl_add_gtest name)
+  cmake_parse_arguments(T "" "" "SOURCES;LIBS" ${ARGN})
+  add_executable(${name} ${T_SOURCES})
+  kxl_warnings(${name})
+  target_link_libraries(${name} PRIVATE ${T_LIBS} GTest::gtest_main)
+  if(WIN32)
+    add_test(NAME ${name} COMMAND ${name})
+  else()
+    gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120)
+  endif()
+endfunction()
