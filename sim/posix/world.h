@@ -1,0 +1,30 @@
+// The simulated machine on a POSIX host: where the world lives and how
+// Windows paths map onto it. Internal to sim/ (the command never includes it).
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace kxlsim::posix {
+
+// Host directory of the world: KXLSIM_ROOT when set, else the nearest directory
+// above the running executable that holds system.reg. Empty when there is none.
+const std::string &worldRoot();
+
+// Forgets the cached root (tests that switch KXLSIM_ROOT between worlds).
+void resetWorldRoot();
+
+// Prints one line on standard error and exits nonzero when no world is found.
+// Called by every Win32 entry point before it touches the world.
+void requireWorld();
+
+// Maps a Windows path ("C:\A\b", "\\SERVER\SHARE\x", relative to the current
+// directory, "/" accepted as "\") to its host path in the world. Each existing
+// component is matched ignoring case (the existing name wins); missing ones are
+// kept as written. Returns false for a path that cannot lie in the world.
+bool hostPath(std::string_view windowsPath, std::string &out);
+
+// The Windows path of a host path inside the world ("" when outside it).
+std::string windowsPath(std::string_view hostPath);
+
+} // namespace kxlsim::posix
