@@ -1,0 +1,323 @@
+// Where the world lives and how Windows paths map onto it.
+#include "sim/posix/world.h"
+
+#include <dirent.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <climits>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+#include <mutex>
+#include <strings.h>
+#include <vector>
+
+namespace kxlsim::posix {
+
+namespace {
+
+std::mutex rootMutex;
+std::string cachedRoot;
+bool rootKnown = false;
+
+bool isSep(char c) {
+  return c == '\\' || c == '/';
+}
+
+bool isFile(const std::string &path) {
+  struct stat st {};
+  return stat(path.c_str(), &st) == 0 && S_ISREG(st.st_mode);
+}
+
+bool isDirectory(const std::string &path) {
+  struct stat st {};
+  return stat(path.c_str(), &st) == 0 && S_ISDIR(st.st_mode);
+}
+
+std::string parentDirectory(const std::string &path) {
+  size_t slash = path.find_last_of('/');
+  if (slash == std::string::npos)
+    return "";
+  return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+std::string currentHostDirectory() {
+  char buffer[PATH_MAX];
+  if (getcwd(buffer, sizeof buffer) == nullptr)
+    return "";
+  return buffer;
+}
+
+// The program path as it was started (first word of the command line), made
+// absolute but not resolved, so a link placed inside a world counts there.
+std::string startedProgramPath() {
+  std::ifstream in("/proc/self/cmdline", std::ios::binary);
+  std::string argv0;
+  std::getline(in, argv0, '\0');
+  if (argv0.find('/') == std::string::npos)
+    return "";
+  if (argv0[0] == '/')
+    return argv0;
+  return currentHostDirectory() + "/" + argv0;
+}
+
+std::string resolvedProgramPath() {
+  char buffer[PATH_MAX];
+  ssize_t n = readlink("/proc/self/exe", buffer, sizeof buffer - 1);
+  if (n <= 0)
+    return "";
+  buffer[n] = '\0';
+  return buffer;
+}
+
+// Nearest directory at or above `start` that holds system.reg.
+std::string worldAbove(std::string dir) {
+  while (!dir.empty()) {
+    std::string base = dir == "/" ? "" : dir;
+    if (isFile(base + "/system.reg"))
+      return dir;
+    if (dir == "/")
+      break;
+    dir = parentDirectory(dir);
+  }
+  return "";
+}
+
+std::string stripTrailingSlashes(std::string path) {
+  while (path.size() > 1 && path.back() == '/')
+    path.pop_back();
+  return path;
+}
+
+std::string findRoot() {
+  if (const char *env = std::getenv("KXLSIM_ROOT"); env != nullptr && env[0] != '\0')
+    return stripTrailingSlashes(env);
+  for (const std::string &program : {startedProgramPath(), resolvedProgramPath()}) {
+    if (program.empty())
+      continue;
+    std::string found = worldAbove(parentDirectory(program));
+    if (!found.empty())
+      return found;
+  }
+  return "";
+}
+
+// Characters Windows refuses in a file name (the drive colon is handled apart).
+bool isInvalidNameChar(unsigned char c) {
+  return c < 32 || c == '"' || c == '<' || c == '>' || c == '|' || c == ':';
+}
+
+// Windows drops trailing dots and spaces from a name ("a." is "a").
+std::string trimNameEnd(std::string name) {
+  if (name == "." || name == "..")
+    return name;
+  while (!name.empty() && (name.back() == '.' || name.back() == ' '))
+    name.pop_back();
+  return name;
+}
+
+// An absolute Windows path taken apart: "X:" or "\\SERVER\SHARE" and the rest.
+struct SplitPath {
+  char drive = 0; // 0 for a UNC path
+  std::vector<std::string> parts;
+};
+
+// Appends the components of `text`, applying "." and ".." but never climbing
+// above the first `floor` components (the server and share of a UNC path).
+bool appendComponents(std::string_view text, size_t floor, SplitPath &out) {
+  size_t i = 0;
+  while (i <= text.size()) {
+    size_t end = i;
+    while (end < text.size() && !isSep(text[end]))
+      ++end;
+    std::string name = trimNameEnd(std::string(text.substr(i, end - i)));
+    if (name == "..") {
+      if (out.parts.size() > floor)
+        out.parts.pop_back();
+    } else if (!name.empty() && name != ".") {
+      for (unsigned char c : name)
+        if (isInvalidNameChar(c))
+          return false;
+      out.parts.push_back(std::move(name));
+    }
+    i = end + 1;
+  }
+  return true;
+}
+
+bool hasDrive(std::string_view p) {
+  return p.size() >= 2 && p[1] == ':' && ((p[0] >= 'A' && p[0] <= 'Z') || (p[0] >= 'a' && p[0] <= 'z'));
+}
+
+char upperDrive(char c) {
+  return c >= 'a' && c <= 'z' ? static_cast<char>(c - 'a' + 'A') : c;
+}
+
+// The current directory as a Windows path: "C:\" when it lies outside the world.
+std::string currentWindowsDirectory() {
+  std::string current = windowsPath(currentHostDirectory());
+  return current.empty() ? "C:\\" : current;
+}
+
+// Turns any accepted form into an absolute Windows path.
+std::string absoluteWindowsPath(std::string_view p) {
+  if (p.size() >= 2 && isSep(p[0]) && isSep(p[1]))
+    return std::string(p);
+  std::string current = currentWindowsDirectory();
+  if (hasDrive(p)) {
+    if (p.size() > 2 && isSep(p[2]))
+      return std::string(p);
+    // "X:name" is relative to the current directory when that is on drive X.
+    if (upperDrive(p[0]) == upperDrive(current[0]) && current[1] == ':')
+      return current + "\\" + std::string(p.substr(2));
+    return std::string(1, p[0]) + ":\\" + std::string(p.substr(2));
+  }
+  if (!p.empty() && isSep(p[0])) {
+    if (current[1] == ':')
+      return current.substr(0, 2) + std::string(p);
+    // Current directory on a share: the root is the share itself.
+    SplitPath share;
+    appendComponents(std::string_view(current).substr(2), 2, share);
+    if (share.parts.size() < 2)
+      return "";
+    return "\\\\" + share.parts[0] + "\\" + share.parts[1] + std::string(p);
+  }
+  return current + "\\" + std::string(p);
+}
+
+bool splitWindowsPath(std::string_view absolute, SplitPath &out) {
+  if (hasDrive(absolute)) {
+    out.drive = upperDrive(absolute[0]);
+    return appendComponents(absolute.substr(2), 0, out);
+  }
+  if (!appendComponents(absolute.substr(2), 2, out) || out.parts.size() < 2)
+    return false;
+  // Device and long-path prefixes ("\\?\", "\\.\") do not name a share.
+  return out.parts[0] != "?" && out.parts[0] != ".";
+}
+
+// The existing entry of `dir` that equals `name` ignoring case; the exact name
+// wins, then the smallest one so the choice does not depend on listing order.
+bool matchEntry(const std::string &dir, const std::string &name, std::string &found) {
+  struct stat st {};
+  if (lstat((dir + "/" + name).c_str(), &st) == 0) {
+    found = name;
+    return true;
+  }
+  DIR *d = opendir(dir.c_str());
+  if (d == nullptr)
+    return false;
+  bool any = false;
+  while (const dirent *entry = readdir(d)) {
+    if (strcasecmp(entry->d_name, name.c_str()) == 0 && (!any || found > entry->d_name)) {
+      found = entry->d_name;
+      any = true;
+    }
+  }
+  closedir(d);
+  return any;
+}
+
+std::string joinMatched(std::string base, const std::vector<std::string> &parts) {
+  bool matching = isDirectory(base);
+  for (const std::string &part : parts) {
+    std::string found;
+    if (matching && matchEntry(base, part, found)) {
+      base += "/" + found;
+      matching = isDirectory(base);
+    } else {
+      base += "/" + part;
+      matching = false;
+    }
+  }
+  return base;
+}
+
+// Strips `root` + "/" from the front of `host`; false when `host` is not below it.
+bool relativeTo(const std::string &root, const std::string &host, std::string &rest) {
+  if (root.empty() || host.size() <= root.size() || host.compare(0, root.size(), root) != 0 ||
+      host[root.size()] != '/')
+    return false;
+  rest = host.substr(root.size() + 1);
+  return true;
+}
+
+std::string canonicalRoot() {
+  char buffer[PATH_MAX];
+  if (realpath(worldRoot().c_str(), buffer) == nullptr)
+    return worldRoot();
+  return buffer;
+}
+
+std::string backslashed(std::string text) {
+  for (char &c : text)
+    if (c == '/')
+      c = '\\';
+  return text;
+}
+
+} // namespace
+
+const std::string &worldRoot() {
+  std::lock_guard<std::mutex> lock(rootMutex);
+  if (!rootKnown) {
+    cachedRoot = findRoot();
+    rootKnown = true;
+  }
+  return cachedRoot;
+}
+
+void resetWorldRoot() {
+  std::lock_guard<std::mutex> lock(rootMutex);
+  rootKnown = false;
+  cachedRoot.clear();
+}
+
+void requireWorld() {
+  if (!worldRoot().empty())
+    return;
+  std::fputs("kxlsim: no world found: set KXLSIM_ROOT or run from inside a world\n", stderr);
+  std::exit(3);
+}
+
+bool hostPath(std::string_view windowsPathText, std::string &out) {
+  if (windowsPathText.empty() || worldRoot().empty() || windowsPathText.find('\0') != std::string_view::npos)
+    return false;
+  std::string absolute = absoluteWindowsPath(windowsPathText);
+  SplitPath split;
+  if (absolute.empty() || !splitWindowsPath(absolute, split))
+    return false;
+  std::string base = worldRoot();
+  if (split.drive != 0)
+    base += std::string("/drive_") + static_cast<char>(split.drive - 'A' + 'a');
+  else
+    base += "/unc";
+  out = joinMatched(base, split.parts);
+  return true;
+}
+
+std::string windowsPath(std::string_view hostPathText) {
+  std::string host = stripTrailingSlashes(std::string(hostPathText));
+  std::string rest;
+  if (!relativeTo(worldRoot(), host, rest) && !relativeTo(canonicalRoot(), host, rest))
+    return "";
+  if (rest.size() >= 7 && rest.compare(0, 6, "drive_") == 0 && (rest.size() == 7 || rest[7] == '/')) {
+    char letter = rest[6];
+    if (letter < 'a' || letter > 'z')
+      return "";
+    std::string tail = rest.size() > 8 ? rest.substr(8) : "";
+    return std::string(1, upperDrive(letter)) + ":\\" + backslashed(tail);
+  }
+  if (rest.compare(0, 4, "unc/") == 0) {
+    std::string tail = rest.substr(4);
+    size_t slash = tail.find('/');
+    if (slash == std::string::npos || slash == 0 || slash + 1 >= tail.size())
+      return "";
+    return "\\\\" + backslashed(tail);
+  }
+  return "";
+}
+
+} // namespace kxlsim::posix
