@@ -1,0 +1,553 @@
+// REGEDIT4 hive files: text form, parsing, locking and atomic write-through.
+#include "sim/posix/regfile.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <utility>
+
+namespace kxlsim::posix::reg {
+
+std::string fold(std::string_view name) {
+  std::string folded(name);
+  for (char &c : folded)
+    if (c >= 'A' && c <= 'Z')
+      c = static_cast<char>(c - 'A' + 'a');
+  return folded;
+}
+
+Key *findKey(Key &root, const KeyPath &path) {
+  Key *key = &root;
+  for (const std::string &name : path) {
+    auto it = key->subkeys.find(fold(name));
+    if (it == key->subkeys.end())
+      return nullptr;
+    key = &it->second;
+  }
+  return key;
+}
+
+const Key *findKey(const Key &root, const KeyPath &path) {
+  return findKey(const_cast<Key &>(root), path);
+}
+
+Key &createKey(Key &root, const KeyPath &path, bool &created) {
+  Key *key = &root;
+  created = false;
+  for (const std::string &name : path) {
+    auto [it, inserted] = key->subkeys.try_emplace(fold(name));
+    if (inserted)
+      it->second.name = name;
+    created = inserted;
+    key = &it->second;
+  }
+  return *key;
+}
+
+void setValue(Key &key, std::string_view name, DWORD type, std::vector<BYTE> data) {
+  auto [it, inserted] = key.values.try_emplace(fold(name));
+  if (inserted)
+    it->second.name = std::string(name);
+  it->second.type = type;
+  it->second.data = std::move(data);
+}
+
+void mergeKey(Key &target, const Key &source) {
+  for (const auto &[folded, value] : source.values)
+    setValue(target, value.name, value.type, value.data);
+  for (const auto &[folded, child] : source.subkeys) {
+    auto [it, inserted] = target.subkeys.try_emplace(folded);
+    if (inserted)
+      it->second.name = child.name;
+    mergeKey(it->second, child);
+  }
+}
+
+// ---------------------------------------------------------------- writing
+
+namespace {
+
+constexpr size_t kHexWrapColumn = 76;
+
+std::string quoted(std::string_view text) {
+  std::string out = "\"";
+  for (char c : text) {
+    if (c == '\\' || c == '"')
+      out += '\\';
+    out += c;
+  }
+  return out + "\"";
+}
+
+// A REG_SZ is written as text only when reading it back gives the same bytes:
+// one terminating NUL, no other NUL and no line breaks.
+bool isPlainText(const Value &value) {
+  const auto &d = value.data;
+  if (value.type != REG_SZ || d.empty() || d.back() != 0)
+    return false;
+  for (size_t i = 0; i + 1 < d.size(); ++i)
+    if (d[i] == 0 || d[i] == '\n' || d[i] == '\r')
+      return false;
+  return true;
+}
+
+std::string hexData(const std::string &prefix, DWORD type, const std::vector<BYTE> &data) {
+  char spec[24];
+  if (type == REG_BINARY)
+    std::snprintf(spec, sizeof spec, "hex:");
+  else
+    std::snprintf(spec, sizeof spec, "hex(%x):", static_cast<unsigned>(type));
+  std::string out = spec;
+  size_t column = prefix.size() + out.size();
+  for (size_t i = 0; i < data.size(); ++i) {
+    if (i > 0) {
+      out += ',';
+      ++column;
+      if (column >= kHexWrapColumn) {
+        out += "\\\n  ";
+        column = 2;
+      }
+    }
+    char byte[4];
+    std::snprintf(byte, sizeof byte, "%02x", data[i]);
+    out += byte;
+    column += 2;
+  }
+  return out;
+}
+
+std::string valueLine(const Value &value) {
+  std::string line = value.name.empty() ? "@=" : quoted(value.name) + "=";
+  if (isPlainText(value)) {
+    const char *text = reinterpret_cast<const char *>(value.data.data());
+    return line + quoted(std::string_view(text, value.data.size() - 1));
+  }
+  if (value.type == REG_DWORD && value.data.size() == 4) {
+    const auto &d = value.data;
+    unsigned number = d[0] | (d[1] << 8) | (d[2] << 16) | (static_cast<unsigned>(d[3]) << 24);
+    char text[24];
+    std::snprintf(text, sizeof text, "dword:%08x", number);
+    return line + text;
+  }
+  return line + hexData(line, value.type, value.data);
+}
+
+void formatKey(const Key &key, const std::string &path, bool isRoot, std::string &out) {
+  if (!isRoot || !key.values.empty()) {
+    out += "[" + path + "]\n";
+    for (const auto &[folded, value] : key.values)
+      out += valueLine(value) + "\n";
+    out += "\n";
+  }
+  for (const auto &[folded, child] : key.subkeys)
+    formatKey(child, path + "\\" + child.name, false, out);
+}
+
+} // namespace
+
+std::string formatHive(const Key &root, const std::string &rootName) {
+  std::string out = "REGEDIT4\n\n";
+  formatKey(root, rootName, true, out);
+  return out;
+}
+
+// ---------------------------------------------------------------- parsing
+
+namespace {
+
+std::string_view trimmed(std::string_view s) {
+  size_t b = s.find_first_not_of(" \t");
+  if (b == std::string_view::npos)
+    return {};
+  size_t e = s.find_last_not_of(" \t");
+  return s.substr(b, e - b + 1);
+}
+
+class LineReader {
+public:
+  explicit LineReader(std::string_view text) : text_(text) {}
+  bool next(std::string_view &line) {
+    if (pos_ >= text_.size())
+      return false;
+    size_t end = text_.find('\n', pos_);
+    if (end == std::string_view::npos)
+      end = text_.size();
+    line = text_.substr(pos_, end - pos_);
+    if (!line.empty() && line.back() == '\r')
+      line.remove_suffix(1);
+    pos_ = end + 1;
+    ++number_;
+    return true;
+  }
+  size_t number() const { return number_; }
+
+private:
+  std::string_view text_;
+  size_t pos_ = 0;
+  size_t number_ = 0;
+};
+
+// Reads a quoted string starting at text[pos] == '"'; returns the position
+// after the closing quote, or npos when it is not closed.
+size_t readQuoted(std::string_view text, size_t pos, std::string &out) {
+  out.clear();
+  for (size_t i = pos + 1; i < text.size(); ++i) {
+    char c = text[i];
+    if (c == '"')
+      return i + 1;
+    if (c == '\\' && i + 1 < text.size() && (text[i + 1] == '\\' || text[i + 1] == '"'))
+      c = text[++i];
+    out += c;
+  }
+  return std::string_view::npos;
+}
+
+int hexDigit(char c) {
+  if (c >= '0' && c <= '9')
+    return c - '0';
+  if (c >= 'a' && c <= 'f')
+    return c - 'a' + 10;
+  if (c >= 'A' && c <= 'F')
+    return c - 'A' + 10;
+  return -1;
+}
+
+bool parseHexNumber(std::string_view text, size_t maxDigits, unsigned long &out) {
+  if (text.empty() || text.size() > maxDigits)
+    return false;
+  out = 0;
+  for (char c : text) {
+    int d = hexDigit(c);
+    if (d < 0)
+      return false;
+    out = out * 16 + static_cast<unsigned long>(d);
+  }
+  return true;
+}
+
+bool parseHexBytes(std::string_view list, std::vector<BYTE> &out) {
+  list = trimmed(list);
+  while (!list.empty()) {
+    size_t comma = list.find(',');
+    std::string_view item = trimmed(list.substr(0, comma));
+    unsigned long byte = 0;
+    if (!parseHexNumber(item, 2, byte))
+      return false;
+    out.push_back(static_cast<BYTE>(byte));
+    if (comma == std::string_view::npos)
+      break;
+    list = list.substr(comma + 1);
+    if (trimmed(list).empty())
+      return false;
+  }
+  return true;
+}
+
+// `spec` is what follows "=" on a value line (continuations already joined).
+bool parseData(std::string_view spec, Value &value) {
+  if (!spec.empty() && spec[0] == '"') {
+    std::string text;
+    size_t end = readQuoted(spec, 0, text);
+    if (end == std::string_view::npos || !trimmed(spec.substr(end)).empty())
+      return false;
+    value.type = REG_SZ;
+    value.data.assign(text.begin(), text.end());
+    value.data.push_back(0);
+    return true;
+  }
+  if (spec.substr(0, 6) == "dword:") {
+    unsigned long number = 0;
+    if (!parseHexNumber(trimmed(spec.substr(6)), 8, number))
+      return false;
+    value.type = REG_DWORD;
+    value.data = {static_cast<BYTE>(number), static_cast<BYTE>(number >> 8), static_cast<BYTE>(number >> 16),
+                  static_cast<BYTE>(number >> 24)};
+    return true;
+  }
+  size_t colon = spec.find(':');
+  if (colon == std::string_view::npos)
+    return false;
+  std::string_view kind = spec.substr(0, colon);
+  unsigned long type = REG_BINARY;
+  if (kind != "hex") {
+    if (kind.size() < 6 || kind.substr(0, 4) != "hex(" || kind.back() != ')' ||
+        !parseHexNumber(kind.substr(4, kind.size() - 5), 8, type))
+      return false;
+  }
+  value.type = static_cast<DWORD>(type);
+  return parseHexBytes(spec.substr(colon + 1), value.data);
+}
+
+// Joins the continuation lines of a hex value ("...,\" then "  ...").
+bool joinContinuations(LineReader &lines, std::string &logical) {
+  while (true) {
+    std::string_view end = trimmed(logical);
+    if (end.empty() || end.back() != '\\')
+      return true;
+    logical.resize(static_cast<size_t>(end.data() - logical.data()) + end.size() - 1);
+    std::string_view next;
+    if (!lines.next(next))
+      return false;
+    logical += trimmed(next);
+  }
+}
+
+bool parseValueLine(std::string_view line, LineReader &lines, Key &key) {
+  Value value;
+  size_t pos = 0;
+  if (line[0] == '@') {
+    pos = 1;
+  } else {
+    pos = readQuoted(line, 0, value.name);
+    if (pos == std::string_view::npos)
+      return false;
+  }
+  if (pos >= line.size() || line[pos] != '=')
+    return false;
+  std::string spec(trimmed(line.substr(pos + 1)));
+  if (spec.compare(0, 3, "hex") == 0 && !joinContinuations(lines, spec))
+    return false;
+  if (!parseData(spec, value))
+    return false;
+  setValue(key, value.name, value.type, std::move(value.data));
+  return true;
+}
+
+bool parseSection(std::string_view line, const std::string &rootName, Key &root, Key *&current) {
+  if (line.size() < 3 || line.back() != ']' || line[1] == '-')
+    return false;
+  std::string_view path = line.substr(1, line.size() - 2);
+  KeyPath names;
+  size_t start = 0;
+  while (start <= path.size()) {
+    size_t sep = path.find('\\', start);
+    if (sep == std::string_view::npos)
+      sep = path.size();
+    names.emplace_back(path.substr(start, sep - start));
+    if (names.back().empty())
+      return false;
+    start = sep + 1;
+  }
+  if (fold(names.front()) != fold(rootName))
+    return false;
+  names.erase(names.begin());
+  bool created = false;
+  current = &createKey(root, names, created);
+  return true;
+}
+
+} // namespace
+
+bool parseHive(std::string_view text, const std::string &rootName, Key &out, std::string &error) {
+  out = Key{};
+  LineReader lines(text);
+  std::string_view line;
+  bool header = false;
+  Key *current = nullptr;
+  while (lines.next(line)) {
+    line = trimmed(line);
+    if (line.empty() || line[0] == ';')
+      continue;
+    bool ok = false;
+    if (!header)
+      ok = header = line == "REGEDIT4";
+    else if (line[0] == '[')
+      ok = parseSection(line, rootName, out, current);
+    else if (current != nullptr && (line[0] == '"' || line[0] == '@'))
+      ok = parseValueLine(line, lines, *current);
+    if (!ok) {
+      error = "line " + std::to_string(lines.number()) + ": " + std::string(line.substr(0, 80));
+      return false;
+    }
+  }
+  if (!header && !text.empty()) {
+    error = "no REGEDIT4 header";
+    return false;
+  }
+  return true;
+}
+
+// ---------------------------------------------------------------- the file
+
+namespace {
+
+// flock on the folder holding the hives: one lock serves both hives of a world
+// and leaves no lock file behind in it.
+class FolderLock {
+public:
+  FolderLock(const std::string &file, int operation) {
+    size_t slash = file.find_last_of('/');
+    std::string dir = slash == std::string::npos ? "." : (slash == 0 ? "/" : file.substr(0, slash));
+    fd_ = open(dir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (fd_ < 0)
+      return;
+    int rc;
+    do
+      rc = flock(fd_, operation);
+    while (rc != 0 && errno == EINTR);
+    if (rc != 0) {
+      close(fd_);
+      fd_ = -1;
+    }
+  }
+  ~FolderLock() {
+    if (fd_ >= 0)
+      close(fd_); // releases the lock
+  }
+  FolderLock(const FolderLock &) = delete;
+  FolderLock &operator=(const FolderLock &) = delete;
+  bool held() const { return fd_ >= 0; }
+
+private:
+  int fd_ = -1;
+};
+
+long long mtimeOf(const struct stat &st) {
+  return static_cast<long long>(st.st_mtim.tv_sec) * 1000000000LL + st.st_mtim.tv_nsec;
+}
+
+bool readAll(int fd, std::string &out) {
+  out.clear();
+  char buffer[65536];
+  while (true) {
+    ssize_t n = ::read(fd, buffer, sizeof buffer);
+    if (n < 0 && errno == EINTR)
+      continue;
+    if (n < 0)
+      return false;
+    if (n == 0)
+      return true;
+    out.append(buffer, static_cast<size_t>(n));
+  }
+}
+
+bool writeAll(int fd, const std::string &text) {
+  size_t done = 0;
+  while (done < text.size()) {
+    ssize_t n = ::write(fd, text.data() + done, text.size() - done);
+    if (n < 0 && errno == EINTR)
+      continue;
+    if (n <= 0)
+      return false;
+    done += static_cast<size_t>(n);
+  }
+  return true;
+}
+
+bool sameFile(int heldFd, const struct stat &now, long long size, long long mtimeNs) {
+  struct stat held {};
+  return heldFd >= 0 && fstat(heldFd, &held) == 0 && held.st_dev == now.st_dev && held.st_ino == now.st_ino &&
+         now.st_size == size && mtimeOf(now) == mtimeNs;
+}
+
+} // namespace
+
+HiveFile::HiveFile(std::string path, std::string rootName)
+    : path_(std::move(path)), rootName_(std::move(rootName)) {}
+
+HiveFile::~HiveFile() {
+  forget();
+}
+
+void HiveFile::forget() {
+  if (heldFd_ >= 0)
+    close(heldFd_);
+  heldFd_ = -1;
+  loaded_ = false;
+  tree_ = Key{};
+  size_ = -1;
+  mtimeNs_ = 0;
+}
+
+// Brings tree_ up to the file's current content (caller holds the lock).
+bool HiveFile::refresh() {
+  int fd = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
+  if (fd < 0) {
+    if (errno != ENOENT)
+      return false;
+    forget(); // no file yet: an empty hive
+    loaded_ = true;
+    return true;
+  }
+  struct stat st {};
+  if (fstat(fd, &st) != 0) {
+    close(fd);
+    return false;
+  }
+  if (loaded_ && sameFile(heldFd_, st, size_, mtimeNs_)) {
+    close(fd);
+    return true;
+  }
+  std::string text, error;
+  Key tree;
+  if (!readAll(fd, text) || !parseHive(text, rootName_, tree, error)) {
+    close(fd);
+    forget();
+    return false;
+  }
+  forget();
+  tree_ = std::move(tree);
+  heldFd_ = fd;
+  size_ = st.st_size;
+  mtimeNs_ = mtimeOf(st);
+  loaded_ = true;
+  return true;
+}
+
+// Writes tree_ through (caller holds the exclusive lock). A leftover temporary
+// file of a killed writer is simply overwritten by the next one.
+bool HiveFile::writeThrough() {
+  std::string temporary = path_ + ".tmp";
+  int fd = open(temporary.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
+  if (fd < 0)
+    return false;
+  bool ok = writeAll(fd, formatHive(tree_, rootName_));
+  ok = close(fd) == 0 && ok;
+  if (!ok || rename(temporary.c_str(), path_.c_str()) != 0) {
+    unlink(temporary.c_str());
+    return false;
+  }
+  // Hold the new file so the next operation sees it as current without re-reading it.
+  int held = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
+  struct stat st {};
+  if (held < 0 || fstat(held, &st) != 0) {
+    if (held >= 0)
+      close(held);
+    forget();
+    return true; // written; the next operation reads it back
+  }
+  if (heldFd_ >= 0)
+    close(heldFd_);
+  heldFd_ = held;
+  size_ = st.st_size;
+  mtimeNs_ = mtimeOf(st);
+  return true;
+}
+
+LONG HiveFile::read(const std::function<LONG(const Key &)> &reader) {
+  FolderLock lock(path_, LOCK_SH);
+  if (!lock.held() || !refresh())
+    return ERROR_CANTREAD;
+  return reader(tree_);
+}
+
+LONG HiveFile::update(const std::function<LONG(Key &, bool &changed)> &writer) {
+  FolderLock lock(path_, LOCK_EX);
+  if (!lock.held() || !refresh())
+    return ERROR_CANTREAD;
+  bool changed = false;
+  LONG rc = writer(tree_, changed);
+  if (!changed)
+    return rc;
+  if (rc != ERROR_SUCCESS || !writeThrough()) {
+    forget(); // the tree no longer matches the file: re-read next time
+    return rc != ERROR_SUCCESS ? rc : ERROR_CANTWRITE;
+  }
+  return ERROR_SUCCESS;
+}
+
+} // namespace kxlsim::posix::reg
