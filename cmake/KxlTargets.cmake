@@ -46,6 +46,8 @@ function(kxl_add_gtest name)
   target_link_libraries(${name} PRIVATE ${T_LIBS} GTest::gtest_main)
   if(WIN32)
     add_test(NAME ${name} COMMAND ${name})
+    # One Wine prefix per build directory, so builds do not share a machine.
+    set_tests_properties(${name} PROPERTIES ENVIRONMENT "KXL_WINEPREFIX=${CMAKE_BINARY_DIR}/wineprefix")
   else()
     gtest_discover_tests(${name} DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 120)
   endif()

@@ -1,0 +1,265 @@
+// Files, folders and the C run time's file helpers, as Windows has them.
+#include "conformance.h"
+
+#include <cctype>
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <set>
+#include <string>
+
+namespace kxltest {
+namespace {
+
+using std::string;
+
+// Names an enumeration finds, with the last error that ended it.
+struct Found {
+  std::set<string> names;
+  std::set<string> folders;
+  DWORD end = 0;
+};
+
+Found findAll(const string &pattern) {
+  Found out;
+  WIN32_FIND_DATAA entry;
+  HANDLE find = FindFirstFileA(pattern.c_str(), &entry);
+  if (find == INVALID_HANDLE_VALUE) {
+    out.end = GetLastError();
+    return out;
+  }
+  do {
+    out.names.insert(entry.cFileName);
+    if (entry.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY)
+      out.folders.insert(entry.cFileName);
+  } while (FindNextFileA(find, &entry));
+  out.end = GetLastError();
+  EXPECT_TRUE(FindClose(find));
+  return out;
+}
+
+HANDLE createWith(const string &path, DWORD access, DWORD disposition) {
+  return CreateFileA(path.c_str(), access, FILE_SHARE_READ, nullptr, disposition, FILE_ATTRIBUTE_NORMAL,
+                     nullptr);
+}
+
+// --- Attributes and folders ----------------------------------------------
+
+TEST_F(FilesTest, AttributesOfAFolderAreExactlyTheDirectoryBit) {
+  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY), GetFileAttributesA(dir_.c_str()));
+  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY), GetFileAttributesA((dir_ + "\\").c_str()));
+  // Names are matched ignoring case.
+  string upper = dir_;
+  for (char &c : upper)
+    c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
+  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY), GetFileAttributesA(upper.c_str()));
+}
+
+TEST_F(FilesTest, AttributesOfANewFileMarkItForArchiving) {
+  ASSERT_TRUE(writeFile(at("plain.txt"), "x"));
+  DWORD attributes = GetFileAttributesA(at("plain.txt").c_str());
+  ASSERT_NE(INVALID_FILE_ATTRIBUTES, attributes);
+  EXPECT_EQ(0u, attributes & FILE_ATTRIBUTE_DIRECTORY);
+  EXPECT_NE(0u, attributes & FILE_ATTRIBUTE_ARCHIVE);
+}
+
+TEST_F(FilesTest, AttributesOfMissingPathsTellFileFromPath) {
+  SetLastError(0);
+  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(at("missing.txt").c_str()));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
+  SetLastError(0);
+  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(at("nofolder\\missing.txt").c_str()));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), GetLastError());
+}
+
+TEST_F(FilesTest, CreateDirectoryFailsOnExistingAndMissingParent) {
+  SetLastError(0);
+  EXPECT_FALSE(CreateDirectoryA(dir_.c_str(), nullptr));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
+  ASSERT_TRUE(writeFile(at("file"), "x"));
+  SetLastError(0);
+  EXPECT_FALSE(CreateDirectoryA(at("file").c_str(), nullptr));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
+  SetLastError(0);
+  EXPECT_FALSE(CreateDirectoryA(at("missing\\child").c_str(), nullptr));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), GetLastError());
+  EXPECT_TRUE(CreateDirectoryA(at("child").c_str(), nullptr));
+}
+
+// --- Finding files -------------------------------------------------------
+
+TEST_F(FilesTest, FindGivesTheStoredNameWhenAskedInAnotherCase) {
+  ASSERT_TRUE(writeFile(at("MixedName.Txt"), "12345"));
+  WIN32_FIND_DATAA entry;
+  HANDLE find = FindFirstFileA(at("MIXEDNAME.TXT").c_str(), &entry);
+  ASSERT_NE(INVALID_HANDLE_VALUE, find);
+  EXPECT_STREQ("MixedName.Txt", entry.cFileName);
+  EXPECT_EQ(5u, entry.nFileSizeLow);
+  EXPECT_EQ(0u, entry.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY);
+  SetLastError(0);
+  EXPECT_FALSE(FindNextFileA(find, &entry));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), GetLastError());
+  EXPECT_TRUE(FindClose(find));
+}
+
+TEST_F(FilesTest, WildcardsMatchIgnoringCaseAndListFolders) {
+  for (const char *name : {"a.txt", "b.TXT", "c.log"})
+    ASSERT_TRUE(writeFile(at(name), name));
+  ASSERT_TRUE(CreateDirectoryA(at("sub").c_str(), nullptr));
+
+  Found texts = findAll(at("*.txt"));
+  EXPECT_EQ((std::set<string>{"a.txt", "b.TXT"}), texts.names);
+  EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), texts.end);
+
+  // A folder other than a drive's root lists itself and its parent too.
+  Found all = findAll(at("*"));
+  EXPECT_EQ((std::set<string>{".", "..", "a.txt", "b.TXT", "c.log", "sub"}), all.names);
+  EXPECT_EQ((std::set<string>{".", "..", "sub"}), all.folders);
+}
+
+TEST_F(FilesTest, FindWithoutMatchTellsFileFromPath) {
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), findAll(at("*.none")).end);
+  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), findAll(at("nofolder\\*")).end);
+}
+
+// --- Current and temporary folders ---------------------------------------
+
+TEST_F(FilesTest, CurrentDirectoryReportsTheNeededSizeWhenTooSmall) {
+  DWORD needed = GetCurrentDirectoryA(0, nullptr);
+  ASSERT_GT(needed, 1u);
+  char buffer[MAX_PATH];
+  ASSERT_LE(needed, sizeof buffer);
+  EXPECT_EQ(needed - 1, GetCurrentDirectoryA(needed, buffer));
+  EXPECT_EQ(needed - 1, std::strlen(buffer));
+  EXPECT_EQ(needed, GetCurrentDirectoryA(needed - 1, buffer));
+
+  ASSERT_TRUE(SetCurrentDirectoryA(dir_.c_str()));
+  ASSERT_EQ(dir_.size(), GetCurrentDirectoryA(sizeof buffer, buffer));
+  EXPECT_EQ(dir_, string(buffer));
+  // Relative names resolve against it.
+  ASSERT_TRUE(writeFile("relative.txt", "r"));
+  EXPECT_EQ("r", readFile(at("relative.txt")));
+}
+
+TEST_F(FilesTest, TempPathEndsWithABackslashAndReportsTheNeededSize) {
+  DWORD needed = GetTempPathA(0, nullptr);
+  ASSERT_GT(needed, 1u);
+  char buffer[MAX_PATH];
+  ASSERT_LE(needed, sizeof buffer);
+  ASSERT_EQ(needed - 1, GetTempPathA(needed, buffer));
+  EXPECT_EQ(needed - 1, std::strlen(buffer));
+  EXPECT_EQ('\\', buffer[needed - 2]);
+  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY),
+            GetFileAttributesA(buffer) & FILE_ATTRIBUTE_DIRECTORY);
+  char small[MAX_PATH];
+  EXPECT_EQ(needed, GetTempPathA(needed - 1, small));
+}
+
+// The run time puts names in the folder named by TMP when that is set, so the
+// folder asked for here is the temporary folder itself.
+TEST_F(FilesTest, TempnamGivesFreshNamesWithThePrefix) {
+  char temp[MAX_PATH];
+  ASSERT_GT(GetTempPathA(sizeof temp, temp), 0u);
+  string folder(temp);
+  folder.pop_back(); // the trailing backslash
+  char *first = _tempnam(folder.c_str(), "kxl");
+  char *second = _tempnam(folder.c_str(), "kxl");
+  ASSERT_NE(nullptr, first);
+  ASSERT_NE(nullptr, second);
+  string a(first), b(second);
+  std::free(first);
+  std::free(second);
+  string expected = folder + "\\kxl";
+  EXPECT_TRUE(sameIgnoringCase(expected, a.substr(0, expected.size()))) << a;
+  EXPECT_EQ(string::npos, a.find('\\', expected.size())) << a;
+  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(a.c_str()));
+  if (runningUnderWine() && a == b)
+    GTEST_SKIP() << "Wine derives the name from the clock and frees it at once: two quick calls may match";
+  EXPECT_NE(a, b);
+}
+
+TEST_F(FilesTest, AccessTellsExistingFromMissing) {
+  ASSERT_TRUE(writeFile(at("present.txt"), "x"));
+  EXPECT_EQ(0, _access(at("present.txt").c_str(), 0));
+  EXPECT_EQ(0, _access(at("present.txt").c_str(), 2));
+  EXPECT_EQ(0, _access(dir_.c_str(), 0));
+  errno = 0;
+  EXPECT_EQ(-1, _access(at("missing.txt").c_str(), 0));
+  EXPECT_EQ(ENOENT, errno);
+}
+
+// --- Copying and creating files ------------------------------------------
+
+TEST_F(FilesTest, CopyFileHonoursFailIfExists) {
+  ASSERT_TRUE(writeFile(at("source"), "first"));
+  ASSERT_TRUE(writeFile(at("target"), "second"));
+  SetLastError(0);
+  EXPECT_FALSE(CopyFileA(at("source").c_str(), at("target").c_str(), TRUE));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_EXISTS), GetLastError());
+  EXPECT_EQ("second", readFile(at("target")));
+  EXPECT_TRUE(CopyFileA(at("source").c_str(), at("target").c_str(), FALSE));
+  EXPECT_EQ("first", readFile(at("target")));
+  EXPECT_TRUE(CopyFileA(at("source").c_str(), at("fresh").c_str(), TRUE));
+  EXPECT_EQ("first", readFile(at("fresh")));
+  SetLastError(0);
+  EXPECT_FALSE(CopyFileA(at("missing").c_str(), at("other").c_str(), FALSE));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
+}
+
+TEST_F(FilesTest, CreateFileNewAndOpenExistingFailOnTheWrongState) {
+  ASSERT_TRUE(writeFile(at("exists"), "data"));
+  SetLastError(0);
+  EXPECT_EQ(INVALID_HANDLE_VALUE, createWith(at("exists"), GENERIC_WRITE, CREATE_NEW));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_EXISTS), GetLastError());
+  SetLastError(0);
+  EXPECT_EQ(INVALID_HANDLE_VALUE, createWith(at("missing"), GENERIC_READ, OPEN_EXISTING));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
+  SetLastError(0);
+  EXPECT_EQ(INVALID_HANDLE_VALUE, createWith(at("missing"), GENERIC_WRITE, TRUNCATE_EXISTING));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
+  SetLastError(0);
+  EXPECT_EQ(INVALID_HANDLE_VALUE, createWith(at("nofolder\\file"), GENERIC_WRITE, CREATE_ALWAYS));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), GetLastError());
+  HANDLE h = createWith(at("new"), GENERIC_WRITE, CREATE_NEW);
+  EXPECT_NE(INVALID_HANDLE_VALUE, h);
+  CloseHandle(h);
+}
+
+// CREATE_ALWAYS and OPEN_ALWAYS succeed either way and tell, through the last
+// error, whether the file was already there.
+TEST_F(FilesTest, CreateFileAlwaysReportsAnExistingFile) {
+  SetLastError(ERROR_INVALID_PARAMETER);
+  HANDLE h = createWith(at("always"), GENERIC_WRITE, CREATE_ALWAYS);
+  ASSERT_NE(INVALID_HANDLE_VALUE, h);
+  EXPECT_EQ(static_cast<DWORD>(ERROR_SUCCESS), GetLastError());
+  DWORD written = 0;
+  EXPECT_TRUE(WriteFile(h, "0123456789", 10, &written, nullptr));
+  CloseHandle(h);
+
+  h = createWith(at("always"), GENERIC_WRITE, CREATE_ALWAYS);
+  ASSERT_NE(INVALID_HANDLE_VALUE, h);
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
+  EXPECT_EQ(0u, GetFileSize(h, nullptr)); // replaced
+  CloseHandle(h);
+
+  ASSERT_TRUE(writeFile(at("kept"), "keep me"));
+  h = createWith(at("kept"), GENERIC_READ | GENERIC_WRITE, OPEN_ALWAYS);
+  ASSERT_NE(INVALID_HANDLE_VALUE, h);
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
+  EXPECT_EQ(7u, GetFileSize(h, nullptr)); // kept
+  CloseHandle(h);
+
+  SetLastError(ERROR_INVALID_PARAMETER);
+  h = createWith(at("opened"), GENERIC_WRITE, OPEN_ALWAYS);
+  ASSERT_NE(INVALID_HANDLE_VALUE, h);
+  EXPECT_EQ(static_cast<DWORD>(ERROR_SUCCESS), GetLastError());
+  CloseHandle(h);
+
+  h = createWith(at("kept"), GENERIC_WRITE, TRUNCATE_EXISTING);
+  ASSERT_NE(INVALID_HANDLE_VALUE, h);
+  EXPECT_EQ(0u, GetFileSize(h, nullptr));
+  CloseHandle(h);
+}
+
+} // namespace
+} // namespace kxltest
