@@ -10,7 +10,7 @@
 #include <cstdio>
 #include <utility>
 
-namespace kxlsim::posix::reg {
+namespace kxlsim::posix::hive {
 
 std::string fold(std::string_view name) {
   std::string folded(name);
@@ -550,4 +550,4 @@ LONG HiveFile::update(const std::function<LONG(Key &, bool &changed)> &writer) {
   return ERROR_SUCCESS;
 }
 
-} // namespace kxlsim::posix::reg
+} // namespace kxlsim::posix::hive

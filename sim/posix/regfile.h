@@ -14,7 +14,7 @@
 #include <string_view>
 #include <vector>
 
-namespace kxlsim::posix::reg {
+namespace kxlsim::posix::hive {
 
 // ASCII lower case: the order and identity of names.
 std::string fold(std::string_view name);
@@ -93,4 +93,4 @@ private:
   long long mtimeNs_ = 0;
 };
 
-} // namespace kxlsim::posix::reg
+} // namespace kxlsim::posix::hive

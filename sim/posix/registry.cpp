@@ -18,14 +18,14 @@ namespace kxlsim::posix {
 
 namespace {
 
-using reg::HiveFile;
-using reg::Key;
-using reg::KeyPath;
+using hive::HiveFile;
+using hive::Key;
+using hive::KeyPath;
 
-enum class Hive { Machine, User };
+enum class HiveId { Machine, User };
 
 struct OpenKey {
-  Hive hive = Hive::Machine;
+  HiveId hiveId = HiveId::Machine;
   KeyPath path;
   bool predefined = false; // a root key: always exists
 };
@@ -37,8 +37,8 @@ std::map<ULONG_PTR, OpenKey> openKeys;
 ULONG_PTR nextHandle = 0x1000;
 std::map<std::string, std::unique_ptr<HiveFile>> hiveFiles; // by host path
 
-HiveFile &hiveFile(Hive hive) {
-  const bool machine = hive == Hive::Machine;
+HiveFile &hiveFile(HiveId which) {
+  const bool machine = which == HiveId::Machine;
   std::string path = worldRoot() + (machine ? "/system.reg" : "/user.reg");
   std::unique_ptr<HiveFile> &file = hiveFiles[path];
   if (!file)
@@ -78,7 +78,7 @@ bool allStorable(const KeyPath &path) {
 
 LONG lookupKey(HKEY hKey, OpenKey &out) {
   if (hKey == HKEY_LOCAL_MACHINE || hKey == HKEY_CURRENT_USER || hKey == HKEY_CLASSES_ROOT) {
-    out.hive = hKey == HKEY_CURRENT_USER ? Hive::User : Hive::Machine;
+    out.hiveId = hKey == HKEY_CURRENT_USER ? HiveId::User : HiveId::Machine;
     out.path = hKey == HKEY_CLASSES_ROOT ? KeyPath{"SOFTWARE", "Classes"} : KeyPath{};
     out.predefined = true;
     return ERROR_SUCCESS;
@@ -93,17 +93,17 @@ LONG lookupKey(HKEY hKey, OpenKey &out) {
 // On a 64-bit system the 32-bit view of HKEY_LOCAL_MACHINE\SOFTWARE lives in
 // its Wow6432Node subkey.
 void applyView(REGSAM sam, OpenKey &key) {
-  if ((sam & KEY_WOW64_32KEY) == 0 || key.hive != Hive::Machine || key.path.empty() ||
-      reg::fold(key.path[0]) != "software")
+  if ((sam & KEY_WOW64_32KEY) == 0 || key.hiveId != HiveId::Machine || key.path.empty() ||
+      hive::fold(key.path[0]) != "software")
     return;
-  if (key.path.size() > 1 && reg::fold(key.path[1]) == "wow6432node")
+  if (key.path.size() > 1 && hive::fold(key.path[1]) == "wow6432node")
     return;
   key.path.insert(key.path.begin() + 1, "Wow6432Node");
 }
 
 // The key a handle names, or why there is none.
 LONG keyOfHandle(const Key &root, const OpenKey &handle, const Key *&out) {
-  out = reg::findKey(root, handle.path);
+  out = hive::findKey(root, handle.path);
   if (out != nullptr)
     return ERROR_SUCCESS;
   return handle.predefined ? ERROR_FILE_NOT_FOUND : ERROR_KEY_DELETED;
@@ -129,7 +129,7 @@ LONG readKey(HKEY hKey, const std::function<LONG(const Key &)> &fn) {
   OpenKey handle;
   if (LONG rc = lookupKey(hKey, handle); rc != ERROR_SUCCESS)
     return rc;
-  return hiveFile(handle.hive).read([&](const Key &root) -> LONG {
+  return hiveFile(handle.hiveId).read([&](const Key &root) -> LONG {
     const Key *key = nullptr;
     LONG rc = keyOfHandle(root, handle, key);
     return rc == ERROR_SUCCESS ? fn(*key) : rc;
@@ -141,7 +141,7 @@ LONG updateKey(HKEY hKey, const std::function<LONG(Key &, bool &)> &fn) {
   OpenKey handle;
   if (LONG rc = lookupKey(hKey, handle); rc != ERROR_SUCCESS)
     return rc;
-  return hiveFile(handle.hive).update([&](Key &root, bool &changed) -> LONG {
+  return hiveFile(handle.hiveId).update([&](Key &root, bool &changed) -> LONG {
     Key *key = nullptr;
     LONG rc = keyOfHandle(root, handle, key);
     return rc == ERROR_SUCCESS ? fn(*key, changed) : rc;
@@ -171,7 +171,7 @@ HKEY newHandle(const OpenKey &key) {
 
 // Copies a value's data out as Windows does: the size alone for a null buffer,
 // ERROR_MORE_DATA with the size needed for a small one.
-LONG copyData(const reg::Value &value, LPDWORD lpType, LPBYTE lpData, LPDWORD lpcbData) {
+LONG copyData(const hive::Value &value, LPDWORD lpType, LPBYTE lpData, LPDWORD lpcbData) {
   if (lpData != nullptr && lpcbData == nullptr)
     return ERROR_INVALID_PARAMETER;
   if (lpType != nullptr)
@@ -210,14 +210,14 @@ LONG deleteKey(HKEY hKey, const char *subKey, bool onlyLeaf) {
     return rc;
   if (target.path.empty())
     return ERROR_ACCESS_DENIED; // a root key cannot be deleted
-  return hiveFile(target.hive).update([&](Key &root, bool &changed) -> LONG {
+  return hiveFile(target.hiveId).update([&](Key &root, bool &changed) -> LONG {
     if (LONG rc = checkBase(root, base); rc != ERROR_SUCCESS)
       return rc;
     KeyPath parentPath(target.path.begin(), target.path.end() - 1);
-    Key *parent = reg::findKey(root, parentPath);
+    Key *parent = hive::findKey(root, parentPath);
     if (parent == nullptr)
       return ERROR_FILE_NOT_FOUND;
-    auto it = parent->subkeys.find(reg::fold(target.path.back()));
+    auto it = parent->subkeys.find(hive::fold(target.path.back()));
     if (it == parent->subkeys.end())
       return ERROR_FILE_NOT_FOUND;
     if (onlyLeaf && !it->second.subkeys.empty())
@@ -241,15 +241,15 @@ LONG openOrCreate(HKEY hKey, const char *subKey, REGSAM sam, bool create, PHKEY 
   auto work = [&](Key &root, bool &changed) -> LONG {
     if (LONG rc = checkBase(root, base); rc != ERROR_SUCCESS)
       return rc;
-    if (reg::findKey(root, target.path) != nullptr)
+    if (hive::findKey(root, target.path) != nullptr)
       return ERROR_SUCCESS;
     if (!create)
       return ERROR_FILE_NOT_FOUND;
-    reg::createKey(root, target.path, created);
+    hive::createKey(root, target.path, created);
     changed = created;
     return ERROR_SUCCESS;
   };
-  HiveFile &file = hiveFile(target.hive);
+  HiveFile &file = hiveFile(target.hiveId);
   LONG rc = create ? file.update(work) : file.read([&](const Key &root) -> LONG {
     bool unused = false;
     return work(const_cast<Key &>(root), unused);
@@ -304,8 +304,8 @@ LONG RegQueryValueExA(HKEY hKey, LPCSTR lpValueName, LPDWORD, LPDWORD lpType, LP
   if (injectedFailure("RegQueryValueExA"))
     return ERROR_ACCESS_DENIED;
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
-  std::string name = reg::fold(lpValueName == nullptr ? "" : lpValueName);
-  return readKey(hKey, [&](const reg::Key &key) -> LONG {
+  std::string name = hive::fold(lpValueName == nullptr ? "" : lpValueName);
+  return readKey(hKey, [&](const hive::Key &key) -> LONG {
     auto it = key.values.find(name);
     if (it == key.values.end())
       return ERROR_FILE_NOT_FOUND;
@@ -325,8 +325,8 @@ LONG RegSetValueExA(HKEY hKey, LPCSTR lpValueName, DWORD, DWORD dwType, const BY
   // reader gets a terminated string back.
   if ((dwType == REG_SZ || dwType == REG_EXPAND_SZ) && !data.empty() && data.back() != 0)
     data.push_back(0);
-  return updateKey(hKey, [&](reg::Key &key, bool &changed) -> LONG {
-    reg::setValue(key, name, dwType, std::move(data));
+  return updateKey(hKey, [&](hive::Key &key, bool &changed) -> LONG {
+    hive::setValue(key, name, dwType, std::move(data));
     changed = true;
     return ERROR_SUCCESS;
   });
@@ -337,7 +337,7 @@ LONG RegEnumKeyExA(HKEY hKey, DWORD dwIndex, LPSTR lpName, LPDWORD lpcchName, LP
   if (injectedFailure("RegEnumKeyExA"))
     return ERROR_ACCESS_DENIED;
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
-  return readKey(hKey, [&](const reg::Key &key) -> LONG {
+  return readKey(hKey, [&](const hive::Key &key) -> LONG {
     if (dwIndex >= key.subkeys.size())
       return ERROR_NO_MORE_ITEMS;
     LONG rc = copyName(std::next(key.subkeys.begin(), dwIndex)->second.name, lpName, lpcchName);
@@ -356,10 +356,10 @@ LONG RegEnumValueA(HKEY hKey, DWORD dwIndex, LPSTR lpValueName, LPDWORD lpcchVal
   if (injectedFailure("RegEnumValueA"))
     return ERROR_ACCESS_DENIED;
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
-  return readKey(hKey, [&](const reg::Key &key) -> LONG {
+  return readKey(hKey, [&](const hive::Key &key) -> LONG {
     if (dwIndex >= key.values.size())
       return ERROR_NO_MORE_ITEMS;
-    const reg::Value &value = std::next(key.values.begin(), dwIndex)->second;
+    const hive::Value &value = std::next(key.values.begin(), dwIndex)->second;
     LONG rc = copyName(value.name, lpValueName, lpcchValueName);
     return rc == ERROR_SUCCESS ? copyData(value, lpType, lpData, lpcbData) : rc;
   });
@@ -369,8 +369,8 @@ LONG RegDeleteValueA(HKEY hKey, LPCSTR lpValueName) {
   if (injectedFailure("RegDeleteValueA"))
     return ERROR_ACCESS_DENIED;
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
-  std::string name = reg::fold(lpValueName == nullptr ? "" : lpValueName);
-  return updateKey(hKey, [&](reg::Key &key, bool &changed) -> LONG {
+  std::string name = hive::fold(lpValueName == nullptr ? "" : lpValueName);
+  return updateKey(hKey, [&](hive::Key &key, bool &changed) -> LONG {
     changed = key.values.erase(name) != 0;
     return changed ? ERROR_SUCCESS : ERROR_FILE_NOT_FOUND;
   });
@@ -403,11 +403,11 @@ LONG SHCopyKeyA(HKEY hkeySrc, LPCSTR pszSrcSubKey, HKEY hkeyDest, DWORD) {
   if (LONG rc = resolveSubKey(hkeySrc, pszSrcSubKey, 0, base, source); rc != ERROR_SUCCESS)
     return rc;
   // Take the source whole first, so copying a key into its own subtree ends.
-  reg::Key copy;
-  LONG rc = hiveFile(source.hive).read([&](const reg::Key &root) -> LONG {
+  hive::Key copy;
+  LONG rc = hiveFile(source.hiveId).read([&](const hive::Key &root) -> LONG {
     if (LONG rc = checkBase(root, base); rc != ERROR_SUCCESS)
       return rc;
-    const reg::Key *found = reg::findKey(root, source.path);
+    const hive::Key *found = hive::findKey(root, source.path);
     if (found == nullptr)
       return ERROR_FILE_NOT_FOUND;
     copy = *found;
@@ -415,8 +415,8 @@ LONG SHCopyKeyA(HKEY hkeySrc, LPCSTR pszSrcSubKey, HKEY hkeyDest, DWORD) {
   });
   if (rc != ERROR_SUCCESS)
     return rc;
-  return updateKey(hkeyDest, [&](reg::Key &key, bool &changed) -> LONG {
-    reg::mergeKey(key, copy);
+  return updateKey(hkeyDest, [&](hive::Key &key, bool &changed) -> LONG {
+    hive::mergeKey(key, copy);
     changed = true;
     return ERROR_SUCCESS;
   });
