@@ -43,6 +43,17 @@ HANDLE createWith(const string &path, DWORD access, DWORD disposition) {
                      nullptr);
 }
 
+// The last error of a CreateFileA call that must fail; ERROR_SUCCESS when it
+// opened the file after all.
+DWORD failureOf(const string &path, DWORD access, DWORD disposition) {
+  SetLastError(0);
+  HANDLE h = createWith(path, access, disposition);
+  if (h == INVALID_HANDLE_VALUE)
+    return GetLastError();
+  CloseHandle(h);
+  return ERROR_SUCCESS;
+}
+
 // --- Attributes and folders ----------------------------------------------
 
 TEST_F(FilesTest, AttributesOfAFolderAreExactlyTheDirectoryBit) {
@@ -124,15 +135,28 @@ TEST_F(FilesTest, FindWithoutMatchTellsFileFromPath) {
 
 // --- Current and temporary folders ---------------------------------------
 
-TEST_F(FilesTest, CurrentDirectoryReportsTheNeededSizeWhenTooSmall) {
-  DWORD needed = GetCurrentDirectoryA(0, nullptr);
-  ASSERT_GT(needed, 1u);
+// The buffer rules of the functions that give a path: a buffer too small (or
+// none) gets the size needed with the terminator; one that fits gets the path
+// and its length without it. Returns the path.
+string checkPathBufferRules(DWORD(WINAPI *getPath)(DWORD, LPSTR)) {
+  DWORD needed = getPath(0, nullptr);
+  EXPECT_GT(needed, 1u);
   char buffer[MAX_PATH];
-  ASSERT_LE(needed, sizeof buffer);
-  EXPECT_EQ(needed - 1, GetCurrentDirectoryA(needed, buffer));
+  if (needed <= 1 || needed > sizeof buffer) {
+    ADD_FAILURE() << "needed size " << needed;
+    return string();
+  }
+  EXPECT_EQ(needed - 1, getPath(needed, buffer));
   EXPECT_EQ(needed - 1, std::strlen(buffer));
-  EXPECT_EQ(needed, GetCurrentDirectoryA(needed - 1, buffer));
+  char small[MAX_PATH];
+  EXPECT_EQ(needed, getPath(needed - 1, small));
+  return buffer;
+}
 
+TEST_F(FilesTest, CurrentDirectoryReportsTheNeededSizeWhenTooSmall) {
+  checkPathBufferRules(GetCurrentDirectoryA);
+
+  char buffer[MAX_PATH];
   ASSERT_TRUE(SetCurrentDirectoryA(dir_.c_str()));
   ASSERT_EQ(dir_.size(), GetCurrentDirectoryA(sizeof buffer, buffer));
   EXPECT_EQ(dir_, string(buffer));
@@ -142,17 +166,11 @@ TEST_F(FilesTest, CurrentDirectoryReportsTheNeededSizeWhenTooSmall) {
 }
 
 TEST_F(FilesTest, TempPathEndsWithABackslashAndReportsTheNeededSize) {
-  DWORD needed = GetTempPathA(0, nullptr);
-  ASSERT_GT(needed, 1u);
-  char buffer[MAX_PATH];
-  ASSERT_LE(needed, sizeof buffer);
-  ASSERT_EQ(needed - 1, GetTempPathA(needed, buffer));
-  EXPECT_EQ(needed - 1, std::strlen(buffer));
-  EXPECT_EQ('\\', buffer[needed - 2]);
+  string temp = checkPathBufferRules(GetTempPathA);
+  ASSERT_FALSE(temp.empty());
+  EXPECT_EQ('\\', temp.back());
   EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY),
-            GetFileAttributesA(buffer) & FILE_ATTRIBUTE_DIRECTORY);
-  char small[MAX_PATH];
-  EXPECT_EQ(needed, GetTempPathA(needed - 1, small));
+            GetFileAttributesA(temp.c_str()) & FILE_ATTRIBUTE_DIRECTORY);
 }
 
 // The run time puts names in the folder named by TMP when that is set, so the
@@ -208,18 +226,13 @@ TEST_F(FilesTest, CopyFileHonoursFailIfExists) {
 
 TEST_F(FilesTest, CreateFileNewAndOpenExistingFailOnTheWrongState) {
   ASSERT_TRUE(writeFile(at("exists"), "data"));
-  SetLastError(0);
-  EXPECT_EQ(INVALID_HANDLE_VALUE, createWith(at("exists"), GENERIC_WRITE, CREATE_NEW));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_EXISTS), GetLastError());
-  SetLastError(0);
-  EXPECT_EQ(INVALID_HANDLE_VALUE, createWith(at("missing"), GENERIC_READ, OPEN_EXISTING));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
-  SetLastError(0);
-  EXPECT_EQ(INVALID_HANDLE_VALUE, createWith(at("missing"), GENERIC_WRITE, TRUNCATE_EXISTING));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
-  SetLastError(0);
-  EXPECT_EQ(INVALID_HANDLE_VALUE, createWith(at("nofolder\\file"), GENERIC_WRITE, CREATE_ALWAYS));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_EXISTS), failureOf(at("exists"), GENERIC_WRITE, CREATE_NEW));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), failureOf(at("missing"), GENERIC_READ, OPEN_EXISTING));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND),
+            failureOf(at("missing"), GENERIC_WRITE, TRUNCATE_EXISTING));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND),
+            failureOf(at("nofolder\\file"), GENERIC_WRITE, CREATE_ALWAYS));
+  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(at("missing").c_str())); // nothing was created
   HANDLE h = createWith(at("new"), GENERIC_WRITE, CREATE_NEW);
   EXPECT_NE(INVALID_HANDLE_VALUE, h);
   CloseHandle(h);

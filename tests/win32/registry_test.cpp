@@ -17,12 +17,13 @@ struct Listing {
   bool lengthsMatch = true; // every reported length was the name's length in characters
 };
 
-Listing listSubkeys(HKEY key) {
+// Walks a key's names with one enumeration call (RegEnumKeyExA or RegEnumValueA).
+template <typename Enumerate> Listing listNames(Enumerate enumerate) {
   Listing out;
   for (DWORD i = 0;; ++i) {
     char name[256];
     DWORD length = sizeof name;
-    LONG rc = RegEnumKeyExA(key, i, name, &length, nullptr, nullptr, nullptr, nullptr);
+    LONG rc = enumerate(i, name, &length);
     if (rc != ERROR_SUCCESS) {
       out.end = rc;
       return out;
@@ -32,19 +33,16 @@ Listing listSubkeys(HKEY key) {
   }
 }
 
+Listing listSubkeys(HKEY key) {
+  return listNames([key](DWORD i, char *name, DWORD *length) {
+    return RegEnumKeyExA(key, i, name, length, nullptr, nullptr, nullptr, nullptr);
+  });
+}
+
 Listing listValues(HKEY key) {
-  Listing out;
-  for (DWORD i = 0;; ++i) {
-    char name[256];
-    DWORD length = sizeof name;
-    LONG rc = RegEnumValueA(key, i, name, &length, nullptr, nullptr, nullptr, nullptr);
-    if (rc != ERROR_SUCCESS) {
-      out.end = rc;
-      return out;
-    }
-    out.lengthsMatch = out.lengthsMatch && length == std::strlen(name);
-    out.names.insert(name);
-  }
+  return listNames([key](DWORD i, char *name, DWORD *length) {
+    return RegEnumValueA(key, i, name, length, nullptr, nullptr, nullptr, nullptr);
+  });
 }
 
 // --- Creating and opening keys -------------------------------------------
@@ -168,21 +166,6 @@ TEST_F(RegistryTest, EnumKeysListsEachSubkeyThenNoMoreItems) {
   EXPECT_TRUE(listing.lengthsMatch);
 }
 
-TEST_F(RegistryTest, EnumKeyWithShortNameBufferIsMoreData) {
-  Key key;
-  ASSERT_EQ(ERROR_SUCCESS, create("RatherLongName", key));
-  char name[4];
-  DWORD length = sizeof name;
-  EXPECT_EQ(ERROR_MORE_DATA,
-            RegEnumKeyExA(root_.get(), 0, name, &length, nullptr, nullptr, nullptr, nullptr));
-  // Room for the name and its terminator is enough.
-  char fits[15];
-  length = sizeof fits;
-  ASSERT_EQ(ERROR_SUCCESS, RegEnumKeyExA(root_.get(), 0, fits, &length, nullptr, nullptr, nullptr, nullptr));
-  EXPECT_EQ(14u, length);
-  EXPECT_STREQ("RatherLongName", fits);
-}
-
 // Windows lists values in the order they were created and Wine sorts them: the
 // command must not depend on either, so only the set of names is checked.
 TEST_F(RegistryTest, EnumValuesListsEachValueThenNoMoreItems) {
@@ -210,17 +193,29 @@ TEST_F(RegistryTest, EnumValueReportsTypeAndDataSize) {
   EXPECT_STREQ("hello", reinterpret_cast<const char *>(data));
 }
 
-TEST_F(RegistryTest, EnumValueWithShortBuffersIsMoreData) {
+TEST_F(RegistryTest, EnumerationWithShortBuffersIsMoreData) {
+  Key key;
+  ASSERT_EQ(ERROR_SUCCESS, create("RatherLongName", key));
   setString(root_.get(), "RatherLongValueName", "long enough data");
   char name[4];
   DWORD length = sizeof name;
   EXPECT_EQ(ERROR_MORE_DATA,
+            RegEnumKeyExA(root_.get(), 0, name, &length, nullptr, nullptr, nullptr, nullptr));
+  length = sizeof name;
+  EXPECT_EQ(ERROR_MORE_DATA,
             RegEnumValueA(root_.get(), 0, name, &length, nullptr, nullptr, nullptr, nullptr));
+  // A data buffer too small is refused as well.
   char fullName[64];
   length = sizeof fullName;
   BYTE data[4];
   DWORD size = sizeof data;
   EXPECT_EQ(ERROR_MORE_DATA, RegEnumValueA(root_.get(), 0, fullName, &length, nullptr, nullptr, data, &size));
+  // Room for the name and its terminator is enough.
+  char fits[15];
+  length = sizeof fits;
+  ASSERT_EQ(ERROR_SUCCESS, RegEnumKeyExA(root_.get(), 0, fits, &length, nullptr, nullptr, nullptr, nullptr));
+  EXPECT_EQ(14u, length);
+  EXPECT_STREQ("RatherLongName", fits);
 }
 
 // --- Names ---------------------------------------------------------------
