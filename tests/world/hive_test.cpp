@@ -1,0 +1,194 @@
+// The REGEDIT4 text form of a hive: every value type survives a round trip,
+// the output is the same whatever order things were added in, and damaged
+// files are refused rather than half read.
+#include "sim/posix/regfile.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <sstream>
+
+namespace kxlsim::posix::hive {
+namespace {
+
+const std::string kRoot = "HKEY_LOCAL_MACHINE";
+
+std::vector<BYTE> bytes(const std::string &text, bool terminated = true) {
+  std::vector<BYTE> data(text.begin(), text.end());
+  if (terminated)
+    data.push_back(0);
+  return data;
+}
+
+bool sameTree(const Key &a, const Key &b) {
+  if (a.name != b.name || a.values.size() != b.values.size() || a.subkeys.size() != b.subkeys.size())
+    return false;
+  for (const auto &[folded, value] : a.values) {
+    auto it = b.values.find(folded);
+    if (it == b.values.end() || it->second.name != value.name || it->second.type != value.type ||
+        it->second.data != value.data)
+      return false;
+  }
+  for (const auto &[folded, child] : a.subkeys) {
+    auto it = b.subkeys.find(folded);
+    if (it == b.subkeys.end() || !sameTree(child, it->second))
+      return false;
+  }
+  return true;
+}
+
+Key sampleTree() {
+  Key root;
+  bool created = false;
+  Key &zav = createKey(root, {"SOFTWARE", "ZAV", "KXL"}, created);
+  setValue(zav, "", REG_SZ, bytes("default"));
+  setValue(zav, "Path \"quoted\" \\x", REG_SZ, bytes("C:\\Program Files\\KXL \"10\"\\"));
+  setValue(zav, "Count", REG_DWORD, {0x2a, 0, 0, 0});
+  setValue(zav, "Big", REG_QWORD, {1, 2, 3, 4, 5, 6, 7, 0x80});
+  setValue(zav, "Expand", REG_EXPAND_SZ, bytes("%SystemRoot%\\x"));
+  setValue(zav, "Multi", REG_MULTI_SZ, {'a', 0, 'b', 'c', 0, 0});
+  std::vector<BYTE> blob(200);
+  for (size_t i = 0; i < blob.size(); ++i)
+    blob[i] = static_cast<BYTE>(i * 7);
+  setValue(zav, "Blob", REG_BINARY, blob);
+  setValue(zav, "Empty", REG_SZ, {});
+  setValue(zav, "TwoLines", REG_SZ, bytes("one\r\ntwo"));
+  setValue(zav, "Unterminated", REG_SZ, bytes("raw", false));
+  setValue(zav, "ShortDword", REG_DWORD, {1, 2, 3});
+  setValue(zav, "Nothing", REG_NONE, {});
+  createKey(root, {"SOFTWARE", "Empty Key"}, created);
+  return root;
+}
+
+TEST(HiveText, EveryValueTypeRoundTrips) {
+  Key tree = sampleTree();
+  std::string text = formatHive(tree, kRoot);
+  Key parsed;
+  std::string error;
+  ASSERT_TRUE(parseHive(text, kRoot, parsed, error)) << error << "\n" << text;
+  EXPECT_TRUE(sameTree(tree, parsed)) << text;
+  EXPECT_EQ(formatHive(parsed, kRoot), text);
+
+  EXPECT_EQ(text.rfind("REGEDIT4\n", 0), 0u);
+  EXPECT_NE(text.find("[HKEY_LOCAL_MACHINE\\SOFTWARE\\Empty Key]\n"), std::string::npos);
+  EXPECT_NE(text.find("@=\"default\"\n"), std::string::npos);
+  EXPECT_NE(text.find("\"Path \\\"quoted\\\" \\\\x\"=\"C:\\\\Program Files\\\\KXL \\\"10\\\"\\\\\"\n"),
+            std::string::npos);
+  EXPECT_NE(text.find("\"Count\"=dword:0000002a\n"), std::string::npos);
+  EXPECT_NE(text.find("\"Big\"=hex(b):01,02,03,04,05,06,07,80\n"), std::string::npos);
+  EXPECT_NE(text.find("\"Multi\"=hex(7):61,00,62,63,00,00\n"), std::string::npos);
+  EXPECT_NE(text.find("\"Expand\"=hex(2):25,"), std::string::npos);
+  EXPECT_NE(text.find("\"Blob\"=hex:00,07,0e,"), std::string::npos);
+  // Strings that the quoted form cannot give back exactly are kept as bytes.
+  EXPECT_NE(text.find("\"Unterminated\"=hex(1):72,61,77\n"), std::string::npos);
+  EXPECT_NE(text.find("\"Empty\"=hex(1):\n"), std::string::npos);
+}
+
+TEST(HiveText, LongDataIsWrappedWithinEightyColumns) {
+  std::string text = formatHive(sampleTree(), kRoot);
+  std::istringstream lines(text);
+  std::string line;
+  int continued = 0;
+  while (std::getline(lines, line)) {
+    EXPECT_LE(line.size(), 80u) << line;
+    continued += !line.empty() && line.back() == '\\';
+  }
+  EXPECT_GE(continued, 6); // the 200-byte blob alone needs several lines
+}
+
+TEST(HiveText, HandWrittenFilesAreRead) {
+  const char *text = "REGEDIT4\r\n"
+                     "; a comment\r\n"
+                     "\r\n"
+                     "[hkey_local_machine\\Software\\A]\r\n"
+                     "\"Bin\"=hex:0A, FF ,\\\r\n"
+                     "    10\r\n"
+                     "\"D\"=dword:FFFFFFFF\r\n"
+                     "@=\"x\"\r\n";
+  Key tree;
+  std::string error;
+  ASSERT_TRUE(parseHive(text, kRoot, tree, error)) << error;
+  const Key *a = findKey(tree, {"SOFTWARE", "a"});
+  ASSERT_NE(a, nullptr);
+  EXPECT_EQ(a->name, "A");
+  EXPECT_EQ(a->values.at("bin").data, (std::vector<BYTE>{0x0a, 0xff, 0x10}));
+  EXPECT_EQ(a->values.at("d").data, (std::vector<BYTE>{0xff, 0xff, 0xff, 0xff}));
+  EXPECT_EQ(a->values.at("").data, bytes("x"));
+}
+
+TEST(HiveText, DamagedFilesAreRefused) {
+  const char *damaged[] = {
+      "[HKEY_LOCAL_MACHINE\\A]\n\"v\"=\"x\"\n",               // no header
+      "REGEDIT4\n\"v\"=\"x\"\n",                              // value outside a key
+      "REGEDIT4\n[HKEY_LOCAL_MACHINE\\A]\n\"v\"=\"x\n",       // string cut short
+      "REGEDIT4\n[HKEY_LOCAL_MACHINE\\A]\n\"v\"=hex:1,zz\n",  // not hex
+      "REGEDIT4\n[HKEY_LOCAL_MACHINE\\A]\n\"v\"=hex:01,\\\n", // continuation cut short
+      "REGEDIT4\n[HKEY_LOCAL_MACHINE\\A]\n\"v\"=dword:123456789\n",
+      "REGEDIT4\n[HKEY_CURRENT_USER\\A]\n",    // another root
+      "REGEDIT4\n[HKEY_LOCAL_MACHINE\\A\n",    // section cut short
+      "REGEDIT4\n[HKEY_LOCAL_MACHINE\\\\A]\n", // empty key name
+      "REGEDIT4\n[-HKEY_LOCAL_MACHINE\\A]\n",
+      "REGEDIT4\n[HKEY_LOCAL_MACHINE\\A]\ngarbage\n",
+  };
+  for (const char *text : damaged) {
+    Key tree;
+    std::string error;
+    EXPECT_FALSE(parseHive(text, kRoot, tree, error)) << text;
+    EXPECT_FALSE(error.empty());
+  }
+}
+
+TEST(HiveText, OutputDoesNotDependOnInsertionOrder) {
+  Key first, second;
+  bool created = false;
+  for (const char *name : {"B", "a", "c"}) {
+    createKey(first, {"S", name}, created);
+    setValue(*findKey(first, {"S"}), name, REG_SZ, bytes(name));
+  }
+  for (const char *name : {"c", "B", "a"}) {
+    setValue(createKey(second, {"S"}, created), name, REG_SZ, bytes(name));
+    createKey(second, {"S", name}, created);
+  }
+  std::string text = formatHive(first, kRoot);
+  EXPECT_EQ(text, formatHive(second, kRoot));
+  // Sorted ignoring case: "a" comes before "B", unlike in byte order.
+  EXPECT_LT(text.find("\\S\\a]"), text.find("\\S\\B]"));
+  EXPECT_LT(text.find("\"a\"="), text.find("\"B\"="));
+}
+
+TEST(HiveKeys, NamesIgnoreCaseAndKeepTheirFirstSpelling) {
+  Key root;
+  bool created = false;
+  Key &zav = createKey(root, {"Software", "ZAV"}, created);
+  EXPECT_TRUE(created);
+  createKey(root, {"SOFTWARE", "zav"}, created);
+  EXPECT_FALSE(created);
+  EXPECT_EQ(findKey(root, {"software", "Zav"}), &zav);
+  EXPECT_EQ(root.subkeys.at("software").name, "Software");
+
+  setValue(zav, "Name", REG_SZ, bytes("one"));
+  setValue(zav, "NAME", REG_SZ, bytes("two"));
+  ASSERT_EQ(zav.values.size(), 1u);
+  EXPECT_EQ(zav.values.at("name").name, "Name");
+  EXPECT_EQ(zav.values.at("name").data, bytes("two"));
+}
+
+TEST(HiveKeys, MergeAddsTheSubtreeAndReplacesValues) {
+  Key target, source;
+  bool created = false;
+  setValue(createKey(target, {"Keep"}, created), "V", REG_SZ, bytes("old"));
+  setValue(createKey(target, {"Keep"}, created), "Other", REG_SZ, bytes("stays"));
+  setValue(createKey(source, {"KEEP"}, created), "v", REG_SZ, bytes("new"));
+  setValue(createKey(source, {"New", "Deep"}, created), "D", REG_DWORD, {1, 0, 0, 0});
+  mergeKey(target, source);
+  const Key *keep = findKey(target, {"keep"});
+  ASSERT_NE(keep, nullptr);
+  EXPECT_EQ(keep->name, "Keep");
+  EXPECT_EQ(keep->values.at("v").name, "V");
+  EXPECT_EQ(keep->values.at("v").data, bytes("new"));
+  EXPECT_EQ(keep->values.at("other").data, bytes("stays"));
+  EXPECT_NE(findKey(target, {"New", "Deep"}), nullptr);
+}
+
+} // namespace
+} // namespace kxlsim::posix::hive
