@@ -1,0 +1,58 @@
+// The binary database manager configuration file "kxlsystm": layout helpers
+// and the default images a copy ships as its per-node-type templates.
+//
+// Layout (little-endian): u32 checksum at 0 (sum of the bytes from 4 to the
+// end), u16 release word at 16 (release code in bits 8-11), u16 level word at
+// 20, u16 node type at 40, parameter values up to the 512-byte flag area at
+// the end. The current layout is 16384 bytes; the legacy small layout is 4096
+// bytes with its flag area at 3584.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
+namespace kxlsim {
+
+inline constexpr size_t kDbmCfgSize = 16384;
+inline constexpr size_t kDbmCfgSmallSize = 4096;
+inline constexpr size_t kDbmCfgFlagAreaSize = 512;
+inline constexpr size_t kDbmCfgOffsetChecksum = 0;
+inline constexpr size_t kDbmCfgOffsetRelease = 16;
+inline constexpr size_t kDbmCfgOffsetLevel = 20;
+inline constexpr size_t kDbmCfgOffsetNodeType = 40;
+
+// Release codes (bits 8-11 of the release word) of the releases that write
+// the file, and their level words.
+struct DbmRelease {
+  uint16_t releaseWord;
+  uint16_t level;
+};
+inline constexpr DbmRelease kDbmReleaseV8{0x0A00, 8102};
+inline constexpr DbmRelease kDbmReleaseV91{0x0B00, 9100};
+inline constexpr DbmRelease kDbmReleaseV95{0x0C00, 9500};
+inline constexpr DbmRelease kDbmReleaseV101{0x0D00, 10100};
+
+// The release whose files a copy of that version writes (8 -> v8, 9.1, 9.5,
+// 9.7 and later -> the newest code).
+DbmRelease dbmReleaseForVersion(int version, int release);
+
+uint16_t readU16(const std::vector<uint8_t> &image, size_t offset);
+uint32_t readU32(const std::vector<uint8_t> &image, size_t offset);
+void writeU16(std::vector<uint8_t> &image, size_t offset, uint16_t value);
+void writeU32(std::vector<uint8_t> &image, size_t offset, uint32_t value);
+
+// Sum of every byte from offset 4 to the end of the image.
+uint32_t dbmCfgChecksum(const std::vector<uint8_t> &image);
+bool dbmCfgChecksumValid(const std::vector<uint8_t> &image);
+void dbmCfgSealChecksum(std::vector<uint8_t> &image);
+
+// A complete, sealed image for a node type 1..5 with in-range defaults
+// (server values cleared for node type 2). `small` gives the 4096-byte layout.
+std::vector<uint8_t> makeDbmCfgImage(int nodeType, DbmRelease release, bool small = false);
+
+// The template file name of a node type in a copy's CFG folder ("kxlsyssv"
+// for 1 ... "kxlsysst" for 5); nullptr outside 1..5.
+const char *dbmCfgTemplateName(int nodeType);
+
+} // namespace kxlsim

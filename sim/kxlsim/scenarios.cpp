@@ -1,0 +1,190 @@
+#include "sim/kxlsim/scenarios.h"
+
+namespace kxlsim {
+
+namespace {
+
+constexpr const char *kLocalComputer = "WINSRV1";
+constexpr const char *kLocalHost = "winsrv1.zav.test";
+constexpr const char *kRemoteComputer = "WINSRV2";
+constexpr const char *kRemoteHost = "winsrv2.zav.test";
+
+// The server edition in both side-by-side copies: the newer copy registers
+// the product code with its fourth group raised by one, as a second copy of
+// the same product does.
+constexpr const char *kServerCode95 = "{6E1C2A40-9F3B-4D21-8A10-5B2C7D0E9A01}";
+constexpr const char *kServerCode101 = "{6E1C2A40-9F3B-4D21-8A11-5B2C7D0E9A01}";
+
+IdentitySpec localIdentity() {
+  IdentitySpec id;
+  id.computerName = kLocalComputer;
+  id.fullHostName = kLocalHost;
+  return id;
+}
+
+IdentitySpec remoteIdentity() {
+  IdentitySpec id;
+  id.computerName = kRemoteComputer;
+  id.fullHostName = kRemoteHost;
+  return id;
+}
+
+CopySpec version8Copy() {
+  CopySpec copy;
+  copy.path = "C:\\Program Files\\ZAV\\KXL8";
+  copy.version = 8;
+  copy.release = 2;
+  copy.components = {"KXL Server", "KXL Client"};
+  copy.products = {{"srv", "", "KXL Server Edition"}, {"txt", "", "KXL Documentation"}};
+  return copy;
+}
+
+CopySpec copy95() {
+  CopySpec copy;
+  copy.name = "KXL95";
+  copy.path = "C:\\Program Files\\ZAV\\KXL95";
+  copy.version = 9;
+  copy.release = 5;
+  copy.fixLevel = 3;
+  copy.components = {"KXL Server", "KXL Client"};
+  copy.products = {{"hpe", kServerCode95, "KXL Server Haldor Prime Edition"}};
+  return copy;
+}
+
+CopySpec copy101() {
+  CopySpec copy;
+  copy.name = "KXL101";
+  copy.path = "C:\\Program Files\\ZAV\\KXL101";
+  copy.version = 10;
+  copy.release = 1;
+  copy.components = {"KXL Server", "KXL Client", "KXL Zelquor Client"};
+  copy.products = {{"hpe", kServerCode101, "KXL Server Haldor Prime Edition"}};
+  copy.installCommand = true;
+  return copy;
+}
+
+std::string serviceImage(const CopySpec &copy) {
+  return copy.path + "\\bin\\kxlsyscs.exe";
+}
+
+void addVersion8Instance(WorldWriter &w, const CopySpec &copy) {
+  InstanceSpec inst;
+  inst.name = "V8INST";
+  inst.directory = copy.path + "\\V8INST";
+  inst.nodeType = 3;
+  inst.version = 8;
+  inst.release = 2;
+  inst.smallLayout = true;
+  addInstance(w, inst);
+  addService(w, {"", inst.name, serviceImage(copy), "KXL - V8INST", "LocalSystem", 2, 1});
+  w.writeText(copy.path + "\\function\\kxludf8.dll", "MZ user functions of V8INST\r\n");
+}
+
+void addSinglePartitionInstance(WorldWriter &w, const CopySpec &copy) {
+  InstanceSpec inst;
+  inst.name = "INST1";
+  inst.copy = copy.name;
+  inst.directory = copy.path + "\\INST1";
+  inst.nodeType = 1;
+  inst.version = copy.version;
+  inst.release = copy.release;
+  addInstance(w, inst);
+  addService(w, {"", inst.name, serviceImage(copy), "KXL - KXL95 - INST1", "LocalSystem", 2, 1});
+}
+
+// Partitions 0 on this machine, 1 and 2 (logical port 1) on the other one.
+void addPartitionedInstance(WorldWriter &w, const CopySpec &copy) {
+  InstanceSpec inst;
+  inst.name = "INST2";
+  inst.copy = copy.name;
+  inst.directory = copy.path + "\\INST2";
+  inst.nodeType = 4;
+  inst.version = copy.version;
+  inst.release = copy.release;
+  inst.profile = {{"KXLPORTRANGE", "60000:60003"}, {"KXLNODECOMPUTER", kLocalComputer}};
+  inst.machines = {kRemoteComputer};
+  inst.nodesFile = std::string("0 ") + kLocalHost + " " + kLocalComputer + " 0 \r\n" + "1 " + kRemoteHost +
+                   " " + kRemoteComputer + " 0 \r\n" + "2 " + kRemoteHost + " " + kRemoteComputer + " 1 \r\n";
+  addInstance(w, inst);
+  const char *machines[] = {"", kRemoteComputer, kRemoteComputer};
+  for (int node = 0; node < 3; ++node) {
+    std::string service = "INST2-" + std::to_string(node);
+    addService(w,
+               {machines[node], service, serviceImage(copy), "KXL - KXL95 - " + service, ".\\kxlsvc", 2, 1});
+  }
+  w.writeText(copy.path + "\\function\\kxludf.dll", "MZ user functions of the KXL95 instances\r\n");
+}
+
+void buildEmpty(WorldWriter &w, const InstallSources &) {
+  addMachineBase(w);
+}
+
+void buildDemo(WorldWriter &w, const InstallSources &sources) {
+  addMachineBase(w);
+  addMachine(w, remoteIdentity());
+  addHost(w, "winsrv2", kRemoteHost, kRemoteComputer);
+  addHost(w, kRemoteHost, kRemoteHost, kRemoteComputer);
+
+  CopySpec v8 = version8Copy(), old = copy95(), current = copy101();
+  addCopy(w, v8, sources);
+  addCopy(w, old, sources);
+  addCopy(w, current, sources);
+  addCopyRegistration(w, remoteMachine(kRemoteComputer), old);
+  addCopyRegistration(w, remoteMachine(kRemoteComputer), current);
+
+  addVersion8Instance(w, v8);
+  addSinglePartitionInstance(w, old);
+  addPartitionedInstance(w, old);
+  w.setString(localMachine(), std::string(kSimRoot) + "\\AdminServer", "Name", "KXLDAS00");
+  addServicesFile(w, {"KXL_V8INST         50010/tcp", "KXL_INST1          50000/tcp",
+                      "KXL_INST2          60000/tcp", "KXL_INST2_END      60003/tcp"});
+  addRuntimeModule(w, "odbc32.dll");
+}
+
+} // namespace
+
+void addMachineBase(WorldWriter &w) {
+  addIdentity(w, localMachine(), localIdentity());
+  addHost(w, "winsrv1", kLocalHost, kLocalComputer);
+  addHost(w, kLocalHost, kLocalHost, kLocalComputer);
+  w.makeDirectory("C:\\windows\\temp");
+  addServicesFile(w, {});
+}
+
+const std::vector<Scenario> &scenarios() {
+  static const std::vector<Scenario> table = {
+      {"empty", "one machine without any copy of the product", buildEmpty},
+      {"demo",
+       "a version-8 installation with one instance; copy KXL95 (9.5) with INST1 and the partitioned INST2 "
+       "over two machines; the current copy KXL101 (10.1) with the command",
+       buildDemo},
+  };
+  return table;
+}
+
+const Scenario *findScenario(const std::string &name) {
+  for (const Scenario &scenario : scenarios())
+    if (name == scenario.name)
+      return &scenario;
+  return nullptr;
+}
+
+bool createWorld(const std::string &hostDir, const std::string &scenarioName, const InstallSources &sources,
+                 std::vector<std::string> &errors) {
+  const Scenario *scenario = findScenario(scenarioName);
+  if (scenario == nullptr) {
+    errors.push_back("unknown scenario " + scenarioName);
+    return false;
+  }
+  std::string error;
+  if (!initWorld(hostDir, error)) {
+    errors.push_back(error);
+    return false;
+  }
+  WorldWriter w;
+  scenario->build(w, sources);
+  errors = w.errors();
+  return w.ok();
+}
+
+} // namespace kxlsim
