@@ -96,12 +96,12 @@ bool isPlainText(const Value &value) {
 }
 
 std::string hexData(const std::string &prefix, DWORD type, const std::vector<BYTE> &data) {
-  char spec[24];
+  char dataText[24];
   if (type == REG_BINARY)
-    std::snprintf(spec, sizeof spec, "hex:");
+    std::snprintf(dataText, sizeof dataText, "hex:");
   else
-    std::snprintf(spec, sizeof spec, "hex(%x):", static_cast<unsigned>(type));
-  std::string out = spec;
+    std::snprintf(dataText, sizeof dataText, "hex(%x):", static_cast<unsigned>(type));
+  std::string out = dataText;
   size_t column = prefix.size() + out.size();
   for (size_t i = 0; i < data.size(); ++i) {
     if (i > 0) {
@@ -247,31 +247,31 @@ bool parseHexBytes(std::string_view list, std::vector<BYTE> &out) {
   return true;
 }
 
-// `spec` is what follows "=" on a value line (continuations already joined).
-bool parseData(std::string_view spec, Value &value) {
-  if (!spec.empty() && spec[0] == '"') {
+// `dataText` is what follows "=" on a value line (continuations already joined).
+bool parseData(std::string_view dataText, Value &value) {
+  if (!dataText.empty() && dataText[0] == '"') {
     std::string text;
-    size_t end = readQuoted(spec, 0, text);
-    if (end == std::string_view::npos || !trimmed(spec.substr(end)).empty())
+    size_t end = readQuoted(dataText, 0, text);
+    if (end == std::string_view::npos || !trimmed(dataText.substr(end)).empty())
       return false;
     value.type = REG_SZ;
     value.data.assign(text.begin(), text.end());
     value.data.push_back(0);
     return true;
   }
-  if (spec.substr(0, 6) == "dword:") {
+  if (dataText.substr(0, 6) == "dword:") {
     unsigned long number = 0;
-    if (!parseHexNumber(trimmed(spec.substr(6)), 8, number))
+    if (!parseHexNumber(trimmed(dataText.substr(6)), 8, number))
       return false;
     value.type = REG_DWORD;
     value.data = {static_cast<BYTE>(number), static_cast<BYTE>(number >> 8), static_cast<BYTE>(number >> 16),
                   static_cast<BYTE>(number >> 24)};
     return true;
   }
-  size_t colon = spec.find(':');
+  size_t colon = dataText.find(':');
   if (colon == std::string_view::npos)
     return false;
-  std::string_view kind = spec.substr(0, colon);
+  std::string_view kind = dataText.substr(0, colon);
   unsigned long type = REG_BINARY;
   if (kind != "hex") {
     if (kind.size() < 6 || kind.substr(0, 4) != "hex(" || kind.back() != ')' ||
@@ -279,7 +279,7 @@ bool parseData(std::string_view spec, Value &value) {
       return false;
   }
   value.type = static_cast<DWORD>(type);
-  return parseHexBytes(spec.substr(colon + 1), value.data);
+  return parseHexBytes(dataText.substr(colon + 1), value.data);
 }
 
 // Joins the continuation lines of a hex value ("...,\" then "  ...").
@@ -308,10 +308,10 @@ bool parseValueLine(std::string_view line, LineReader &lines, Key &key) {
   }
   if (pos >= line.size() || line[pos] != '=')
     return false;
-  std::string spec(trimmed(line.substr(pos + 1)));
-  if (spec.compare(0, 3, "hex") == 0 && !joinContinuations(lines, spec))
+  std::string dataText(trimmed(line.substr(pos + 1)));
+  if (dataText.compare(0, 3, "hex") == 0 && !joinContinuations(lines, dataText))
     return false;
-  if (!parseData(spec, value))
+  if (!parseData(dataText, value))
     return false;
   setValue(key, value.name, value.type, std::move(value.data));
   return true;
