@@ -1,0 +1,362 @@
+// Files and directories of the world: attributes, searches, create/remove,
+// copy/move and the C run time's _access, with Windows' results and codes.
+#include "platform/win32.h"
+#include "sim/common/simfail.h"
+#include "sim/posix/handles.h"
+#include "sim/posix/win32util.h"
+#include "sim/posix/world.h"
+
+#include <algorithm>
+#include <cctype>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <dirent.h>
+#include <fcntl.h>
+#include <string>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <vector>
+
+using namespace kxlsim::posix;
+
+namespace {
+
+constexpr unsigned long long kUnixEpochInFileTime = 116444736000000000ULL;
+
+FILETIME toFileTime(const struct timespec &when) {
+  unsigned long long ticks = static_cast<unsigned long long>(when.tv_sec) * 10000000ULL +
+                             static_cast<unsigned long long>(when.tv_nsec) / 100ULL + kUnixEpochInFileTime;
+  FILETIME result;
+  result.dwLowDateTime = static_cast<DWORD>(ticks & 0xFFFFFFFFULL);
+  result.dwHighDateTime = static_cast<DWORD>(ticks >> 32);
+  return result;
+}
+
+DWORD attributesOf(const struct stat &info) {
+  if (S_ISDIR(info.st_mode))
+    return FILE_ATTRIBUTE_DIRECTORY;
+  DWORD attributes = FILE_ATTRIBUTE_ARCHIVE;
+  if ((info.st_mode & S_IWUSR) == 0)
+    attributes |= FILE_ATTRIBUTE_READONLY;
+  return attributes;
+}
+
+bool isReadOnlyFile(const struct stat &info) {
+  return !S_ISDIR(info.st_mode) && (info.st_mode & S_IWUSR) == 0;
+}
+
+// Windows wildcard match: '*' any run, '?' one character, letters ignoring
+// case; "*.*" matches every name, dotted or not.
+bool wildcardMatch(const char *pattern, const char *name) {
+  if (std::strcmp(pattern, "*.*") == 0)
+    return true;
+  const char *starPattern = nullptr;
+  const char *starName = nullptr;
+  while (*name != '\0') {
+    if (*pattern == '*') {
+      starPattern = ++pattern;
+      starName = name;
+    } else if (*pattern == '?' || (*pattern != '\0' && equalsIgnoringCase(std::string_view(pattern, 1),
+                                                                          std::string_view(name, 1)))) {
+      ++pattern;
+      ++name;
+    } else if (starPattern != nullptr) {
+      pattern = starPattern;
+      name = ++starName;
+    } else {
+      return false;
+    }
+  }
+  while (*pattern == '*')
+    ++pattern;
+  return *pattern == '\0';
+}
+
+struct FindObject : HandleObject {
+  std::vector<WIN32_FIND_DATAA> entries;
+  size_t next = 0;
+  bool closableByCloseHandle() const override { return false; }
+};
+
+bool fillFindData(const std::string &directory, const std::string &name, WIN32_FIND_DATAA &data) {
+  struct stat info {};
+  if (name.size() >= MAX_PATH || stat((directory + "/" + name).c_str(), &info) != 0)
+    return false;
+  std::memset(&data, 0, sizeof data);
+  data.dwFileAttributes = attributesOf(info);
+  data.ftCreationTime = toFileTime(info.st_ctim);
+  data.ftLastAccessTime = toFileTime(info.st_atim);
+  data.ftLastWriteTime = toFileTime(info.st_mtim);
+  if (!S_ISDIR(info.st_mode)) {
+    unsigned long long size = static_cast<unsigned long long>(info.st_size);
+    data.nFileSizeHigh = static_cast<DWORD>(size >> 32);
+    data.nFileSizeLow = static_cast<DWORD>(size & 0xFFFFFFFFULL);
+  }
+  std::snprintf(data.cFileName, sizeof data.cFileName, "%s", name.c_str());
+  return true;
+}
+
+bool lessIgnoringCase(const std::string &a, const std::string &b) {
+  return std::lexicographical_compare(a.begin(), a.end(), b.begin(), b.end(), [](char x, char y) {
+    return std::tolower(static_cast<unsigned char>(x)) < std::tolower(static_cast<unsigned char>(y));
+  });
+}
+
+// Names in `directory` matching `pattern`, sorted as a Windows volume lists
+// them; "." and ".." head the list outside a drive's root, as on Windows.
+std::vector<std::string> matchingNames(const std::string &directory, const std::string &pattern) {
+  std::vector<std::string> names;
+  DIR *stream = opendir(directory.c_str());
+  if (stream == nullptr)
+    return names;
+  while (const dirent *entry = readdir(stream)) {
+    std::string name = entry->d_name;
+    if (name != "." && name != ".." && wildcardMatch(pattern.c_str(), name.c_str()))
+      names.push_back(name);
+  }
+  closedir(stream);
+  std::sort(names.begin(), names.end(), lessIgnoringCase);
+  std::string windowsDir = windowsPath(directory);
+  bool driveRoot = windowsDir.size() <= 3;
+  if (!driveRoot) {
+    for (const char *dots : {"..", "."})
+      if (wildcardMatch(pattern.c_str(), dots))
+        names.insert(names.begin(), dots);
+  }
+  return names;
+}
+
+// Splits "dir\pattern" at the last separator.
+void splitSearch(const std::string &search, std::string &directory, std::string &pattern) {
+  auto cut = search.find_last_of("\\/");
+  if (cut == std::string::npos) {
+    auto colon = search.find(':');
+    directory = colon == std::string::npos ? "." : search.substr(0, colon + 1);
+    pattern = colon == std::string::npos ? search : search.substr(colon + 1);
+    return;
+  }
+  directory = search.substr(0, cut + 1);
+  pattern = search.substr(cut + 1);
+}
+
+bool statWindowsPath(LPCSTR path, std::string &host, struct stat &info) {
+  if (!mapPath(path, host))
+    return false;
+  if (stat(host.c_str(), &info) != 0) {
+    SetLastError(win32ErrorFromErrno(errno, host));
+    return false;
+  }
+  return true;
+}
+
+bool copyFileContents(int from, int to) {
+  char chunk[65536];
+  for (;;) {
+    ssize_t got = read(from, chunk, sizeof chunk);
+    if (got < 0 && errno == EINTR)
+      continue;
+    if (got <= 0)
+      return got == 0;
+    for (ssize_t done = 0; done < got;) {
+      ssize_t put = write(to, chunk + done, static_cast<size_t>(got - done));
+      if (put < 0 && errno == EINTR)
+        continue;
+      if (put <= 0)
+        return false;
+      done += put;
+    }
+  }
+}
+
+// The host target of a rename: the mapped path, except that renaming a name to
+// itself in another letter case keeps the new spelling.
+std::string renameTarget(const std::string &sourceHost, const std::string &targetHost, LPCSTR targetWindows) {
+  if (sourceHost != targetHost)
+    return targetHost;
+  std::string written = targetWindows;
+  auto cut = written.find_last_of("\\/");
+  std::string last = cut == std::string::npos ? written : written.substr(cut + 1);
+  auto slash = targetHost.rfind('/');
+  return targetHost.substr(0, slash + 1) + last;
+}
+
+} // namespace
+
+extern "C" {
+
+DWORD GetFileAttributesA(LPCSTR lpFileName) {
+  if (kxlsim::shouldFail("GetFileAttributesA"))
+    return failWith(ERROR_ACCESS_DENIED, INVALID_FILE_ATTRIBUTES);
+  std::string host;
+  struct stat info {};
+  if (!statWindowsPath(lpFileName, host, info))
+    return INVALID_FILE_ATTRIBUTES;
+  return attributesOf(info);
+}
+
+HANDLE FindFirstFileA(LPCSTR lpFileName, LPWIN32_FIND_DATAA lpFindFileData) {
+  if (kxlsim::shouldFail("FindFirstFileA"))
+    return failWith(ERROR_FILE_NOT_FOUND, INVALID_HANDLE_VALUE);
+  if (lpFileName == nullptr || lpFindFileData == nullptr)
+    return failWith(ERROR_INVALID_PARAMETER, INVALID_HANDLE_VALUE);
+  std::string directory, pattern, hostDir;
+  splitSearch(lpFileName, directory, pattern);
+  if (pattern.empty())
+    return failWith(ERROR_FILE_NOT_FOUND, INVALID_HANDLE_VALUE);
+  struct stat info {};
+  if (!statWindowsPath(directory.c_str(), hostDir, info))
+    return failWith(ERROR_PATH_NOT_FOUND, INVALID_HANDLE_VALUE);
+  if (!S_ISDIR(info.st_mode))
+    return failWith(ERROR_PATH_NOT_FOUND, INVALID_HANDLE_VALUE);
+  auto search = std::make_unique<FindObject>();
+  for (const std::string &name : matchingNames(hostDir, pattern)) {
+    WIN32_FIND_DATAA data;
+    if (fillFindData(hostDir, name, data))
+      search->entries.push_back(data);
+  }
+  if (search->entries.empty())
+    return failWith(ERROR_FILE_NOT_FOUND, INVALID_HANDLE_VALUE);
+  *lpFindFileData = search->entries[0];
+  search->next = 1;
+  return registerHandle(std::move(search));
+}
+
+BOOL FindNextFileA(HANDLE hFindFile, LPWIN32_FIND_DATAA lpFindFileData) {
+  if (kxlsim::shouldFail("FindNextFileA"))
+    return failWith(ERROR_NO_MORE_FILES, FALSE);
+  auto *search = lookupHandleAs<FindObject>(hFindFile);
+  if (search == nullptr || lpFindFileData == nullptr)
+    return failWith(ERROR_INVALID_HANDLE, FALSE);
+  if (search->next >= search->entries.size())
+    return failWith(ERROR_NO_MORE_FILES, FALSE);
+  *lpFindFileData = search->entries[search->next++];
+  return TRUE;
+}
+
+BOOL FindClose(HANDLE hFindFile) {
+  if (kxlsim::shouldFail("FindClose"))
+    return failWith(ERROR_INVALID_HANDLE, FALSE);
+  if (lookupHandleAs<FindObject>(hFindFile) == nullptr || !releaseHandle(hFindFile))
+    return failWith(ERROR_INVALID_HANDLE, FALSE);
+  return TRUE;
+}
+
+BOOL CreateDirectoryA(LPCSTR lpPathName, LPSECURITY_ATTRIBUTES) {
+  if (kxlsim::shouldFail("CreateDirectoryA"))
+    return failWith(ERROR_ACCESS_DENIED, FALSE);
+  std::string host;
+  if (!mapPath(lpPathName, host))
+    return FALSE;
+  if (mkdir(host.c_str(), 0777) != 0)
+    return failWith(win32ErrorFromErrno(errno, host), FALSE);
+  return TRUE;
+}
+
+BOOL RemoveDirectoryA(LPCSTR lpPathName) {
+  if (kxlsim::shouldFail("RemoveDirectoryA"))
+    return failWith(ERROR_ACCESS_DENIED, FALSE);
+  std::string host;
+  struct stat info {};
+  if (!statWindowsPath(lpPathName, host, info))
+    return FALSE;
+  if (!S_ISDIR(info.st_mode))
+    return failWith(kErrorDirectory, FALSE);
+  if (rmdir(host.c_str()) != 0)
+    return failWith(errno == EEXIST ? ERROR_DIR_NOT_EMPTY : win32ErrorFromErrno(errno, host), FALSE);
+  return TRUE;
+}
+
+BOOL DeleteFileA(LPCSTR lpFileName) {
+  if (kxlsim::shouldFail("DeleteFileA"))
+    return failWith(ERROR_ACCESS_DENIED, FALSE);
+  std::string host;
+  struct stat info {};
+  if (!statWindowsPath(lpFileName, host, info))
+    return FALSE;
+  if (S_ISDIR(info.st_mode) || isReadOnlyFile(info))
+    return failWith(ERROR_ACCESS_DENIED, FALSE);
+  if (unlink(host.c_str()) != 0)
+    return failWith(win32ErrorFromErrno(errno, host), FALSE);
+  return TRUE;
+}
+
+BOOL CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, BOOL bFailIfExists) {
+  if (kxlsim::shouldFail("CopyFileA"))
+    return failWith(ERROR_ACCESS_DENIED, FALSE);
+  std::string source, target;
+  struct stat info {
+  }, existing{};
+  if (!statWindowsPath(lpExistingFileName, source, info) || !mapPath(lpNewFileName, target))
+    return FALSE;
+  if (S_ISDIR(info.st_mode))
+    return failWith(ERROR_ACCESS_DENIED, FALSE);
+  if (stat(target.c_str(), &existing) == 0) {
+    if (bFailIfExists)
+      return failWith(ERROR_FILE_EXISTS, FALSE);
+    if (S_ISDIR(existing.st_mode) || isReadOnlyFile(existing) || existing.st_ino == info.st_ino)
+      return failWith(ERROR_ACCESS_DENIED, FALSE);
+  }
+  int from = open(source.c_str(), O_RDONLY | O_CLOEXEC);
+  if (from < 0)
+    return failWith(win32ErrorFromErrno(errno, source), FALSE);
+  int to = open(target.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, info.st_mode & 0777);
+  if (to < 0) {
+    DWORD code = win32ErrorFromErrno(errno, target);
+    close(from);
+    return failWith(code, FALSE);
+  }
+  bool copied = copyFileContents(from, to);
+  struct timespec times[2] = {info.st_atim, info.st_mtim};
+  futimens(to, times);
+  close(from);
+  if (close(to) != 0 || !copied) {
+    unlink(target.c_str());
+    return failWith(ERROR_WRITE_FAULT, FALSE);
+  }
+  return TRUE;
+}
+
+BOOL MoveFileExA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, DWORD dwFlags) {
+  if (kxlsim::shouldFail("MoveFileExA"))
+    return failWith(ERROR_ACCESS_DENIED, FALSE);
+  std::string source, target;
+  struct stat info {
+  }, existing{};
+  if (!statWindowsPath(lpExistingFileName, source, info) || !mapPath(lpNewFileName, target))
+    return FALSE;
+  target = renameTarget(source, target, lpNewFileName);
+  if (target != source && stat(target.c_str(), &existing) == 0) {
+    if ((dwFlags & MOVEFILE_REPLACE_EXISTING) == 0)
+      return failWith(ERROR_ALREADY_EXISTS, FALSE);
+    if (S_ISDIR(existing.st_mode) || S_ISDIR(info.st_mode))
+      return failWith(ERROR_ACCESS_DENIED, FALSE);
+  }
+  if (rename(source.c_str(), target.c_str()) != 0)
+    return failWith(win32ErrorFromErrno(errno, target), FALSE);
+  return TRUE;
+}
+
+int _access(const char *path, int mode) {
+  if (kxlsim::shouldFail("_access")) {
+    errno = EACCES;
+    return -1;
+  }
+  if (mode != 0 && mode != 2 && mode != 4 && mode != 6) {
+    errno = EINVAL;
+    return -1;
+  }
+  std::string host;
+  struct stat info {};
+  if (path == nullptr || !hostPath(path, host) || stat(host.c_str(), &info) != 0) {
+    errno = ENOENT;
+    return -1;
+  }
+  if ((mode & 2) != 0 && isReadOnlyFile(info)) {
+    errno = EACCES;
+    return -1;
+  }
+  return 0;
+}
+
+} // extern "C"

@@ -1,0 +1,714 @@
+// "clusapi.dll": the cluster API over the world's cluster registry.
+#include "platform/clusapi.h"
+#include "sim/common/simfail.h"
+#include "sim/posix/modules.h"
+#include "sim/posix/modules/cluster.h"
+#include "sim/posix/reghelp.h"
+#include "sim/posix/win32util.h"
+
+#include <algorithm>
+#include <cstring>
+#include <set>
+#include <string>
+#include <utility>
+#include <vector>
+
+using namespace kxlsim::posix;
+using namespace kxlsim::posix::cluster;
+
+namespace {
+
+enum class EnumKind { Cluster, Group, Resource, ResourceType };
+
+struct EnumObject : ClusterHandle {
+  EnumKind kind = EnumKind::Cluster;
+  std::vector<std::pair<DWORD, std::string>> items;
+};
+
+template <typename Handle> HANDLE asHandle(Handle handle) {
+  return static_cast<HANDLE>(handle);
+}
+
+template <typename Handle, typename Object> Handle handleFor(std::unique_ptr<Object> object) {
+  return static_cast<Handle>(registerHandle(std::move(object)));
+}
+
+std::string localComputerName() {
+  char name[256];
+  DWORD size = sizeof name;
+  return GetComputerNameA(name, &size) ? std::string(name, size) : std::string();
+}
+
+std::string clusterKeyOfMachine(const std::string &computer) {
+  return "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + computer + "\\" + kClusterKey;
+}
+
+// The state of the cluster service on the node whose cluster key is `key`.
+DWORD nodeStateAt(const std::string &key) {
+  DWORD state = ClusterStateNotInstalled;
+  if (!reg::keyExists(HKEY_LOCAL_MACHINE, key))
+    return ClusterStateNotInstalled;
+  return reg::readDword(HKEY_LOCAL_MACHINE, key, "NodeState", state) ? state : DWORD{ClusterStateNotRunning};
+}
+
+std::vector<std::string> nodeNames() {
+  std::vector<std::string> nodes = reg::subkeys(HKEY_LOCAL_MACHINE, kNodesKey);
+  if (nodes.empty())
+    nodes.push_back(localComputerName());
+  return nodes;
+}
+
+std::string resourceField(const std::string &resource, const char *field) {
+  std::string value;
+  reg::readString(HKEY_LOCAL_MACHINE, resourceKey(resource), field, value);
+  return value;
+}
+
+std::vector<std::string> dependenciesOf(const std::string &resource) {
+  std::vector<std::string> names;
+  reg::readMultiString(HKEY_LOCAL_MACHINE, resourceKey(resource), "DependsOn", names);
+  return names;
+}
+
+bool listsName(const std::vector<std::string> &names, const std::string &name) {
+  return std::any_of(names.begin(), names.end(),
+                     [&](const std::string &n) { return equalsIgnoringCase(n, name); });
+}
+
+// Resources for which `keep` holds, in the registry's order.
+template <typename Predicate> std::vector<std::string> resourcesWhere(Predicate keep) {
+  std::vector<std::string> chosen;
+  for (const std::string &name : reg::subkeys(HKEY_LOCAL_MACHINE, kResourcesKey))
+    if (keep(name))
+      chosen.push_back(name);
+  return chosen;
+}
+
+std::vector<std::string> resourcesOfField(const char *field, const std::string &value) {
+  return resourcesWhere(
+      [&](const std::string &name) { return equalsIgnoringCase(resourceField(name, field), value); });
+}
+
+std::vector<std::string> dependentsOf(const std::string &resource) {
+  return resourcesWhere([&](const std::string &name) { return listsName(dependenciesOf(name), resource); });
+}
+
+// True when `from` depends on `target`, directly or through others.
+bool dependsOnTransitively(const std::string &from, const std::string &target, std::set<std::string> &seen) {
+  if (equalsIgnoringCase(from, target))
+    return true;
+  std::string key = from;
+  std::transform(key.begin(), key.end(), key.begin(), [](unsigned char c) { return std::tolower(c); });
+  if (!seen.insert(key).second)
+    return false;
+  for (const std::string &next : dependenciesOf(from))
+    if (dependsOnTransitively(next, target, seen))
+      return true;
+  return false;
+}
+
+// Copies a name out by the cluster API's rule: counts exclude the terminator;
+// a buffer too small gives ERROR_MORE_DATA with the length needed.
+DWORD copyName(const std::string &name, LPWSTR out, LPDWORD cch) {
+  if (cch == nullptr)
+    return out == nullptr ? ERROR_SUCCESS : ERROR_INVALID_PARAMETER;
+  std::u16string wide = wideName(name);
+  if (out == nullptr || *cch <= wide.size()) {
+    *cch = static_cast<DWORD>(wide.size());
+    return out == nullptr ? ERROR_SUCCESS : ERROR_MORE_DATA;
+  }
+  std::copy(wide.begin(), wide.end(), out);
+  out[wide.size()] = 0;
+  *cch = static_cast<DWORD>(wide.size());
+  return ERROR_SUCCESS;
+}
+
+DWORD enumerate(HANDLE handle, EnumKind kind, DWORD index, LPDWORD type, LPWSTR name, LPDWORD cch) {
+  auto *enumeration = lookupHandleAs<EnumObject>(handle);
+  if (enumeration == nullptr || enumeration->kind != kind)
+    return ERROR_INVALID_HANDLE;
+  if (index >= enumeration->items.size())
+    return ERROR_NO_MORE_ITEMS;
+  if (cch == nullptr || name == nullptr)
+    return ERROR_INVALID_PARAMETER;
+  if (type != nullptr)
+    *type = enumeration->items[index].first;
+  return copyName(enumeration->items[index].second, name, cch);
+}
+
+HANDLE openEnumeration(EnumKind kind, std::vector<std::pair<DWORD, std::string>> items) {
+  auto enumeration = std::make_unique<EnumObject>();
+  enumeration->kind = kind;
+  enumeration->items = std::move(items);
+  return registerHandle(std::move(enumeration));
+}
+
+DWORD closeEnumeration(HANDLE handle, EnumKind kind) {
+  auto *enumeration = lookupHandleAs<EnumObject>(handle);
+  if (enumeration == nullptr || enumeration->kind != kind)
+    return ERROR_INVALID_HANDLE;
+  releaseHandle(handle);
+  return ERROR_SUCCESS;
+}
+
+void appendAll(std::vector<std::pair<DWORD, std::string>> &items, DWORD type,
+               const std::vector<std::string> &names) {
+  for (const std::string &name : names)
+    items.emplace_back(type, name);
+}
+
+template <typename Object> BOOL closeObject(HANDLE handle) {
+  if (lookupHandleAs<Object>(handle) == nullptr)
+    return failWith(ERROR_INVALID_HANDLE, FALSE);
+  releaseHandle(handle);
+  return TRUE;
+}
+
+// Opens the object `wide` among the subkeys of `parent` as a handle of `Object`.
+template <typename Handle, typename Object>
+Handle openNamed(HCLUSTER cluster, LPCWSTR wide, const char *parent, DWORD notFound) {
+  std::string name, stored;
+  if (lookupHandleAs<ClusterObject>(asHandle(cluster)) == nullptr)
+    return failWith(ERROR_INVALID_HANDLE, Handle{nullptr});
+  if (!narrowName(wide, name) || !findObject(parent, name, stored))
+    return failWith(notFound, Handle{nullptr});
+  auto object = std::make_unique<Object>();
+  object->name = stored;
+  return handleFor<Handle>(std::move(object));
+}
+
+GroupObject *liveGroup(HGROUP handle) {
+  auto *group = lookupHandleAs<GroupObject>(asHandle(handle));
+  std::string stored;
+  if (group == nullptr)
+    return failWith(ERROR_INVALID_HANDLE, static_cast<GroupObject *>(nullptr));
+  if (!findObject(kGroupsKey, group->name, stored))
+    return failWith(ERROR_GROUP_NOT_FOUND, static_cast<GroupObject *>(nullptr));
+  return group;
+}
+
+std::string groupKey(const std::string &group) {
+  return std::string(kGroupsKey) + "\\" + group;
+}
+
+std::string groupOwner(const std::string &group) {
+  std::string owner;
+  if (!reg::readString(HKEY_LOCAL_MACHINE, groupKey(group), "OwnerNode", owner) || owner.empty())
+    owner = localComputerName();
+  return owner;
+}
+
+// Sets the state of a group and of every resource in it.
+void setGroupState(const std::string &group, DWORD groupState, DWORD resourceState) {
+  reg::writeDword(HKEY_LOCAL_MACHINE, groupKey(group), "State", groupState);
+  for (const std::string &resource : resourcesOfField("Group", group))
+    reg::writeDword(HKEY_LOCAL_MACHINE, resourceKey(resource), "State", resourceState);
+}
+
+// Brings a resource online after what it depends on, or offline after what
+// depends on it, as the cluster service orders it.
+void setResourceState(const std::string &resource, DWORD state, std::set<std::string> &done) {
+  if (!done.insert(resource).second)
+    return;
+  const std::vector<std::string> related =
+      state == ClusterResourceOnline ? dependenciesOf(resource) : dependentsOf(resource);
+  for (const std::string &other : related)
+    if (reg::keyExists(HKEY_LOCAL_MACHINE, resourceKey(other)))
+      setResourceState(other, state, done);
+  reg::writeDword(HKEY_LOCAL_MACHINE, resourceKey(resource), "State", state);
+}
+
+DWORD changeResourceState(HRESOURCE handle, DWORD state) {
+  ResourceObject *resource = liveResource(handle);
+  if (resource == nullptr)
+    return GetLastError();
+  std::set<std::string> done;
+  setResourceState(resource->name, state, done);
+  return ERROR_SUCCESS;
+}
+
+DWORD copyOutBytes(const void *data, DWORD size, LPVOID out, DWORD capacity, LPDWORD returned) {
+  if (returned != nullptr)
+    *returned = size;
+  if (out == nullptr || capacity < size)
+    return ERROR_MORE_DATA;
+  std::memcpy(out, data, size);
+  return ERROR_SUCCESS;
+}
+
+DWORD controlText(const std::string &text, LPVOID out, DWORD capacity, LPDWORD returned) {
+  std::u16string wide = wideName(text);
+  return copyOutBytes(wide.c_str(), static_cast<DWORD>((wide.size() + 1) * sizeof(char16_t)), out, capacity,
+                      returned);
+}
+
+} // namespace
+
+namespace kxlsim::posix::clusapi {
+
+DWORD WINAPI MoveClusterGroup(HGROUP hGroup, HNODE hDestinationNode) {
+  if (kxlsim::shouldFail("MoveClusterGroup"))
+    return ERROR_CLUSTER_NODE_NOT_FOUND;
+  GroupObject *group = liveGroup(hGroup);
+  if (group == nullptr)
+    return GetLastError();
+  auto *node = lookupHandleAs<NodeObject>(asHandle(hDestinationNode));
+  if (hDestinationNode != nullptr && node == nullptr)
+    return ERROR_INVALID_HANDLE;
+  if (node != nullptr)
+    reg::writeString(HKEY_LOCAL_MACHINE, groupKey(group->name), "OwnerNode", node->name);
+  return ERROR_SUCCESS;
+}
+
+HCLUSTER WINAPI OpenCluster(LPCWSTR lpszClusterName) {
+  if (kxlsim::shouldFail("OpenCluster"))
+    return failWith(RPC_S_SERVER_UNAVAILABLE, HCLUSTER{nullptr});
+  std::string name, clusterName;
+  if (lpszClusterName != nullptr) {
+    reg::readString(HKEY_LOCAL_MACHINE, kClusterKey, "ClusterName", clusterName);
+    if (!narrowName(lpszClusterName, name) ||
+        !(equalsIgnoringCase(name, localComputerName()) || equalsIgnoringCase(name, clusterName)))
+      return failWith(RPC_S_SERVER_UNAVAILABLE, HCLUSTER{nullptr});
+  }
+  if (nodeStateAt(kClusterKey) != ClusterStateRunning)
+    return failWith(RPC_S_SERVER_UNAVAILABLE, HCLUSTER{nullptr});
+  return handleFor<HCLUSTER>(std::make_unique<ClusterObject>());
+}
+
+BOOL WINAPI CloseCluster(HCLUSTER hCluster) {
+  if (kxlsim::shouldFail("CloseCluster"))
+    return failWith(ERROR_INVALID_HANDLE, FALSE);
+  return closeObject<ClusterObject>(asHandle(hCluster));
+}
+
+HGROUP WINAPI OpenClusterGroup(HCLUSTER hCluster, LPCWSTR lpszGroupName) {
+  if (kxlsim::shouldFail("OpenClusterGroup"))
+    return failWith(ERROR_GROUP_NOT_FOUND, HGROUP{nullptr});
+  return openNamed<HGROUP, GroupObject>(hCluster, lpszGroupName, kGroupsKey, ERROR_GROUP_NOT_FOUND);
+}
+
+BOOL WINAPI CloseClusterGroup(HGROUP hGroup) {
+  if (kxlsim::shouldFail("CloseClusterGroup"))
+    return failWith(ERROR_INVALID_HANDLE, FALSE);
+  return closeObject<GroupObject>(asHandle(hGroup));
+}
+
+HNODE WINAPI OpenClusterNode(HCLUSTER hCluster, LPCWSTR lpszNodeName) {
+  if (kxlsim::shouldFail("OpenClusterNode"))
+    return failWith(ERROR_CLUSTER_NODE_NOT_FOUND, HNODE{nullptr});
+  std::string name;
+  if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
+    return failWith(ERROR_INVALID_HANDLE, HNODE{nullptr});
+  std::vector<std::string> nodes = nodeNames();
+  auto found = std::find_if(nodes.begin(), nodes.end(), [&](const std::string &node) {
+    return narrowName(lpszNodeName, name) && equalsIgnoringCase(node, name);
+  });
+  if (found == nodes.end())
+    return failWith(ERROR_CLUSTER_NODE_NOT_FOUND, HNODE{nullptr});
+  auto node = std::make_unique<NodeObject>();
+  node->name = *found;
+  return handleFor<HNODE>(std::move(node));
+}
+
+BOOL WINAPI CloseClusterNode(HNODE hNode) {
+  if (kxlsim::shouldFail("CloseClusterNode"))
+    return failWith(ERROR_INVALID_HANDLE, FALSE);
+  return closeObject<NodeObject>(asHandle(hNode));
+}
+
+HCLUSENUM WINAPI ClusterOpenEnum(HCLUSTER hCluster, DWORD dwType) {
+  if (kxlsim::shouldFail("ClusterOpenEnum"))
+    return failWith(ERROR_NOT_ENOUGH_MEMORY, HCLUSENUM{nullptr});
+  if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
+    return failWith(ERROR_INVALID_HANDLE, HCLUSENUM{nullptr});
+  std::vector<std::pair<DWORD, std::string>> items;
+  if (dwType & CLUSTER_ENUM_NODE)
+    appendAll(items, CLUSTER_ENUM_NODE, nodeNames());
+  if (dwType & CLUSTER_ENUM_RESTYPE)
+    appendAll(items, CLUSTER_ENUM_RESTYPE, reg::subkeys(HKEY_LOCAL_MACHINE, kTypesKey));
+  if (dwType & CLUSTER_ENUM_RESOURCE)
+    appendAll(items, CLUSTER_ENUM_RESOURCE, reg::subkeys(HKEY_LOCAL_MACHINE, kResourcesKey));
+  if (dwType & CLUSTER_ENUM_GROUP)
+    appendAll(items, CLUSTER_ENUM_GROUP, reg::subkeys(HKEY_LOCAL_MACHINE, kGroupsKey));
+  return static_cast<HCLUSENUM>(openEnumeration(EnumKind::Cluster, std::move(items)));
+}
+
+DWORD WINAPI ClusterEnum(HCLUSENUM hEnum, DWORD dwIndex, LPDWORD lpdwType, LPWSTR lpszName,
+                         LPDWORD lpcchName) {
+  if (kxlsim::shouldFail("ClusterEnum"))
+    return ERROR_NOT_ENOUGH_MEMORY;
+  return enumerate(asHandle(hEnum), EnumKind::Cluster, dwIndex, lpdwType, lpszName, lpcchName);
+}
+
+DWORD WINAPI ClusterCloseEnum(HCLUSENUM hEnum) {
+  if (kxlsim::shouldFail("ClusterCloseEnum"))
+    return ERROR_INVALID_HANDLE;
+  return closeEnumeration(asHandle(hEnum), EnumKind::Cluster);
+}
+
+CLUSTER_GROUP_STATE WINAPI GetClusterGroupState(HGROUP hGroup, LPWSTR lpszNodeName, LPDWORD lpcchNodeName) {
+  if (kxlsim::shouldFail("GetClusterGroupState"))
+    return failWith(ERROR_INVALID_HANDLE, ClusterGroupStateUnknown);
+  GroupObject *group = liveGroup(hGroup);
+  if (group == nullptr)
+    return ClusterGroupStateUnknown;
+  DWORD rc = copyName(groupOwner(group->name), lpszNodeName, lpcchNodeName);
+  if (rc != ERROR_SUCCESS)
+    return failWith(rc, ClusterGroupStateUnknown);
+  DWORD state = ClusterGroupOnline;
+  reg::readDword(HKEY_LOCAL_MACHINE, groupKey(group->name), "State", state);
+  return static_cast<CLUSTER_GROUP_STATE>(state);
+}
+
+HGROUPENUM WINAPI ClusterGroupOpenEnum(HGROUP hGroup, DWORD dwType) {
+  if (kxlsim::shouldFail("ClusterGroupOpenEnum"))
+    return failWith(ERROR_NOT_ENOUGH_MEMORY, HGROUPENUM{nullptr});
+  GroupObject *group = liveGroup(hGroup);
+  if (group == nullptr)
+    return HGROUPENUM{nullptr};
+  std::vector<std::pair<DWORD, std::string>> items;
+  if (dwType & CLUSTER_GROUP_ENUM_CONTAINS)
+    appendAll(items, CLUSTER_GROUP_ENUM_CONTAINS, resourcesOfField("Group", group->name));
+  if (dwType & CLUSTER_GROUP_ENUM_NODES)
+    appendAll(items, CLUSTER_GROUP_ENUM_NODES, nodeNames());
+  return static_cast<HGROUPENUM>(openEnumeration(EnumKind::Group, std::move(items)));
+}
+
+DWORD WINAPI ClusterGroupEnum(HGROUPENUM hGroupEnum, DWORD dwIndex, LPDWORD lpdwType, LPWSTR lpszResourceName,
+                              LPDWORD lpcchName) {
+  if (kxlsim::shouldFail("ClusterGroupEnum"))
+    return ERROR_NOT_ENOUGH_MEMORY;
+  return enumerate(asHandle(hGroupEnum), EnumKind::Group, dwIndex, lpdwType, lpszResourceName, lpcchName);
+}
+
+DWORD WINAPI ClusterGroupCloseEnum(HGROUPENUM hGroupEnum) {
+  if (kxlsim::shouldFail("ClusterGroupCloseEnum"))
+    return ERROR_INVALID_HANDLE;
+  return closeEnumeration(asHandle(hGroupEnum), EnumKind::Group);
+}
+
+DWORD WINAPI ClusterResourceControl(HRESOURCE hResource, HNODE, DWORD dwControlCode, LPVOID, DWORD,
+                                    LPVOID lpOutBuffer, DWORD cbOutBufferSize, LPDWORD lpBytesReturned) {
+  if (kxlsim::shouldFail("ClusterResourceControl"))
+    return ERROR_RESOURCE_NOT_FOUND;
+  if (lpBytesReturned != nullptr)
+    *lpBytesReturned = 0;
+  ResourceObject *resource = liveResource(hResource);
+  if (resource == nullptr)
+    return GetLastError();
+  switch (dwControlCode) {
+  case CLUSCTL_RESOURCE_GET_RESOURCE_TYPE:
+    return controlText(resourceField(resource->name, "Type"), lpOutBuffer, cbOutBufferSize, lpBytesReturned);
+  case CLUSCTL_RESOURCE_GET_NAME:
+    return controlText(resource->name, lpOutBuffer, cbOutBufferSize, lpBytesReturned);
+  default:
+    return ERROR_INVALID_FUNCTION;
+  }
+}
+
+DWORD WINAPI OnlineClusterGroup(HGROUP hGroup, HNODE) {
+  if (kxlsim::shouldFail("OnlineClusterGroup"))
+    return ERROR_INVALID_HANDLE;
+  GroupObject *group = liveGroup(hGroup);
+  if (group == nullptr)
+    return GetLastError();
+  setGroupState(group->name, ClusterGroupOnline, ClusterResourceOnline);
+  return ERROR_SUCCESS;
+}
+
+DWORD WINAPI OfflineClusterGroup(HGROUP hGroup) {
+  if (kxlsim::shouldFail("OfflineClusterGroup"))
+    return ERROR_INVALID_HANDLE;
+  GroupObject *group = liveGroup(hGroup);
+  if (group == nullptr)
+    return GetLastError();
+  setGroupState(group->name, ClusterGroupOffline, ClusterResourceOffline);
+  return ERROR_SUCCESS;
+}
+
+DWORD WINAPI DeleteClusterGroup(HGROUP hGroup) {
+  if (kxlsim::shouldFail("DeleteClusterGroup"))
+    return ERROR_INVALID_HANDLE;
+  GroupObject *group = liveGroup(hGroup);
+  if (group == nullptr)
+    return GetLastError();
+  if (!resourcesOfField("Group", group->name).empty())
+    return ERROR_DIR_NOT_EMPTY;
+  LONG rc = reg::deleteTree(HKEY_LOCAL_MACHINE, groupKey(group->name));
+  return rc == ERROR_SUCCESS ? ERROR_SUCCESS : static_cast<DWORD>(rc);
+}
+
+HRESENUM WINAPI ClusterResourceOpenEnum(HRESOURCE hResource, DWORD dwType) {
+  if (kxlsim::shouldFail("ClusterResourceOpenEnum"))
+    return failWith(ERROR_NOT_ENOUGH_MEMORY, HRESENUM{nullptr});
+  ResourceObject *resource = liveResource(hResource);
+  if (resource == nullptr)
+    return HRESENUM{nullptr};
+  std::vector<std::pair<DWORD, std::string>> items;
+  if (dwType & CLUSTER_RESOURCE_ENUM_DEPENDS)
+    appendAll(items, CLUSTER_RESOURCE_ENUM_DEPENDS, dependenciesOf(resource->name));
+  if (dwType & CLUSTER_RESOURCE_ENUM_PROVIDES)
+    appendAll(items, CLUSTER_RESOURCE_ENUM_PROVIDES, dependentsOf(resource->name));
+  if (dwType & CLUSTER_RESOURCE_ENUM_NODES)
+    appendAll(items, CLUSTER_RESOURCE_ENUM_NODES, nodeNames());
+  return static_cast<HRESENUM>(openEnumeration(EnumKind::Resource, std::move(items)));
+}
+
+DWORD WINAPI ClusterResourceEnum(HRESENUM hResEnum, DWORD dwIndex, LPDWORD lpdwType, LPWSTR lpszName,
+                                 LPDWORD lpcchName) {
+  if (kxlsim::shouldFail("ClusterResourceEnum"))
+    return ERROR_NOT_ENOUGH_MEMORY;
+  return enumerate(asHandle(hResEnum), EnumKind::Resource, dwIndex, lpdwType, lpszName, lpcchName);
+}
+
+DWORD WINAPI AddClusterResourceDependency(HRESOURCE hResource, HRESOURCE hDependsOn) {
+  if (kxlsim::shouldFail("AddClusterResourceDependency"))
+    return ERROR_RESOURCE_NOT_FOUND;
+  ResourceObject *resource = liveResource(hResource);
+  ResourceObject *provider = resource == nullptr ? nullptr : liveResource(hDependsOn);
+  if (provider == nullptr)
+    return GetLastError();
+  std::vector<std::string> dependencies = dependenciesOf(resource->name);
+  if (listsName(dependencies, provider->name))
+    return ERROR_DEPENDENCY_ALREADY_EXISTS;
+  std::set<std::string> seen;
+  if (dependsOnTransitively(provider->name, resource->name, seen))
+    return ERROR_CIRCULAR_DEPENDENCY;
+  dependencies.push_back(provider->name);
+  LONG rc = reg::writeMultiString(HKEY_LOCAL_MACHINE, resourceKey(resource->name), "DependsOn", dependencies);
+  return static_cast<DWORD>(rc);
+}
+
+HRESOURCE WINAPI OpenClusterResource(HCLUSTER hCluster, LPCWSTR lpszResourceName) {
+  if (kxlsim::shouldFail("OpenClusterResource"))
+    return failWith(ERROR_RESOURCE_NOT_FOUND, HRESOURCE{nullptr});
+  return openNamed<HRESOURCE, ResourceObject>(hCluster, lpszResourceName, kResourcesKey,
+                                              ERROR_RESOURCE_NOT_FOUND);
+}
+
+BOOL WINAPI CloseClusterResource(HRESOURCE hResource) {
+  if (kxlsim::shouldFail("CloseClusterResource"))
+    return failWith(ERROR_INVALID_HANDLE, FALSE);
+  return closeObject<ResourceObject>(asHandle(hResource));
+}
+
+DWORD WINAPI OnlineClusterResource(HRESOURCE hResource) {
+  if (kxlsim::shouldFail("OnlineClusterResource"))
+    return ERROR_RESOURCE_NOT_FOUND;
+  return changeResourceState(hResource, ClusterResourceOnline);
+}
+
+DWORD WINAPI OfflineClusterResource(HRESOURCE hResource) {
+  if (kxlsim::shouldFail("OfflineClusterResource"))
+    return ERROR_RESOURCE_NOT_FOUND;
+  return changeResourceState(hResource, ClusterResourceOffline);
+}
+
+// The resource goes whatever its state; resources that depended on it lose
+// that dependency rather than point at nothing.
+DWORD WINAPI DeleteClusterResource(HRESOURCE hResource) {
+  if (kxlsim::shouldFail("DeleteClusterResource"))
+    return ERROR_RESOURCE_NOT_FOUND;
+  ResourceObject *resource = liveResource(hResource);
+  if (resource == nullptr)
+    return GetLastError();
+  for (const std::string &dependent : dependentsOf(resource->name)) {
+    std::vector<std::string> kept = dependenciesOf(dependent);
+    kept.erase(std::remove_if(kept.begin(), kept.end(),
+                              [&](const std::string &n) { return equalsIgnoringCase(n, resource->name); }),
+               kept.end());
+    reg::writeMultiString(HKEY_LOCAL_MACHINE, resourceKey(dependent), "DependsOn", kept);
+  }
+  LONG rc = reg::deleteTree(HKEY_LOCAL_MACHINE, resourceKey(resource->name));
+  return static_cast<DWORD>(rc);
+}
+
+HRESOURCE WINAPI CreateClusterResource(HGROUP hGroup, LPCWSTR lpszResourceName, LPCWSTR lpszResourceType,
+                                       DWORD dwFlags) {
+  if (kxlsim::shouldFail("CreateClusterResource"))
+    return failWith(ERROR_NOT_ENOUGH_MEMORY, HRESOURCE{nullptr});
+  GroupObject *group = liveGroup(hGroup);
+  if (group == nullptr)
+    return HRESOURCE{nullptr};
+  std::string name, type, stored;
+  if (!narrowName(lpszResourceName, name))
+    return failWith(ERROR_INVALID_NAME, HRESOURCE{nullptr});
+  if (!narrowName(lpszResourceType, type) || !findObject(kTypesKey, type, stored))
+    return failWith(ERROR_RESOURCE_TYPE_NOT_FOUND, HRESOURCE{nullptr});
+  if (findObject(kResourcesKey, name, stored))
+    return failWith(ERROR_OBJECT_ALREADY_EXISTS, HRESOURCE{nullptr});
+  std::string key = resourceKey(name);
+  LONG rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "Type", type);
+  if (rc == ERROR_SUCCESS)
+    rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "Group", group->name);
+  if (rc == ERROR_SUCCESS)
+    rc = reg::writeMultiString(HKEY_LOCAL_MACHINE, key, "DependsOn", {});
+  if (rc == ERROR_SUCCESS)
+    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "State", ClusterResourceOffline);
+  if (rc == ERROR_SUCCESS)
+    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "SeparateMonitor",
+                         dwFlags & CLUSTER_RESOURCE_SEPARATE_MONITOR);
+  if (rc != ERROR_SUCCESS)
+    return failWith(static_cast<DWORD>(rc), HRESOURCE{nullptr});
+  auto resource = std::make_unique<ResourceObject>();
+  resource->name = name;
+  return handleFor<HRESOURCE>(std::move(resource));
+}
+
+CLUSTER_RESOURCE_STATE WINAPI GetClusterResourceState(HRESOURCE hResource, LPWSTR lpszNodeName,
+                                                      LPDWORD lpcchNodeName, LPWSTR lpszGroupName,
+                                                      LPDWORD lpcchGroupName) {
+  if (kxlsim::shouldFail("GetClusterResourceState"))
+    return failWith(ERROR_RESOURCE_NOT_FOUND, ClusterResourceStateUnknown);
+  ResourceObject *resource = liveResource(hResource);
+  if (resource == nullptr)
+    return ClusterResourceStateUnknown;
+  std::string group = resourceField(resource->name, "Group");
+  DWORD rc = copyName(groupOwner(group), lpszNodeName, lpcchNodeName);
+  DWORD groupRc = copyName(group, lpszGroupName, lpcchGroupName);
+  if (rc != ERROR_SUCCESS || groupRc != ERROR_SUCCESS)
+    return failWith(rc != ERROR_SUCCESS ? rc : groupRc, ClusterResourceStateUnknown);
+  DWORD state = ClusterResourceOffline;
+  reg::readDword(HKEY_LOCAL_MACHINE, resourceKey(resource->name), "State", state);
+  return static_cast<CLUSTER_RESOURCE_STATE>(state);
+}
+
+DWORD WINAPI DeleteClusterResourceType(HCLUSTER hCluster, LPCWSTR lpszResourceTypeName) {
+  if (kxlsim::shouldFail("DeleteClusterResourceType"))
+    return ERROR_RESOURCE_TYPE_NOT_FOUND;
+  if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
+    return ERROR_INVALID_HANDLE;
+  std::string type, stored;
+  if (!narrowName(lpszResourceTypeName, type) || !findObject(kTypesKey, type, stored))
+    return ERROR_RESOURCE_TYPE_NOT_FOUND;
+  if (!resourcesOfField("Type", stored).empty())
+    return ERROR_DIR_NOT_EMPTY;
+  return static_cast<DWORD>(reg::deleteTree(HKEY_LOCAL_MACHINE, std::string(kTypesKey) + "\\" + stored));
+}
+
+DWORD WINAPI CreateClusterResourceType(HCLUSTER hCluster, LPCWSTR lpszResourceTypeName,
+                                       LPCWSTR lpszDisplayName, LPCWSTR lpszResourceTypeDll,
+                                       DWORD dwLooksAlivePollInterval, DWORD dwIsAlivePollInterval) {
+  if (kxlsim::shouldFail("CreateClusterResourceType"))
+    return ERROR_NOT_ENOUGH_MEMORY;
+  if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
+    return ERROR_INVALID_HANDLE;
+  std::string type, display, dll, stored;
+  if (!narrowName(lpszResourceTypeName, type) || !narrowName(lpszDisplayName, display) ||
+      !narrowName(lpszResourceTypeDll, dll))
+    return ERROR_INVALID_PARAMETER;
+  if (findObject(kTypesKey, type, stored))
+    return ERROR_ALREADY_EXISTS;
+  std::string key = std::string(kTypesKey) + "\\" + type;
+  LONG rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "DisplayName", display);
+  if (rc == ERROR_SUCCESS)
+    rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "DllName", dll);
+  if (rc == ERROR_SUCCESS)
+    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "LooksAlivePollInterval", dwLooksAlivePollInterval);
+  if (rc == ERROR_SUCCESS)
+    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "IsAlivePollInterval", dwIsAlivePollInterval);
+  return static_cast<DWORD>(rc);
+}
+
+HRESTYPEENUM WINAPI ClusterResourceTypeOpenEnum(HCLUSTER hCluster, LPCWSTR lpszResourceTypeName,
+                                                DWORD dwType) {
+  if (kxlsim::shouldFail("ClusterResourceTypeOpenEnum"))
+    return failWith(ERROR_NOT_ENOUGH_MEMORY, HRESTYPEENUM{nullptr});
+  if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
+    return failWith(ERROR_INVALID_HANDLE, HRESTYPEENUM{nullptr});
+  std::string type, stored;
+  if (!narrowName(lpszResourceTypeName, type) || !findObject(kTypesKey, type, stored))
+    return failWith(ERROR_RESOURCE_TYPE_NOT_FOUND, HRESTYPEENUM{nullptr});
+  std::vector<std::pair<DWORD, std::string>> items;
+  if (dwType & CLUSTER_RESOURCE_TYPE_ENUM_NODES)
+    appendAll(items, CLUSTER_RESOURCE_TYPE_ENUM_NODES, nodeNames());
+  if (dwType & CLUSTER_RESOURCE_TYPE_ENUM_RESOURCES)
+    appendAll(items, CLUSTER_RESOURCE_TYPE_ENUM_RESOURCES, resourcesOfField("Type", stored));
+  return static_cast<HRESTYPEENUM>(openEnumeration(EnumKind::ResourceType, std::move(items)));
+}
+
+DWORD WINAPI ClusterResourceTypeEnum(HRESTYPEENUM hResTypeEnum, DWORD dwIndex, LPDWORD lpdwType,
+                                     LPWSTR lpszName, LPDWORD lpcchName) {
+  if (kxlsim::shouldFail("ClusterResourceTypeEnum"))
+    return ERROR_NOT_ENOUGH_MEMORY;
+  return enumerate(asHandle(hResTypeEnum), EnumKind::ResourceType, dwIndex, lpdwType, lpszName, lpcchName);
+}
+
+DWORD WINAPI ClusterResourceTypeCloseEnum(HRESTYPEENUM hResTypeEnum) {
+  if (kxlsim::shouldFail("ClusterResourceTypeCloseEnum"))
+    return ERROR_INVALID_HANDLE;
+  return closeEnumeration(asHandle(hResTypeEnum), EnumKind::ResourceType);
+}
+
+DWORD WINAPI ClusterResourceCloseEnum(HRESENUM hResEnum) {
+  if (kxlsim::shouldFail("ClusterResourceCloseEnum"))
+    return ERROR_INVALID_HANDLE;
+  return closeEnumeration(asHandle(hResEnum), EnumKind::Resource);
+}
+
+// The local node, or another machine of the world by its computer name.
+DWORD WINAPI GetNodeClusterState(LPCWSTR lpszNodeName, LPDWORD pdwClusterState) {
+  if (kxlsim::shouldFail("GetNodeClusterState"))
+    return RPC_S_SERVER_UNAVAILABLE;
+  if (pdwClusterState == nullptr)
+    return ERROR_INVALID_PARAMETER;
+  std::string node;
+  if (lpszNodeName == nullptr ||
+      (narrowName(lpszNodeName, node) && equalsIgnoringCase(node, localComputerName()))) {
+    *pdwClusterState = nodeStateAt(kClusterKey);
+    return ERROR_SUCCESS;
+  }
+  if (node.empty() || !reg::keyExists(HKEY_LOCAL_MACHINE, "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + node))
+    return RPC_S_SERVER_UNAVAILABLE;
+  *pdwClusterState = nodeStateAt(clusterKeyOfMachine(node));
+  return ERROR_SUCCESS;
+}
+
+} // namespace kxlsim::posix::clusapi
+
+namespace kxlsim::posix {
+
+const ModuleDefinition &clusapiModule() {
+  using namespace clusapi;
+  static const ModuleExport exports[] = {
+      {"AddClusterResourceDependency", exportAddress(&AddClusterResourceDependency)},
+      {"CloseCluster", exportAddress(&CloseCluster)},
+      {"CloseClusterGroup", exportAddress(&CloseClusterGroup)},
+      {"CloseClusterNode", exportAddress(&CloseClusterNode)},
+      {"CloseClusterResource", exportAddress(&CloseClusterResource)},
+      {"ClusterCloseEnum", exportAddress(&ClusterCloseEnum)},
+      {"ClusterEnum", exportAddress(&ClusterEnum)},
+      {"ClusterGroupCloseEnum", exportAddress(&ClusterGroupCloseEnum)},
+      {"ClusterGroupEnum", exportAddress(&ClusterGroupEnum)},
+      {"ClusterGroupOpenEnum", exportAddress(&ClusterGroupOpenEnum)},
+      {"ClusterOpenEnum", exportAddress(&ClusterOpenEnum)},
+      {"ClusterResourceCloseEnum", exportAddress(&ClusterResourceCloseEnum)},
+      {"ClusterResourceControl", exportAddress(&ClusterResourceControl)},
+      {"ClusterResourceEnum", exportAddress(&ClusterResourceEnum)},
+      {"ClusterResourceOpenEnum", exportAddress(&ClusterResourceOpenEnum)},
+      {"ClusterResourceTypeCloseEnum", exportAddress(&ClusterResourceTypeCloseEnum)},
+      {"ClusterResourceTypeEnum", exportAddress(&ClusterResourceTypeEnum)},
+      {"ClusterResourceTypeOpenEnum", exportAddress(&ClusterResourceTypeOpenEnum)},
+      {"CreateClusterResource", exportAddress(&CreateClusterResource)},
+      {"CreateClusterResourceType", exportAddress(&CreateClusterResourceType)},
+      {"DeleteClusterGroup", exportAddress(&DeleteClusterGroup)},
+      {"DeleteClusterResource", exportAddress(&DeleteClusterResource)},
+      {"DeleteClusterResourceType", exportAddress(&DeleteClusterResourceType)},
+      {"GetClusterGroupState", exportAddress(&GetClusterGroupState)},
+      {"GetClusterResourceState", exportAddress(&GetClusterResourceState)},
+      {"GetNodeClusterState", exportAddress(&GetNodeClusterState)},
+      {"MoveClusterGroup", exportAddress(&MoveClusterGroup)},
+      {"OfflineClusterGroup", exportAddress(&OfflineClusterGroup)},
+      {"OfflineClusterResource", exportAddress(&OfflineClusterResource)},
+      {"OnlineClusterGroup", exportAddress(&OnlineClusterGroup)},
+      {"OnlineClusterResource", exportAddress(&OnlineClusterResource)},
+      {"OpenCluster", exportAddress(&OpenCluster)},
+      {"OpenClusterGroup", exportAddress(&OpenClusterGroup)},
+      {"OpenClusterNode", exportAddress(&OpenClusterNode)},
+      {"OpenClusterResource", exportAddress(&OpenClusterResource)},
+  };
+  static const ModuleDefinition definition{"clusapi.dll", exports, sizeof exports / sizeof exports[0]};
+  return definition;
+}
+
+} // namespace kxlsim::posix

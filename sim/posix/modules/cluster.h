@@ -1,0 +1,51 @@
+// The cluster of the simulated machine, kept in its registry under
+// SOFTWARE\ZAV\KXLSIM\Cluster: "NodeState", ResourceTypes\<type>,
+// Groups\<group>, Resources\<name> ("Type", "Group", "DependsOn", "State"),
+// and optionally Nodes\<node> (else the local computer is the only node).
+// Shared by the cluster API and the resource utility library.
+#pragma once
+
+#include "platform/clusapi.h"
+#include "sim/posix/handles.h"
+
+#include <string>
+#include <vector>
+
+namespace kxlsim::posix::cluster {
+
+constexpr const char *kClusterKey = "SOFTWARE\\ZAV\\KXLSIM\\Cluster";
+constexpr const char *kResourcesKey = "SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Resources";
+constexpr const char *kGroupsKey = "SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups";
+constexpr const char *kTypesKey = "SOFTWARE\\ZAV\\KXLSIM\\Cluster\\ResourceTypes";
+constexpr const char *kNodesKey = "SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Nodes";
+
+// Cluster handles live in the kernel-object table but only their own Close*
+// functions close them.
+struct ClusterHandle : HandleObject {
+  bool closableByCloseHandle() const override { return false; }
+};
+
+struct ClusterObject : ClusterHandle {};
+
+// A group, resource or node, by its name as stored.
+struct NamedObject : ClusterHandle {
+  std::string name;
+};
+struct GroupObject : NamedObject {};
+struct ResourceObject : NamedObject {};
+struct NodeObject : NamedObject {};
+
+// Narrow (ANSI) form of a cluster object name; false for a null or empty
+// name, one the ANSI code page cannot hold, or one with a backslash.
+bool narrowName(LPCWSTR wide, std::string &narrow);
+std::u16string wideName(const std::string &narrow);
+
+// The stored spelling of `name` among the subkeys of `parent`; false when none.
+bool findObject(const char *parent, const std::string &name, std::string &stored);
+
+std::string resourceKey(const std::string &name);
+
+// A resource handle whose resource still exists, or null (error set).
+ResourceObject *liveResource(HRESOURCE handle);
+
+} // namespace kxlsim::posix::cluster

@@ -1,0 +1,163 @@
+#include "sim/posix/reghelp.h"
+
+namespace kxlsim::posix::reg {
+
+Key::~Key() {
+  if (key_ != nullptr)
+    RegCloseKey(key_);
+}
+
+LONG Key::open(HKEY root, const std::string &path, REGSAM access) {
+  return RegOpenKeyExA(root, path.c_str(), 0, access, &key_);
+}
+
+LONG Key::create(HKEY root, const std::string &path) {
+  return RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_ALL_ACCESS, nullptr,
+                         &key_, nullptr);
+}
+
+namespace {
+
+// The raw data of a value and its type; false when it is missing.
+bool readRaw(HKEY root, const std::string &path, const char *value, DWORD &type, std::string &data) {
+  Key key;
+  if (key.open(root, path) != ERROR_SUCCESS)
+    return false;
+  DWORD size = 0;
+  if (RegQueryValueExA(key.get(), value, nullptr, &type, nullptr, &size) != ERROR_SUCCESS)
+    return false;
+  data.assign(size, '\0');
+  if (size == 0)
+    return true;
+  if (RegQueryValueExA(key.get(), value, nullptr, &type, reinterpret_cast<LPBYTE>(data.data()), &size) !=
+      ERROR_SUCCESS)
+    return false;
+  data.resize(size);
+  return true;
+}
+
+LONG writeRaw(HKEY root, const std::string &path, const char *value, DWORD type, const std::string &data) {
+  Key key;
+  LONG rc = key.create(root, path);
+  if (rc != ERROR_SUCCESS)
+    return rc;
+  return RegSetValueExA(key.get(), value, 0, type, reinterpret_cast<const BYTE *>(data.data()),
+                        static_cast<DWORD>(data.size()));
+}
+
+std::string untilNul(const std::string &data) {
+  return data.substr(0, data.find('\0'));
+}
+
+} // namespace
+
+bool keyExists(HKEY root, const std::string &path) {
+  Key key;
+  return key.open(root, path) == ERROR_SUCCESS;
+}
+
+bool readString(HKEY root, const std::string &path, const char *value, std::string &out) {
+  DWORD type = REG_NONE;
+  std::string data;
+  if (!readRaw(root, path, value, type, data) || (type != REG_SZ && type != REG_EXPAND_SZ))
+    return false;
+  out = untilNul(data);
+  return true;
+}
+
+bool readDword(HKEY root, const std::string &path, const char *value, DWORD &out) {
+  DWORD type = REG_NONE;
+  std::string data;
+  if (!readRaw(root, path, value, type, data) || type != REG_DWORD || data.size() != sizeof(DWORD))
+    return false;
+  const auto *bytes = reinterpret_cast<const unsigned char *>(data.data());
+  out = static_cast<DWORD>(bytes[0]) | static_cast<DWORD>(bytes[1]) << 8 |
+        static_cast<DWORD>(bytes[2]) << 16 | static_cast<DWORD>(bytes[3]) << 24;
+  return true;
+}
+
+bool readMultiString(HKEY root, const std::string &path, const char *value, std::vector<std::string> &out) {
+  DWORD type = REG_NONE;
+  std::string data;
+  if (!readRaw(root, path, value, type, data) || type != REG_MULTI_SZ)
+    return false;
+  out.clear();
+  size_t start = 0;
+  while (start < data.size()) {
+    size_t end = data.find('\0', start);
+    if (end == std::string::npos)
+      end = data.size();
+    if (end == start)
+      break;
+    out.push_back(data.substr(start, end - start));
+    start = end + 1;
+  }
+  return true;
+}
+
+LONG writeString(HKEY root, const std::string &path, const char *value, const std::string &data) {
+  return writeRaw(root, path, value, REG_SZ, data + '\0');
+}
+
+LONG writeDword(HKEY root, const std::string &path, const char *value, DWORD data) {
+  std::string bytes(4, '\0');
+  for (int i = 0; i < 4; ++i)
+    bytes[static_cast<size_t>(i)] = static_cast<char>((data >> (8 * i)) & 0xFF);
+  return writeRaw(root, path, value, REG_DWORD, bytes);
+}
+
+LONG writeMultiString(HKEY root, const std::string &path, const char *value,
+                      const std::vector<std::string> &data) {
+  std::string bytes;
+  for (const std::string &item : data)
+    bytes += item + '\0';
+  bytes += '\0';
+  return writeRaw(root, path, value, REG_MULTI_SZ, bytes);
+}
+
+std::vector<std::string> subkeys(HKEY root, const std::string &path) {
+  std::vector<std::string> names;
+  Key key;
+  if (key.open(root, path) != ERROR_SUCCESS)
+    return names;
+  char name[256];
+  for (DWORD index = 0;; ++index) {
+    DWORD length = sizeof name;
+    if (RegEnumKeyExA(key.get(), index, name, &length, nullptr, nullptr, nullptr, nullptr) != ERROR_SUCCESS)
+      break;
+    names.emplace_back(name, length);
+  }
+  return names;
+}
+
+std::vector<std::pair<std::string, std::string>> stringValues(HKEY root, const std::string &path) {
+  std::vector<std::pair<std::string, std::string>> values;
+  Key key;
+  if (key.open(root, path) != ERROR_SUCCESS)
+    return values;
+  char name[16384];
+  std::string data(4096, '\0');
+  for (DWORD index = 0;; ++index) {
+    DWORD nameLength = sizeof name;
+    DWORD type = REG_NONE;
+    DWORD size = static_cast<DWORD>(data.size());
+    LONG rc = RegEnumValueA(key.get(), index, name, &nameLength, nullptr, &type,
+                            reinterpret_cast<LPBYTE>(data.data()), &size);
+    if (rc == ERROR_MORE_DATA && size > data.size()) {
+      data.assign(size, '\0');
+      --index;
+      continue;
+    }
+    if (rc != ERROR_SUCCESS)
+      break;
+    if (type == REG_SZ || type == REG_EXPAND_SZ)
+      values.emplace_back(std::string(name, nameLength), untilNul(data.substr(0, size)));
+  }
+  return values;
+}
+
+LONG deleteTree(HKEY root, const std::string &path) {
+  return SHDeleteKeyA(root, path.c_str());
+}
+
+} // namespace kxlsim::posix::reg
