@@ -1,0 +1,164 @@
+// Installations: the current copy, switching between copies, and the instance
+// registry (SOFTWARE\ZAV\KXLSIM\Instances\<NAME>: "Directory", "Copy").
+#include "platform/kxlsys.h"
+#include "sim/common/simfail.h"
+#include "sim/product/installation.h"
+#include "sim/product/regutil.h"
+
+#include <cstring>
+#include <new>
+#include <string>
+#include <vector>
+
+struct OSSInstanceList {
+  std::vector<std::string> names;
+  size_t next = 0;
+};
+
+namespace {
+
+using kxlprod::CopyInfo;
+
+std::string instancesKey() {
+  return std::string(kxlprod::kSimRoot) + "\\Instances";
+}
+
+// Fills `info` from the instance's registry entry; false when it has none.
+bool readInstance(const std::string &name, OSSInstanceInfo_t &info) {
+  std::string key = instancesKey() + "\\" + name;
+  std::string directory;
+  if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Directory", directory) != ERROR_SUCCESS)
+    return false;
+  std::string copyName;
+  kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Copy", copyName);
+  std::memset(&info, 0, sizeof info);
+  info.version = 1;
+  info.size = sizeof info;
+  info.instanceType = OSS_INSTANCE_TYPE_SERVER;
+  kxlprod::copyBounded(name, info.instanceName, sizeof info.instanceName);
+  kxlprod::copyBounded(directory, info.instanceDir, sizeof info.instanceDir);
+  kxlprod::copyBounded(copyName, info.copyName, sizeof info.copyName);
+  CopyInfo copy;
+  if (kxlprod::findCopy(copyName.empty() ? kxlprod::kV8CopyName : copyName, copy))
+    kxlprod::copyBounded(copy.path, info.installPath, sizeof info.installPath);
+  return true;
+}
+
+// The instance's registry name as stored (case preserved), found ignoring case.
+bool findInstanceName(const std::string &wanted, std::string &stored) {
+  std::vector<std::string> names;
+  if (kxlprod::listSubkeys(HKEY_LOCAL_MACHINE, instancesKey(), names) != ERROR_SUCCESS)
+    return false;
+  for (const std::string &name : names) {
+    if (kxlprod::sameName(name, wanted)) {
+      stored = name;
+      return true;
+    }
+  }
+  return false;
+}
+
+uint32_t adminServerInfo(OSSInstanceInfo_t &info) {
+  std::string name;
+  if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, std::string(kxlprod::kSimRoot) + "\\AdminServer", "Name",
+                             name) != ERROR_SUCCESS ||
+      name.empty())
+    return OSS_RC_NOT_FOUND;
+  std::string stored;
+  if (!findInstanceName(name, stored) || !readInstance(stored, info)) {
+    // An administration server without an instance entry: its name is all there is.
+    std::memset(&info, 0, sizeof info);
+    info.version = 1;
+    info.size = sizeof info;
+    kxlprod::copyBounded(name, info.instanceName, sizeof info.instanceName);
+  }
+  info.instanceType = OSS_INSTANCE_TYPE_ADMIN;
+  return 0;
+}
+
+} // namespace
+
+extern "C" {
+
+int32_t sqloGetCurrentInstallationName(char *buffer, uint32_t size) {
+  if (kxlsim::shouldFail("sqloGetCurrentInstallationName"))
+    return SQLO_RC_NO_INSTALLATION;
+  if (buffer == nullptr || size == 0)
+    return SQLO_RC_INVALID_ARGUMENT;
+  buffer[0] = '\0';
+  CopyInfo copy;
+  if (!kxlprod::currentCopy(copy))
+    return SQLO_RC_NO_INSTALLATION;
+  if (!kxlprod::copyBounded(copy.name, buffer, size)) {
+    buffer[0] = '\0';
+    return SQLO_RC_INVALID_ARGUMENT;
+  }
+  return 0;
+}
+
+int32_t sqloSwitchToInstallationName(const char *copyName) {
+  if (kxlsim::shouldFail("sqloSwitchToInstallationName"))
+    return SQLO_RC_NO_INSTALLATION;
+  if (copyName == nullptr || copyName[0] == '\0')
+    return SQLO_RC_INVALID_ARGUMENT;
+  CopyInfo target;
+  if (!kxlprod::findCopy(copyName, target))
+    return SQLO_RC_NO_INSTALLATION;
+  CopyInfo own;
+  bool isOwn = kxlprod::ownCopy(own) && kxlprod::sameName(own.name, target.name);
+  kxlprod::setSwitchedCopy(isOwn ? std::string() : target.name);
+  return 0;
+}
+
+uint32_t ossOpenInstanceList(const char *product, OSSInstanceListHandle *handle, bool, bool) {
+  if (kxlsim::shouldFail("ossOpenInstanceList"))
+    return OSS_RC_FAILED;
+  if (product == nullptr || handle == nullptr)
+    return OSS_RC_NULL_ARGUMENT;
+  *handle = nullptr;
+  auto *list = new (std::nothrow) OSSInstanceList;
+  if (list == nullptr)
+    return OSS_RC_NO_MEMORY;
+  if (kxlprod::listSubkeys(HKEY_LOCAL_MACHINE, instancesKey(), list->names) != ERROR_SUCCESS) {
+    delete list;
+    return OSS_RC_FAILED;
+  }
+  *handle = list;
+  return 0;
+}
+
+uint32_t ossGetNextInstance(OSSInstanceListHandle handle, OSSInstanceInfo_t *info, bool) {
+  if (kxlsim::shouldFail("ossGetNextInstance"))
+    return OSS_RC_FAILED;
+  if (handle == nullptr || info == nullptr)
+    return OSS_RC_NULL_ARGUMENT;
+  // Entries removed since the list was opened are passed over.
+  while (handle->next < handle->names.size()) {
+    if (readInstance(handle->names[handle->next++], *info))
+      return 0;
+  }
+  std::memset(info, 0, sizeof *info);
+  return OSS_RC_END_OF_LIST;
+}
+
+uint32_t ossCloseInstanceList(OSSInstanceListHandle handle) {
+  // The iteration state goes even when the close reports a failure.
+  bool fail = kxlsim::shouldFail("ossCloseInstanceList");
+  delete handle;
+  return fail ? OSS_RC_FAILED : 0;
+}
+
+uint32_t ossGetInstanceInfo(const char *name, uint32_t, const char *, OSSInstanceInfo_t *info, bool) {
+  if (kxlsim::shouldFail("ossGetInstanceInfo"))
+    return OSS_RC_FAILED;
+  if (name == nullptr || info == nullptr)
+    return OSS_RC_NULL_ARGUMENT;
+  if (std::strcmp(name, OSS_ADMIN_SERVER_INSTANCE) == 0)
+    return adminServerInfo(*info);
+  std::string stored;
+  if (!findInstanceName(name, stored) || !readInstance(stored, *info))
+    return OSS_RC_NOT_FOUND;
+  return 0;
+}
+
+} // extern "C"

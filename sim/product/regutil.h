@@ -1,0 +1,35 @@
+// Small registry and text helpers shared by the product library's families.
+// Internal to the product library.
+#pragma once
+
+#include "platform/win32.h"
+
+#include <string>
+#include <vector>
+
+namespace kxlprod {
+
+// Byte-wise equality ignoring ASCII case.
+bool sameName(const std::string &a, const std::string &b);
+
+// A string value of `root`\`path` (REG_SZ or REG_EXPAND_SZ, at most 4096 bytes).
+// Returns the registry's result code; `value` is set only on success.
+LONG readRegString(HKEY root, const std::string &path, const char *name, std::string &value);
+
+// Writes a REG_SZ value, creating the key when it is missing.
+LONG writeRegString(HKEY root, const std::string &path, const char *name, const std::string &value);
+
+// Removes a value; ERROR_FILE_NOT_FOUND when key or value is missing.
+LONG deleteRegValue(HKEY root, const std::string &path, const char *name);
+
+bool regKeyExists(HKEY root, const std::string &path);
+
+// Subkey names of `root`\`path` in enumeration order. A missing key gives an
+// empty list and ERROR_SUCCESS; other failures are returned.
+LONG listSubkeys(HKEY root, const std::string &path, std::vector<std::string> &names);
+
+// Copies `text` into `buffer` of `size` bytes, cut to fit and terminated.
+// Returns false when it had to be cut (or there is no room at all).
+bool copyBounded(const std::string &text, char *buffer, size_t size);
+
+} // namespace kxlprod

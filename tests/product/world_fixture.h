@@ -1,0 +1,158 @@
+// A machine of its own for every product library test: a fresh temporary world
+// on non-Windows hosts. On Windows the world is the machine itself, so the cases
+// run only where that machine is disposable (KXL_TEST_DISPOSABLE_MACHINE=1,
+// e.g. a throw-away Wine prefix) and remove SOFTWARE\ZAV afterwards.
+#pragma once
+
+#include "platform/kxlsys.h"
+#include "platform/win32.h"
+#include "sim/common/simfail.h"
+#include "sim/product/state.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <string>
+
+#ifndef _WIN32
+#include "sim/posix/world.h"
+
+#include <filesystem>
+#include <fstream>
+#include <unistd.h>
+#include <vector>
+#endif
+
+namespace kxltest {
+
+inline void setProcessVariable(const char *name, const char *value) {
+#ifdef _WIN32
+  _putenv_s(name, value != nullptr ? value : "");
+#else
+  if (value != nullptr)
+    setenv(name, value, 1);
+  else
+    unsetenv(name);
+#endif
+}
+
+class ProductWorld : public ::testing::Test {
+protected:
+  void SetUp() override {
+#ifdef _WIN32
+    const char *disposable = std::getenv("KXL_TEST_DISPOSABLE_MACHINE");
+    if (disposable == nullptr || std::string(disposable) != "1")
+      GTEST_SKIP() << "the product library cases change HKLM; set KXL_TEST_DISPOSABLE_MACHINE=1";
+#else
+    std::string pattern = (std::filesystem::temp_directory_path() / "kxlprod.XXXXXX").string();
+    std::vector<char> name(pattern.begin(), pattern.end());
+    name.push_back('\0');
+    ASSERT_NE(mkdtemp(name.data()), nullptr) << "cannot create a temporary world";
+    root_ = name.data();
+    writeHostText("system.reg", "REGEDIT4\n\n");
+    writeHostText("user.reg", "REGEDIT4\n\n");
+    std::filesystem::create_directories(std::filesystem::path(root_) / "drive_c");
+    setProcessVariable("KXLSIM_ROOT", root_.c_str());
+    kxlsim::posix::resetWorldRoot();
+#endif
+    started_ = true;
+    resetProcess();
+  }
+
+  void TearDown() override {
+    if (!started_)
+      return;
+    resetProcess();
+#ifdef _WIN32
+    SHDeleteKeyA(HKEY_LOCAL_MACHINE, "SOFTWARE\\ZAV");
+#else
+    std::error_code ignored;
+    std::filesystem::remove_all(root_, ignored);
+    setProcessVariable("KXLSIM_ROOT", nullptr);
+    kxlsim::posix::resetWorldRoot();
+#endif
+  }
+
+  // KXLSIM_FAIL for the rest of the case ("name:n,...").
+  static void failCalls(const char *spec) {
+    setProcessVariable("KXLSIM_FAIL", spec);
+    kxlsim::resetFaults();
+  }
+
+  // Writes a string value under HKEY_LOCAL_MACHINE (the key is created).
+  static void setString(const std::string &path, const char *name, const std::string &value) {
+    HKEY key = nullptr;
+    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS,
+                                             nullptr, &key, nullptr));
+    LONG rc = RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
+                             static_cast<DWORD>(value.size() + 1));
+    RegCloseKey(key);
+    ASSERT_EQ(ERROR_SUCCESS, rc);
+  }
+
+  // A string value under HKEY_LOCAL_MACHINE, or "<missing>".
+  static std::string getString(const std::string &path, const char *name) {
+    HKEY key = nullptr;
+    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
+      return "<missing>";
+    char data[1024] = {};
+    DWORD size = sizeof data - 1;
+    LONG rc = RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(data), &size);
+    RegCloseKey(key);
+    return rc == ERROR_SUCCESS ? std::string(data) : "<missing>";
+  }
+
+  // A copy registered under InstalledCopies with its installation path.
+  static void registerCopy(const std::string &copy, const std::string &path) {
+    setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\" + copy, "KXL Path Name", path);
+  }
+
+  // The version-8 installation in the single-copy layout.
+  static void registerV8(const std::string &path) {
+    setString("SOFTWARE\\ZAV\\KXL\\CurrentVersion", "Version", "8");
+    setString("SOFTWARE\\ZAV\\KXL", "KXL Path Name", path);
+  }
+
+  // An instance in the instance registry ("" copy: the version-8 installation).
+  static void registerInstance(const std::string &name, const std::string &directory,
+                               const std::string &copy) {
+    std::string key = "SOFTWARE\\ZAV\\KXLSIM\\Instances\\" + name;
+    setString(key, "Directory", directory);
+    setString(key, "Copy", copy);
+  }
+
+  // Creates every missing directory of a Windows path.
+  static void makeDirectories(const std::string &windowsPath) {
+    for (size_t at = windowsPath.find('\\', 3);; at = windowsPath.find('\\', at + 1)) {
+      CreateDirectoryA(windowsPath.substr(0, at).c_str(), nullptr);
+      if (at == std::string::npos)
+        return;
+    }
+  }
+
+#ifndef _WIN32
+  // Host directory of the world.
+  const std::string &worldRoot() const {
+    return root_;
+  }
+#endif
+
+private:
+  static void resetProcess() {
+    setProcessVariable("KXLSIM_FAIL", nullptr);
+    setProcessVariable("KXLINSTANCE", nullptr);
+    kxlsim::resetFaults();
+    kxlprod::resetLibraryState();
+  }
+
+#ifndef _WIN32
+  void writeHostText(const char *relative, const char *text) {
+    std::ofstream out(std::filesystem::path(root_) / relative, std::ios::binary);
+    out << text;
+  }
+  std::string root_;
+#endif
+  bool started_ = false;
+};
+
+} // namespace kxltest
