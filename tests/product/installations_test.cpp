@@ -1,0 +1,169 @@
+// Installed copies, the current installation and the instance registry.
+#include "world_fixture.h"
+
+#include <map>
+#include <string>
+
+#ifndef _WIN32
+#include <filesystem>
+#endif
+
+namespace {
+
+class InstallationsTest : public kxltest::ProductWorld {
+protected:
+  // Windows folder of the running test program.
+  static std::string ownFolder() {
+    char module[1024] = {};
+    DWORD length = GetModuleFileNameA(nullptr, module, sizeof module);
+    std::string path(module, length);
+    return path.substr(0, path.find_last_of('\\'));
+  }
+
+  // Reads every instance through the iteration: name -> directory|copy.
+  static std::map<std::string, std::string> allInstances(uint32_t &endCode) {
+    std::map<std::string, std::string> found;
+    OSSInstanceListHandle handle = nullptr;
+    endCode = ossOpenInstanceList("KXL", &handle, false, false);
+    if (endCode != 0)
+      return found;
+    OSSInstanceInfo_t info{};
+    while ((endCode = ossGetNextInstance(handle, &info, false)) == 0)
+      found[info.instanceName] = std::string(info.instanceDir) + "|" + info.copyName;
+    ossCloseInstanceList(handle);
+    return found;
+  }
+
+  // Runs the probe from `folder` (a Windows path in the world); the name it found.
+  std::string probeFrom(const std::string &folder, DWORD &exitCode) {
+    makeDirectories(folder);
+    std::string target = folder + "\\probe.exe";
+#ifdef _WIN32
+    EXPECT_TRUE(CopyFileA(KXL_PRODUCT_PROBE, target.c_str(), FALSE));
+#else
+    std::string host;
+    EXPECT_TRUE(kxlsim::posix::hostPath(target, host));
+    std::filesystem::create_symlink(KXL_PRODUCT_PROBE, host);
+#endif
+    STARTUPINFOA startup{};
+    startup.cb = sizeof startup;
+    PROCESS_INFORMATION process{};
+    std::string commandLine = "\"" + target + "\"";
+    if (!CreateProcessA(target.c_str(), commandLine.data(), nullptr, nullptr, FALSE, 0, nullptr, nullptr,
+                        &startup, &process)) {
+      ADD_FAILURE() << "probe did not start";
+      return std::string();
+    }
+    WaitForSingleObject(process.hProcess, INFINITE);
+    GetExitCodeProcess(process.hProcess, &exitCode);
+    CloseHandle(process.hProcess);
+    CloseHandle(process.hThread);
+    return getString("SOFTWARE\\ZAV\\KXLSIM\\Test", "CurrentCopy");
+  }
+};
+
+TEST_F(InstallationsTest, InstanceRecordLayoutMatchesItsReaders) {
+  EXPECT_EQ(sizeof(OSSInstanceInfo_t), 2712u);
+  EXPECT_EQ(offsetof(OSSInstanceInfo_t, instanceName), 16u);
+  EXPECT_EQ(offsetof(OSSInstanceInfo_t, instanceDir), 144u);
+  EXPECT_EQ(offsetof(OSSInstanceInfo_t, copyName), 2576u);
+  EXPECT_EQ(sizeof(sqlca), 136u);
+  EXPECT_EQ(offsetof(sqlca, sqlcode), 12u);
+  EXPECT_EQ(offsetof(sqlca, sqlerrp), 88u);
+  EXPECT_EQ(offsetof(SQLO_EXEC_RESULT, exitCode), 4u);
+  EXPECT_EQ(sizeof(OSSPathParam), 32u);
+}
+
+TEST_F(InstallationsTest, IterationListsEveryInstanceOfEveryCopyThenEnds) {
+  registerInstance("KXL", "C:\\KXL8\\KXL", "");
+  registerInstance("INST1", "C:\\Program Files\\KXL\\V95\\INST1", "V95");
+  registerInstance("INST2", "\\\\SRV\\SHARE\\INST2", "V101");
+  uint32_t end = 0;
+  auto found = allInstances(end);
+  EXPECT_EQ(end, OSS_RC_END_OF_LIST);
+  ASSERT_EQ(found.size(), 3u);
+  EXPECT_EQ(found["KXL"], "C:\\KXL8\\KXL|");
+  EXPECT_EQ(found["INST1"], "C:\\Program Files\\KXL\\V95\\INST1|V95");
+  EXPECT_EQ(found["INST2"], "\\\\SRV\\SHARE\\INST2|V101");
+}
+
+TEST_F(InstallationsTest, EmptyRegistryEndsAtOnceAndEndIsRepeated) {
+  OSSInstanceListHandle handle = nullptr;
+  ASSERT_EQ(0u, ossOpenInstanceList("KXL", &handle, false, false));
+  OSSInstanceInfo_t info{};
+  info.instanceName[0] = 'X';
+  EXPECT_EQ(OSS_RC_END_OF_LIST, ossGetNextInstance(handle, &info, false));
+  EXPECT_EQ(info.instanceName[0], '\0');
+  EXPECT_EQ(OSS_RC_END_OF_LIST, ossGetNextInstance(handle, &info, false));
+  EXPECT_EQ(0u, ossCloseInstanceList(handle));
+}
+
+TEST_F(InstallationsTest, AdministrationServerIsFoundByItsPseudoName) {
+  OSSInstanceInfo_t info{};
+  EXPECT_EQ(OSS_RC_NOT_FOUND, ossGetInstanceInfo("DAS", 0, nullptr, &info, false));
+  setString("SOFTWARE\\ZAV\\KXLSIM\\AdminServer", "Name", "KXLDAS00");
+  ASSERT_EQ(0u, ossGetInstanceInfo("DAS", 0, nullptr, &info, false));
+  EXPECT_STREQ(info.instanceName, "KXLDAS00");
+  EXPECT_EQ(info.instanceType, OSS_INSTANCE_TYPE_ADMIN);
+
+  registerInstance("INST1", "C:\\P\\INST1", "V95");
+  ASSERT_EQ(0u, ossGetInstanceInfo("inst1", 0, nullptr, &info, false));
+  EXPECT_STREQ(info.instanceName, "INST1");
+  EXPECT_STREQ(info.instanceDir, "C:\\P\\INST1");
+  EXPECT_EQ(OSS_RC_NOT_FOUND, ossGetInstanceInfo("NONE", 0, nullptr, &info, false));
+}
+
+TEST_F(InstallationsTest, CurrentInstallationIsTheCopyHoldingTheProgram) {
+  registerCopy("V95", "C:\\Program Files\\KXL\\V95\\");
+  registerCopy("V101", "c:\\program files\\kxl\\v101");
+  DWORD exitCode = 99;
+  EXPECT_EQ(probeFrom("C:\\Program Files\\KXL\\V101\\bin", exitCode), "V101");
+  EXPECT_EQ(exitCode, 0u);
+  EXPECT_EQ(probeFrom("C:\\Program Files\\KXL\\V95\\bin", exitCode), "V95");
+
+  // A folder whose name merely begins like a copy's path is not inside it.
+  EXPECT_EQ(probeFrom("C:\\Program Files\\KXL\\V1010\\bin", exitCode), "");
+  EXPECT_EQ(exitCode, 1u);
+}
+
+TEST_F(InstallationsTest, VersionEightInstallationIsKnownByItsFixedName) {
+  registerV8("C:\\KXL8");
+  DWORD exitCode = 99;
+  EXPECT_EQ(probeFrom("C:\\KXL8\\bin", exitCode), "KXLV8");
+}
+
+TEST_F(InstallationsTest, SwitchingChangesTheCurrentInstallationUntilSwitchedBack) {
+  registerCopy("V101", ownFolder());
+  registerCopy("V95", "C:\\KXL\\V95");
+  char name[SQLO_COPY_NAME_SZ];
+  ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
+  EXPECT_STREQ(name, "V101");
+  ASSERT_EQ(0, sqloSwitchToInstallationName("v95"));
+  ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
+  EXPECT_STREQ(name, "V95");
+  EXPECT_EQ(SQLO_RC_NO_INSTALLATION, sqloSwitchToInstallationName("V77"));
+  ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
+  EXPECT_STREQ(name, "V95") << "a refused switch keeps the current installation";
+  ASSERT_EQ(0, sqloSwitchToInstallationName("V101"));
+  ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
+  EXPECT_STREQ(name, "V101");
+
+  char small[3];
+  EXPECT_NE(0, sqloGetCurrentInstallationName(small, sizeof small));
+  EXPECT_EQ(small[0], '\0');
+}
+
+TEST_F(InstallationsTest, InjectedFaultsFailOpeningAndFetching) {
+  registerInstance("INST1", "C:\\P\\INST1", "V95");
+  failCalls("ossOpenInstanceList:1");
+  OSSInstanceListHandle handle = nullptr;
+  EXPECT_NE(0u, ossOpenInstanceList("KXL", &handle, false, false));
+  failCalls("ossGetNextInstance:1");
+  uint32_t end = 0;
+  auto found = allInstances(end);
+  EXPECT_NE(end, 0u);
+  EXPECT_NE(end, OSS_RC_END_OF_LIST);
+  EXPECT_TRUE(found.empty());
+}
+
+} // namespace

@@ -1,0 +1,195 @@
+// Environment values, profile variables of both registry layouts, and other
+// machines' registries.
+#include "world_fixture.h"
+
+#include <string>
+#include <vector>
+
+namespace {
+
+class ProfileTest : public kxltest::ProductWorld {
+protected:
+  void SetUp() override {
+    ProductWorld::SetUp();
+    if (IsSkipped() || HasFatalFailure())
+      return;
+    char module[1024] = {};
+    DWORD length = GetModuleFileNameA(nullptr, module, sizeof module);
+    std::string path(module, length);
+    registerCopy("V101", path.substr(0, path.find_last_of('\\')));
+    registerCopy("V95", "C:\\KXL\\V95");
+    registerV8("C:\\KXL8");
+  }
+
+  static std::string read(uint32_t variable, const char *profile, uint32_t size = 0) {
+    char value[SQLO_PREG_VALUE_SZ];
+    std::memset(value, 'x', sizeof value);
+    int32_t rc = sqloPRegValuePE(SQLO_PREG_GET, &variable, 0, value, profile, -1, size);
+    return rc == 0 ? std::string(value) : "<rc " + std::to_string(rc) + ">";
+  }
+
+  static std::vector<std::string> profiles() {
+    std::vector<std::string> names;
+    char name[SQLO_PREG_PROFILE_SZ];
+    int32_t rc = sqloPRegProfile(SQLO_PREG_FIRST, name);
+    for (; rc == 0; rc = sqloPRegProfile(SQLO_PREG_NEXT, name))
+      names.emplace_back(name);
+    EXPECT_EQ(rc, SQLO_RC_PREG_END);
+    return names;
+  }
+
+  static constexpr const char *kV95 = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V95";
+};
+
+TEST_F(ProfileTest, CurrentInstanceValueReachesTheEnvironment) {
+  char *value = nullptr;
+  ASSERT_EQ(0, sqloGetEnvInternal(KXL_VAR_KXLINSTANCE, &value));
+  EXPECT_EQ(value, nullptr);
+  ASSERT_EQ(0, sqloPutEnv(KXL_VAR_KXLINSTANCE, "INST1"));
+  ASSERT_EQ(0, sqlo_force_refresh_env());
+  char seen[32] = {};
+  EXPECT_EQ(GetEnvironmentVariableA("KXLINSTANCE", seen, sizeof seen), 5u);
+  EXPECT_STREQ(seen, "INST1");
+  ASSERT_EQ(0, sqloGetEnvInternal(KXL_VAR_KXLINSTANCE, &value));
+  ASSERT_NE(value, nullptr);
+  EXPECT_STREQ(value, "INST1");
+  ASSERT_EQ(0, sqloPutEnv(KXL_VAR_KXLINSTANCE, ""));
+  ASSERT_EQ(0, sqloGetEnvInternal(KXL_VAR_KXLINSTANCE, &value));
+  EXPECT_EQ(value, nullptr);
+  EXPECT_EQ(SQLO_RC_PREG_BAD_VARIABLE, sqloPutEnv(54, "x"));
+}
+
+TEST_F(ProfileTest, EnvironmentFallsBackToTheProfileRegistry) {
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLEXTRAAGENTS", "3");
+  char *value = nullptr;
+  ASSERT_EQ(0, sqloGetEnvInternal(KXL_VAR_KXLEXTRAAGENTS, &value));
+  ASSERT_NE(value, nullptr);
+  EXPECT_STREQ(value, "3");
+  ASSERT_EQ(0, sqloPutEnv(KXL_VAR_KXLEXTRAAGENTS, "5"));
+  ASSERT_EQ(0, sqloGetEnvInternal(KXL_VAR_KXLEXTRAAGENTS, &value));
+  EXPECT_STREQ(value, "5");
+  ASSERT_EQ(0, sqloPutEnv(KXL_VAR_KXLEXTRAAGENTS, nullptr));
+}
+
+TEST_F(ProfileTest, InstanceLevelWinsOverGlobalLevel) {
+  std::string copy = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101";
+  setString(copy + "\\GLOBAL_PROFILE", "KXLPORTRANGE", "60000:60003");
+  setString(copy + "\\GLOBAL_PROFILE", "KXLRESERVEDINST", "INST1");
+  setString(copy + "\\PROFILES\\INST1", "KXLPORTRANGE", "50000:50004");
+  sqloPutEnv(KXL_VAR_KXLINSTANCE, "INST1");
+  EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, nullptr), "50000:50004");
+  EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, "KXLGLOBALPF"), "60000:60003");
+  EXPECT_EQ(read(KXL_VAR_KXLRESERVEDINST, nullptr), "INST1") << "the instance level falls back to global";
+  EXPECT_EQ(read(KXL_VAR_KXLRESERVEDINST, "INST1"), "<rc " + std::to_string(SQLO_RC_PREG_NOT_SET) + ">");
+  sqloPutEnv(KXL_VAR_KXLINSTANCE, "INST2");
+  EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, nullptr), "60000:60003");
+}
+
+TEST_F(ProfileTest, ValuesAreCutToTheCapacity) {
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLRESERVEDINST", "LONGNAME12345");
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLPORTRANGE", "60000:60003");
+  EXPECT_EQ(read(KXL_VAR_KXLRESERVEDINST, "KXLGLOBALPF"), "LONGNAME") << "an instance name has 8 characters";
+  EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, "KXLGLOBALPF", 6), "60000");
+}
+
+TEST_F(ProfileTest, SwitchedInstallationReadsItsOwnProfilesInBothLayouts) {
+  setString(std::string(kV95) + "\\GLOBAL_PROFILE", "KXLRESERVEDINST", "OLD95");
+  setString(std::string(kV95) + "\\PROFILES\\INST1", "KXLWORKSTATION", "YES");
+  setString("SOFTWARE\\ZAV\\KXL\\GLOBAL_PROFILE", "KXLRESERVEDINST", "OLD8");
+  setString("SOFTWARE\\ZAV\\KXL\\PROFILES\\KXL", "KXLWORKSTATION", "NO");
+  EXPECT_EQ(read(KXL_VAR_KXLRESERVEDINST, "KXLGLOBALPF"),
+            "<rc " + std::to_string(SQLO_RC_PREG_NOT_SET) + ">");
+
+  ASSERT_EQ(0, sqloSwitchToInstallationName("V95"));
+  ASSERT_EQ(0, sqloPRegProfilePE(SQLO_PREG_REFRESH, nullptr, -1));
+  EXPECT_EQ(read(KXL_VAR_KXLRESERVEDINST, "KXLGLOBALPF"), "OLD95");
+  EXPECT_EQ(read(KXL_VAR_KXLWORKSTATION, "INST1"), "YES");
+
+  ASSERT_EQ(0, sqloSwitchToInstallationName("KXLV8"));
+  EXPECT_EQ(read(KXL_VAR_KXLRESERVEDINST, "KXLGLOBALPF"), "OLD8");
+  EXPECT_EQ(read(KXL_VAR_KXLWORKSTATION, "KXL"), "NO");
+  ASSERT_EQ(0, sqloSwitchToInstallationName("V101"));
+}
+
+TEST_F(ProfileTest, SettingWritesTheInstanceOrGlobalLevel) {
+  uint32_t var = KXL_VAR_KXLNODECOMPUTER;
+  char value[] = "NODE1";
+  EXPECT_EQ(SQLO_RC_PREG_NO_PROFILE, sqloPRegValuePE(SQLO_PREG_SET, &var, 0, value, "INST9", -1, 0));
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST9", "KXLPORTRANGE", "1:2");
+  ASSERT_EQ(0, sqloPRegValuePE(SQLO_PREG_SET, &var, 0, value, "INST9", -1, 0));
+  EXPECT_EQ(getString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST9", "KXLNODECOMPUTER"),
+            "NODE1");
+  ASSERT_EQ(0, sqloPRegValue(SQLO_PREG_SET, &var, 0, value, "KXLGLOBALPF"));
+  EXPECT_EQ(getString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLNODECOMPUTER"),
+            "NODE1");
+  ASSERT_EQ(0, sqloPRegValue(SQLO_PREG_UNSET, &var, 0, nullptr, "INST9"));
+  EXPECT_EQ(getString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST9", "KXLNODECOMPUTER"),
+            "<missing>");
+  uint32_t unknown = 1234;
+  EXPECT_EQ(SQLO_RC_PREG_BAD_VARIABLE, sqloPRegValue(SQLO_PREG_GET, &unknown, 0, value, nullptr));
+}
+
+TEST_F(ProfileTest, ProfileEnumerationListsTheInstancesThenEnds) {
+  EXPECT_TRUE(profiles().empty());
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST1", "KXLPORTRANGE", "1:2");
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST2", "KXLPORTRANGE", "1:2");
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLPORTRANGE", "1:2");
+  EXPECT_EQ(profiles(), (std::vector<std::string>{"INST1", "INST2"}));
+  char name[SQLO_PREG_PROFILE_SZ];
+  EXPECT_EQ(SQLO_RC_PREG_END, sqloPRegProfile(SQLO_PREG_NEXT, name)) << "the end is repeated";
+}
+
+TEST_F(ProfileTest, FlagTextsReadAsTrueOrFalse) {
+  EXPECT_EQ(1, sqloStr2Flag("yes"));
+  EXPECT_EQ(1, sqloStr2Flag("ON"));
+  EXPECT_EQ(1, sqloStr2Flag("1"));
+  EXPECT_EQ(0, sqloStr2Flag("NO"));
+  EXPECT_EQ(0, sqloStr2Flag("YESS"));
+  EXPECT_EQ(0, sqloStr2Flag(nullptr));
+}
+
+TEST_F(ProfileTest, OtherMachinesAreReachedThroughTheirSubtree) {
+  SQLO_PREG_MACHINE *machine = nullptr;
+  EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE, sqloPRegMachineOpen("NODE2", &machine));
+  EXPECT_EQ(machine, nullptr);
+
+  setString("SOFTWARE\\ZAV\\KXLSIM\\Machines\\NODE2\\SOFTWARE\\ZAV\\KXL\\GLOBAL_PROFILE", "KXLPATH",
+            "D:\\KXL");
+  ASSERT_EQ(0, sqloPRegMachineOpen("node2", &machine));
+  ASSERT_NE(machine, nullptr);
+  char data[64] = {};
+  DWORD size = sizeof data;
+  HKEY key = nullptr;
+  ASSERT_EQ(ERROR_SUCCESS,
+            RegOpenKeyExA(machine->hklm, "SOFTWARE\\ZAV\\KXL\\GLOBAL_PROFILE", 0, KEY_READ, &key));
+  EXPECT_EQ(ERROR_SUCCESS,
+            RegQueryValueExA(key, "KXLPATH", nullptr, nullptr, reinterpret_cast<BYTE *>(data), &size));
+  RegCloseKey(key);
+  EXPECT_STREQ(data, "D:\\KXL");
+
+  // Opening the local machine through the same handle releases NODE2 first.
+  char local[64] = {};
+  DWORD localSize = sizeof local;
+  ASSERT_TRUE(GetComputerNameA(local, &localSize));
+  ASSERT_EQ(0, sqloPRegMachineOpen(local, &machine));
+  EXPECT_EQ(machine->hklm, HKEY_LOCAL_MACHINE);
+  EXPECT_EQ(0, sqloPRegMachineClose(&machine));
+  EXPECT_EQ(machine, nullptr);
+  EXPECT_EQ(0, sqloPRegMachineClose(&machine));
+}
+
+TEST_F(ProfileTest, InjectedFaultsFailProfileAndMachineCalls) {
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLPORTRANGE", "1:2");
+  failCalls("sqloPRegValuePE:1,sqloPRegMachineOpen:1,sqloPutEnv:1");
+  EXPECT_NE(read(KXL_VAR_KXLPORTRANGE, "KXLGLOBALPF"), "1:2");
+  EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, "KXLGLOBALPF"), "1:2");
+  SQLO_PREG_MACHINE *machine = nullptr;
+  EXPECT_NE(0, sqloPRegMachineOpen(nullptr, &machine));
+  EXPECT_EQ(machine, nullptr);
+  EXPECT_NE(0, sqloPutEnv(KXL_VAR_KXLINSTANCE, "INST1"));
+  char *value = nullptr;
+  ASSERT_EQ(0, sqloGetEnvInternal(KXL_VAR_KXLINSTANCE, &value));
+  EXPECT_EQ(value, nullptr);
+}
+
+} // namespace

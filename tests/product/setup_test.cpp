@@ -1,0 +1,77 @@
+// Status blocks and the process control block.
+#include "world_fixture.h"
+
+#include <string>
+
+namespace {
+
+using SetupTest = kxltest::ProductWorld;
+
+TEST_F(SetupTest, InitialisedBlockCarriesItsIdAndSizeOnly) {
+  sqlca ca;
+  std::memset(&ca, 0x5A, sizeof ca);
+  sqloinca(&ca);
+  EXPECT_EQ(std::string(ca.sqlcaid, 8), "SQLCA   ");
+  EXPECT_EQ(ca.sqlcabc, 136);
+  EXPECT_EQ(ca.sqlcode, 0);
+  EXPECT_EQ(ca.sqlerrml, 0);
+  EXPECT_EQ(ca.sqlerrp[0], '\0');
+}
+
+TEST_F(SetupTest, TokensAreJoinedBySeparatorAndCutToTheField) {
+  sqlca ca;
+  sqloinca(&ca);
+  const char *two[] = {"USER1", "X"};
+  ASSERT_EQ(0, sqlegsca(-1092, 2, nullptr, two, &ca));
+  EXPECT_EQ(ca.sqlcode, -1092);
+  EXPECT_EQ(std::string(ca.sqlerrmc, ca.sqlerrml), std::string("USER1\xFFX"));
+
+  // A token length shorter than the text limits what is taken.
+  const uint64_t lengths[] = {3};
+  ASSERT_EQ(0, sqlegsca(-1092, 1, lengths, two, &ca));
+  EXPECT_EQ(std::string(ca.sqlerrmc, ca.sqlerrml), "USE");
+
+  std::string longToken(100, 'T');
+  const char *one[] = {longToken.c_str()};
+  ASSERT_EQ(0, sqlegsca(-1092, 1, nullptr, one, &ca));
+  EXPECT_EQ(ca.sqlerrml, 70);
+  EXPECT_EQ(std::string(ca.sqlerrp, 8), std::string(8, '\0')) << "tokens must stay inside sqlerrmc";
+}
+
+TEST_F(SetupTest, ResultCodesBecomeSqlcodesWithTheProducerTag) {
+  sqlca ca;
+  sqloinca(&ca);
+  ASSERT_EQ(0, sqlzRcToSqlca(0, &ca, "KXLIUPGRADE", -1403, 0, 0));
+  EXPECT_EQ(ca.sqlcode, -1403);
+  EXPECT_EQ(std::string(ca.sqlerrp, 8), "KXLIUPGR");
+
+  // A library code is no SQLCODE: it is reported as a system error naming the code.
+  ASSERT_EQ(0, sqlzRcToSqlca(0, &ca, "KXLIUPGRADE", SQLO_RC_IO_ERROR, 0, 0));
+  EXPECT_EQ(ca.sqlcode, -1042);
+  EXPECT_EQ(std::string(ca.sqlerrmc, ca.sqlerrml), "0x870F0004");
+}
+
+TEST_F(SetupTest, ControlBlockAndCharacterSetAreUsableAtOnce) {
+  ASSERT_NE(sqlz_krcbp, nullptr);
+  auto *bytes = reinterpret_cast<unsigned char *>(sqlz_krcbp);
+  sqlz_krcbp->utilityMode = 1;
+  EXPECT_EQ(bytes[SQLZ_KRCB_UTILITY_MODE] | bytes[SQLZ_KRCB_UTILITY_MODE + 1] << 8, 1);
+  ASSERT_GT(std::strlen(sqlz_charset), 13u);
+  std::string names(sqlz_charset + 13);
+  EXPECT_NE(names.find('A'), std::string::npos);
+  EXPECT_NE(names.find('_'), std::string::npos);
+  EXPECT_EQ(names.find('.'), std::string::npos);
+}
+
+TEST_F(SetupTest, InjectedFaultsFailTheNamedCallOnly) {
+  failCalls("sqlegsca:2,ossOneTimeOnly:1");
+  EXPECT_NE(0u, ossOneTimeOnly());
+  EXPECT_EQ(0u, ossOneTimeOnly());
+  sqlca ca;
+  sqloinca(&ca);
+  EXPECT_EQ(0, sqlegsca(-1, 0, nullptr, nullptr, &ca));
+  EXPECT_NE(0, sqlegsca(-2, 0, nullptr, nullptr, &ca));
+  EXPECT_EQ(ca.sqlcode, -1) << "a failed call leaves the block alone";
+}
+
+} // namespace
