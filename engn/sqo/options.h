@@ -1,0 +1,103 @@
+// The run's one option and result record. It is cleared with zero bytes at
+// start-up, filled by the command line, and read by every later step: the
+// checks, the upgrade engine and the message printer.
+#pragma once
+
+#include "platform/kxlsys.h"
+
+#include <cstdint>
+
+// ---------------------------------------------------------------------------
+// Field capacities (bytes, terminator included)
+// ---------------------------------------------------------------------------
+inline constexpr uint32_t UPGRADE_AUTH_NAME_SZ = 20;     // -a value, 19 characters
+inline constexpr uint32_t UPGRADE_PATH_SZ = 261;         // -p value and install path
+inline constexpr uint32_t UPGRADE_USER_NAME_SZ = 31;     // -u name, 30 characters
+inline constexpr uint32_t UPGRADE_PASSWORD_SZ = 256;     // password, 255 characters
+inline constexpr uint32_t UPGRADE_INSTANCE_NAME_SZ = 9;  // 8 characters
+inline constexpr uint32_t UPGRADE_PROGRAM_NAME_SZ = 256; // "KXLIUPGRADE" or "KXLIMIGR"
+inline constexpr uint32_t UPGRADE_TS_SERVICE_SZ = 15;    // text search service, 14 characters
+inline constexpr uint32_t UPGRADE_CLUSTER_NAME_SZ = 16;  // cluster name
+inline constexpr uint32_t UPGRADE_PORT_TEXT_SZ = 10;     // port or service entry text
+inline constexpr uint32_t UPGRADE_HOST_NAME_SZ = 256;    // TCP/IP host name
+inline constexpr uint32_t UPGRADE_COMPUTER_NAME_SZ = 16; // Windows computer name
+inline constexpr uint32_t UPGRADE_NET_NAME_SZ = 256;     // network name of partition 0
+inline constexpr uint32_t UPGRADE_MAX_TOKENS = 2;        // message tokens in the record
+
+// ---------------------------------------------------------------------------
+// Bits of UpgradeOptions::flags
+// ---------------------------------------------------------------------------
+inline constexpr uint16_t UPGRADE_FLAG_TOOL = 0x01;               // always set by this tool
+inline constexpr uint16_t UPGRADE_FLAG_AUTH_TYPE = 0x02;          // authType is to be applied (-a)
+inline constexpr uint16_t UPGRADE_FLAG_PROFILE_PATH_MOVES = 0x04; // profile path changes with the upgrade
+inline constexpr uint16_t UPGRADE_FLAG_INSTALLER = 0x08;          // installer mode (-install)
+inline constexpr uint16_t UPGRADE_FLAG_FORCE_COPY_NAME = 0x10;    // force-copy-name mode (-forcecn)
+inline constexpr uint16_t UPGRADE_FLAG_ENGINE = 0x20;             // tested by the upgrade engine only
+inline constexpr uint16_t UPGRADE_FLAG_CONTENT_EXTENDER = 0x40;   // current copy has the content extender
+
+// ---------------------------------------------------------------------------
+// Authentication type codes (-a)
+// ---------------------------------------------------------------------------
+inline constexpr uint16_t UPGRADE_AUTH_SERVER = 0;
+inline constexpr uint16_t UPGRADE_AUTH_CLIENT = 1;
+inline constexpr uint16_t UPGRADE_AUTH_DCS = 2;
+inline constexpr uint16_t UPGRADE_AUTH_DCE = 3;
+inline constexpr uint16_t UPGRADE_AUTH_SERVER_ENCRYPT = 4;
+inline constexpr uint16_t UPGRADE_AUTH_DCS_ENCRYPT = 5;
+inline constexpr uint16_t UPGRADE_AUTH_DCE_SERVER_ENCRYPT = 6;
+inline constexpr uint16_t UPGRADE_AUTH_KERBEROS = 7;
+inline constexpr uint16_t UPGRADE_AUTH_KERBEROS_SERVER_ENCRYPT = 8;
+
+// ---------------------------------------------------------------------------
+// Result codes of the front end (the absolute value is the message number)
+// ---------------------------------------------------------------------------
+inline constexpr int32_t UPGRADE_RC_USAGE = -1946; // usage message
+inline constexpr int32_t UPGRADE_RC_BAD_INSTANCE_NAME = -1916;
+inline constexpr int32_t UPGRADE_RC_BAD_PROFILE_PATH = -1920;
+inline constexpr int32_t UPGRADE_RC_BAD_ACCOUNT = -1921;
+inline constexpr int32_t UPGRADE_RC_BAD_TEXT_SEARCH = -1934;
+inline constexpr int32_t UPGRADE_RC_TEXT_SEARCH_RANGE = -1701;
+inline constexpr int32_t UPGRADE_RC_ADMIN_SERVER = -1954;
+inline constexpr int32_t UPGRADE_RC_NO_COPY = -1918;
+inline constexpr int32_t UPGRADE_RC_INSTANCE_UNKNOWN = 1951;
+inline constexpr int32_t UPGRADE_RC_RESERVED_INSTANCE = -1139;
+inline constexpr int32_t UPGRADE_RC_BAD_VERSION = -1949;
+inline constexpr int32_t UPGRADE_RC_ALREADY_UPGRADED = 1950;
+inline constexpr int32_t UPGRADE_RC_SQLCA = -1; // the status block holds the reason
+
+// The instance-creation block that the services step hands to the instance
+// environment step. The front end writes only the text search fields.
+struct PartitionRecord {
+  char portStart[UPGRADE_PORT_TEXT_SZ];        // first communication port or service entry
+  char portEnd[UPGRADE_PORT_TEXT_SZ];          // last port
+  char hostName[UPGRADE_HOST_NAME_SZ];         // TCP/IP host name of partition 0
+  char computerName[UPGRADE_COMPUTER_NAME_SZ]; // Windows computer name of partition 0
+  char netName[UPGRADE_NET_NAME_SZ];           // network name written after the partition entry
+  char clusterName[UPGRADE_CLUSTER_NAME_SZ];   // the instance's cluster, filled by the engine
+  uint8_t serviceStepFlag;                     // 1 once the services step runs the creation
+  char textSearchService[UPGRADE_TS_SERVICE_SZ];
+  uint16_t textSearchPort;      // 1024..65535, 0 when none was given
+  uint8_t textSearchRequested;  // 1 once a -j value has been accepted
+  int32_t textSearchReasonCode; // written by the instance creation (warning 1273)
+  int32_t extraMessage;         // further message number, written by the instance creation
+};
+
+struct UpgradeOptions {
+  char authTypeName[UPGRADE_AUTH_NAME_SZ];
+  uint16_t authType; // valid only with UPGRADE_FLAG_AUTH_TYPE
+  char profilePath[UPGRADE_PATH_SZ];
+  uint8_t quiet;
+  uint8_t partitionedInstance; // node type 4
+  char userName[UPGRADE_USER_NAME_SZ];
+  char password[UPGRADE_PASSWORD_SZ];
+  PartitionRecord partitionRecord;
+  char instanceName[UPGRADE_INSTANCE_NAME_SZ]; // upper case
+  uint32_t oldInstanceType;                    // node type the current copy cannot host (message 1231)
+  uint32_t newInstanceType;                    // node type the current copy supports
+  char currentInstallPath[UPGRADE_PATH_SZ];
+  uint16_t flags; // UPGRADE_FLAG_*
+  sqlca status;
+  uint8_t tokenCount; // valid entries of tokens, 0..2
+  const char *tokens[UPGRADE_MAX_TOKENS];
+  char programName[UPGRADE_PROGRAM_NAME_SZ];
+};
