@@ -1,0 +1,71 @@
+// Instances of one installed copy, from the platform's instance registry, each
+// with its cluster membership and a snapshot of its database manager
+// configuration file kxlsystm.
+#pragma once
+
+#include "install/ilist.h"
+
+#include <cstdint>
+
+class InstallCopy;
+
+inline constexpr uint32_t KXLI_INSTANCE_NAME_SZ = 9; // 8 characters
+inline constexpr uint32_t KXLI_INSTANCE_DIR_SZ = 256;
+inline constexpr uint32_t KXLI_CLUSTER_NAME_SZ = 256;
+inline constexpr uint32_t KXLI_DBM_CFG_IMAGE_SZ = 16384;
+inline constexpr uint32_t KXLI_NODE_TYPE_OFFSET = 40; // u16, little-endian
+
+class IKXLINSTANCE {
+public:
+  // An empty holder: ReloadDbmCfg with a directory, then GetNodeType.
+  IKXLINSTANCE();
+  // name cut to 8 characters, instanceDir to 255. Reads the kxlsystm snapshot
+  // (a missing file leaves it zero) and, with an owner, "KXLCLUSTER" of the
+  // instance's profile key.
+  IKXLINSTANCE(const char *name, InstallCopy *owner, const char *instanceDir);
+  virtual ~IKXLINSTANCE();
+  IKXLINSTANCE(const IKXLINSTANCE &) = delete;
+  IKXLINSTANCE &operator=(const IKXLINSTANCE &) = delete;
+
+  // String getters: 0, KXLI_RC_NULL_ARGUMENT for a null buffer,
+  // KXLI_RC_BUFFER_TOO_SMALL when size < length + 1.
+  uint32_t GetName(char *buffer, uint32_t size) const;
+  uint32_t GetInstanceDir(char *buffer, uint32_t size) const;
+  uint32_t GetClusterName(char *buffer, uint32_t size) const;
+  // instanceDir without its last component "\" + name.
+  uint32_t GetInstanceParentDir(char *buffer, uint32_t size) const;
+  // The owner's name; KXLI_RC_NOT_USABLE without an owner.
+  uint32_t GetCopyName(char *buffer, uint32_t size) const;
+  InstallCopy *GetOwner() const { return owner; }
+
+  // The node type word of the snapshot (1 to 5 for a real instance).
+  uint16_t GetNodeType() const;
+  // Replaces the snapshot from dir\kxlsystm (instanceDir when dir is null).
+  // KXLI_RC_NULL_ARGUMENT when the file cannot be opened; the snapshot then
+  // stays as it was.
+  uint32_t ReloadDbmCfg(const char *dir);
+
+  InstallCopy *owner; // not owned
+  char instanceDir[KXLI_INSTANCE_DIR_SZ];
+  char name[KXLI_INSTANCE_NAME_SZ];
+  char clusterName[KXLI_CLUSTER_NAME_SZ];
+  uint8_t isClustered;
+  unsigned char dbmCfgImage[KXLI_DBM_CFG_IMAGE_SZ];
+
+private:
+  void readClusterName();
+};
+
+class IKXLINSTANCELIST : public ILIST<IKXLINSTANCE> {
+public:
+  // The instances whose owning copy is `owner` (for the version-8 copy: the
+  // instances registered without a copy name). status 0 built, 1 failed.
+  explicit IKXLINSTANCELIST(InstallCopy *owner);
+  virtual ~IKXLINSTANCELIST();
+
+  // As InstallCopyList::Find, by instance name.
+  uint32_t Find(const char *name, IKXLINSTANCE **out);
+
+  InstallCopy *owner; // not owned
+  uint32_t status;
+};
