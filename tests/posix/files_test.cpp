@@ -1,0 +1,217 @@
+// Files, searches and directories of the world, with Windows' codes.
+#include "world_fixture.h"
+
+#include <cerrno>
+#include <cstdlib>
+#include <set>
+#include <string>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <vector>
+
+namespace kxlposixtest {
+namespace {
+
+using FilesTest = WorldTest;
+
+std::vector<std::string> findAll(const char *pattern) {
+  std::vector<std::string> names;
+  WIN32_FIND_DATAA data;
+  HANDLE search = FindFirstFileA(pattern, &data);
+  if (search == INVALID_HANDLE_VALUE)
+    return names;
+  do
+    names.push_back(data.cFileName);
+  while (FindNextFileA(search, &data));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_NO_MORE_FILES));
+  EXPECT_TRUE(FindClose(search));
+  return names;
+}
+
+TEST_F(FilesTest, AttributesTellDirectoriesFilesAndWhichPartIsMissing) {
+  makeFile("drive_c/Data/Report.txt", "x");
+  EXPECT_EQ(GetFileAttributesA("C:\\Data"), static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY));
+  EXPECT_EQ(GetFileAttributesA("c:\\DATA\\report.TXT"), static_cast<DWORD>(FILE_ATTRIBUTE_ARCHIVE));
+  chmod(host("drive_c/Data/Report.txt").c_str(), 0444);
+  EXPECT_EQ(GetFileAttributesA("C:\\Data\\Report.txt"),
+            static_cast<DWORD>(FILE_ATTRIBUTE_ARCHIVE | FILE_ATTRIBUTE_READONLY));
+
+  EXPECT_EQ(GetFileAttributesA("C:\\Data\\absent.txt"), INVALID_FILE_ATTRIBUTES);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
+  EXPECT_EQ(GetFileAttributesA("C:\\Nowhere\\absent.txt"), INVALID_FILE_ATTRIBUTES);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_PATH_NOT_FOUND));
+}
+
+TEST_F(FilesTest, SearchReturnsNamesAsStoredAndMatchesWildcardsIgnoringCase) {
+  makeFile("drive_c/Inst/MixedCase.CFG");
+  makeFile("drive_c/Inst/other.cfg");
+  makeFile("drive_c/Inst/notes.txt");
+
+  WIN32_FIND_DATAA data;
+  HANDLE search = FindFirstFileA("C:\\inst\\mixedcase.cfg", &data);
+  ASSERT_NE(search, INVALID_HANDLE_VALUE);
+  EXPECT_STREQ(data.cFileName, "MixedCase.CFG");
+  EXPECT_FALSE(FindNextFileA(search, &data));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_NO_MORE_FILES));
+  FindClose(search);
+
+  EXPECT_EQ(findAll("C:\\Inst\\*.cfg"), (std::vector<std::string>{"MixedCase.CFG", "other.cfg"}));
+  EXPECT_EQ(findAll("C:\\Inst\\?otes.*"), (std::vector<std::string>{"notes.txt"}));
+  EXPECT_EQ(findAll("C:\\Inst\\*").size(), 5u) << "'.' and '..' come first outside a drive root";
+  EXPECT_EQ(findAll("C:\\Inst\\*")[0], ".");
+}
+
+TEST_F(FilesTest, SearchFailuresCarryWindowsCodes) {
+  makeDir("drive_c/Inst");
+  WIN32_FIND_DATAA data;
+  EXPECT_EQ(FindFirstFileA("C:\\Inst\\", &data), INVALID_HANDLE_VALUE);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
+  EXPECT_EQ(FindFirstFileA("C:\\Inst\\*.none", &data), INVALID_HANDLE_VALUE);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
+  EXPECT_EQ(FindFirstFileA("C:\\Missing\\*", &data), INVALID_HANDLE_VALUE);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_PATH_NOT_FOUND));
+  EXPECT_FALSE(FindClose(INVALID_HANDLE_VALUE));
+}
+
+TEST_F(FilesTest, DirectoriesAreCreatedAndRemovedWithWindowsCodes) {
+  EXPECT_TRUE(CreateDirectoryA("C:\\Made", nullptr));
+  EXPECT_FALSE(CreateDirectoryA("C:\\made", nullptr));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_ALREADY_EXISTS));
+  EXPECT_FALSE(CreateDirectoryA("C:\\No\\Parent", nullptr));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_PATH_NOT_FOUND));
+
+  makeFile("drive_c/Made/file.txt");
+  EXPECT_FALSE(RemoveDirectoryA("C:\\Made"));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_DIR_NOT_EMPTY));
+  EXPECT_FALSE(DeleteFileA("C:\\Made"));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_ACCESS_DENIED));
+  EXPECT_TRUE(DeleteFileA("C:\\Made\\FILE.txt"));
+  EXPECT_TRUE(RemoveDirectoryA("C:\\Made"));
+  EXPECT_FALSE(exists("drive_c/Made"));
+}
+
+TEST_F(FilesTest, CreateFileDispositionsAndHandleRoundTrip) {
+  makeDir("drive_c/F");
+  HANDLE file = CreateFileA("C:\\F\\a.bin", GENERIC_READ | GENERIC_WRITE, 0, nullptr, CREATE_NEW, 0, nullptr);
+  ASSERT_NE(file, INVALID_HANDLE_VALUE);
+  DWORD written = 0;
+  ASSERT_TRUE(WriteFile(file, "abcdef", 6, &written, nullptr));
+  EXPECT_EQ(written, 6u);
+  EXPECT_EQ(GetFileSize(file, nullptr), 6u);
+  EXPECT_EQ(SetFilePointer(file, -2, nullptr, FILE_END), 4u);
+  char buffer[8] = {};
+  DWORD read = 0;
+  ASSERT_TRUE(ReadFile(file, buffer, sizeof buffer, &read, nullptr));
+  EXPECT_EQ(std::string(buffer, read), "ef");
+  EXPECT_EQ(SetFilePointer(file, -10, nullptr, FILE_BEGIN), INVALID_SET_FILE_POINTER);
+  EXPECT_TRUE(CloseHandle(file));
+  EXPECT_FALSE(CloseHandle(file));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_INVALID_HANDLE));
+
+  EXPECT_EQ(CreateFileA("C:\\F\\a.bin", GENERIC_WRITE, 0, nullptr, CREATE_NEW, 0, nullptr),
+            INVALID_HANDLE_VALUE);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_EXISTS));
+  EXPECT_EQ(CreateFileA("C:\\F\\b.bin", GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr),
+            INVALID_HANDLE_VALUE);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
+  file = CreateFileA("C:\\F\\A.BIN", GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS, 0, nullptr);
+  ASSERT_NE(file, INVALID_HANDLE_VALUE);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_ALREADY_EXISTS));
+  EXPECT_EQ(GetFileSize(file, nullptr), 0u) << "CREATE_ALWAYS truncates";
+  CloseHandle(file);
+}
+
+TEST_F(FilesTest, CopyAndMoveRespectExistingTargets) {
+  makeFile("drive_c/M/src.txt", "payload");
+  makeFile("drive_c/M/dst.txt", "old");
+  EXPECT_FALSE(CopyFileA("C:\\M\\src.txt", "C:\\M\\dst.txt", TRUE));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_EXISTS));
+  EXPECT_TRUE(CopyFileA("C:\\M\\src.txt", "C:\\M\\dst.txt", FALSE));
+  EXPECT_EQ(readFile(host("drive_c/M/dst.txt")), "payload");
+  EXPECT_FALSE(CopyFileA("C:\\M\\none.txt", "C:\\M\\x.txt", FALSE));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
+
+  EXPECT_FALSE(MoveFileExA("C:\\M\\src.txt", "C:\\M\\dst.txt", 0));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_ALREADY_EXISTS));
+  EXPECT_TRUE(MoveFileExA("C:\\M\\src.txt", "C:\\M\\dst.txt", MOVEFILE_REPLACE_EXISTING));
+  EXPECT_FALSE(exists("drive_c/M/src.txt"));
+  EXPECT_TRUE(MoveFileExA("C:\\M\\dst.txt", "C:\\M\\DST.TXT", 0)) << "a rename in another letter case";
+  EXPECT_TRUE(exists("drive_c/M/DST.TXT"));
+  EXPECT_FALSE(exists("drive_c/M/dst.txt"));
+}
+
+TEST_F(FilesTest, AccessFollowsTheReadOnlyAttribute) {
+  makeFile("drive_c/A/ro.txt");
+  chmod(host("drive_c/A/ro.txt").c_str(), 0444);
+  EXPECT_EQ(_access("C:\\A\\RO.TXT", 0), 0);
+  EXPECT_EQ(_access("C:\\A\\ro.txt", 4), 0);
+  errno = 0;
+  EXPECT_EQ(_access("C:\\A\\ro.txt", 6), -1);
+  EXPECT_EQ(errno, EACCES);
+  EXPECT_EQ(_access("C:\\A\\ro.txt", 1), -1);
+  EXPECT_EQ(errno, EINVAL);
+  EXPECT_EQ(_access("C:\\A\\none.txt", 0), -1);
+  EXPECT_EQ(errno, ENOENT);
+}
+
+TEST_F(FilesTest, CurrentDirectoryIsAWindowsPathWithWindowsBufferRules) {
+  makeDir("drive_c/Work/Sub");
+  ASSERT_TRUE(SetCurrentDirectoryA("c:\\work\\sub"));
+  char buffer[MAX_PATH];
+  EXPECT_EQ(GetCurrentDirectoryA(sizeof buffer, buffer), 11u);
+  EXPECT_STREQ(buffer, "C:\\Work\\Sub");
+  char small[4] = "abc";
+  EXPECT_EQ(GetCurrentDirectoryA(sizeof small, small), 12u) << "size needed, terminator included";
+  EXPECT_STREQ(small, "abc");
+
+  makeFile("drive_c/Work/file.txt");
+  EXPECT_FALSE(SetCurrentDirectoryA("C:\\Work\\file.txt"));
+  EXPECT_EQ(GetLastError(), 267u);
+  EXPECT_FALSE(SetCurrentDirectoryA("C:\\Work\\none"));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
+
+  ASSERT_EQ(chdir("/"), 0);
+  EXPECT_EQ(GetCurrentDirectoryA(sizeof buffer, buffer), 3u);
+  EXPECT_STREQ(buffer, "C:\\") << "outside the world";
+}
+
+TEST_F(FilesTest, TempPathIsAnExistingFolderOfDriveC) {
+  char buffer[MAX_PATH];
+  DWORD length = GetTempPathA(sizeof buffer, buffer);
+  ASSERT_GT(length, 3u);
+  EXPECT_EQ(std::string(buffer, 3), "C:\\");
+  EXPECT_EQ(buffer[length - 1], '\\');
+  EXPECT_EQ(GetFileAttributesA(buffer), static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY));
+  char small[2];
+  EXPECT_EQ(GetTempPathA(sizeof small, small), length + 1);
+
+  makeDir("drive_c/MyTemp");
+  setenv("TMP", "C:\\MyTemp", 1);
+  ASSERT_EQ(GetTempPathA(sizeof buffer, buffer), 10u);
+  EXPECT_STREQ(buffer, "C:\\MyTemp\\");
+}
+
+TEST_F(FilesTest, TempnamGivesDistinctNamesThatDoNotExist) {
+  makeDir("drive_c/T");
+  std::set<std::string> seen;
+  for (int i = 0; i < 3; ++i) {
+    char *name = _tempnam("C:\\T\\", "KXL");
+    ASSERT_NE(name, nullptr);
+    std::string text = name;
+    std::free(name);
+    EXPECT_EQ(text.rfind("C:\\T\\KXL", 0), 0u) << text;
+    EXPECT_EQ(GetFileAttributesA(text.c_str()), INVALID_FILE_ATTRIBUTES);
+    EXPECT_TRUE(CreateDirectoryA(text.c_str(), nullptr));
+    EXPECT_TRUE(seen.insert(text).second) << text;
+  }
+
+  makeDir("drive_c/Fallback");
+  setenv("TMP", "C:\\Fallback", 1);
+  char *name = _tempnam("C:\\NotThere", "KXL");
+  ASSERT_NE(name, nullptr);
+  EXPECT_EQ(std::string(name).rfind("C:\\Fallback\\KXL", 0), 0u) << name;
+  std::free(name);
+}
+
+} // namespace
+} // namespace kxlposixtest

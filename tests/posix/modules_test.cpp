@@ -1,0 +1,363 @@
+// The run-time modules: loading by the world's files, the cluster API over
+// the world's cluster, and the ODBC data source list.
+#include "world_fixture.h"
+
+#include "platform/clusapi.h"
+#include "platform/odbc.h"
+#include "sim/posix/modules.h"
+
+#include <set>
+#include <string>
+#include <vector>
+
+namespace kxlposixtest {
+namespace {
+
+const char *const kClusapiEntryPoints[] = {"MoveClusterGroup",
+                                           "OpenCluster",
+                                           "CloseCluster",
+                                           "OpenClusterGroup",
+                                           "CloseClusterGroup",
+                                           "OpenClusterNode",
+                                           "CloseClusterNode",
+                                           "ClusterOpenEnum",
+                                           "ClusterEnum",
+                                           "ClusterCloseEnum",
+                                           "GetClusterGroupState",
+                                           "ClusterGroupOpenEnum",
+                                           "ClusterGroupEnum",
+                                           "ClusterResourceControl",
+                                           "OnlineClusterGroup",
+                                           "OfflineClusterGroup",
+                                           "DeleteClusterGroup",
+                                           "ClusterResourceOpenEnum",
+                                           "ClusterResourceEnum",
+                                           "AddClusterResourceDependency",
+                                           "OpenClusterResource",
+                                           "CloseClusterResource",
+                                           "OnlineClusterResource",
+                                           "OfflineClusterResource",
+                                           "DeleteClusterResource",
+                                           "CreateClusterResource",
+                                           "GetClusterResourceState",
+                                           "DeleteClusterResourceType",
+                                           "CreateClusterResourceType",
+                                           "ClusterResourceTypeOpenEnum",
+                                           "ClusterResourceTypeEnum",
+                                           "ClusterResourceTypeCloseEnum",
+                                           "ClusterResourceCloseEnum",
+                                           "GetNodeClusterState"};
+const char *const kResutilsEntryPoints[] = {"ResUtilStartResourceService", "ResUtilStopResourceService",
+                                            "ResUtilResourceTypesEqual"};
+
+template <typename F> F entry(HMODULE module, const char *name) {
+  FARPROC address = GetProcAddress(module, name);
+  EXPECT_NE(address, nullptr) << name;
+  return reinterpret_cast<F>(reinterpret_cast<void (*)()>(address));
+}
+
+class ModulesTest : public WorldTest {
+protected:
+  void installModules() {
+    for (const char *name : {"clusapi.dll", "resutils.dll", "odbc32.dll"})
+      makeFile(std::string("drive_c/windows/system32/") + name, "MZ");
+  }
+};
+
+TEST_F(ModulesTest, ModulesLoadOnlyWhenTheWorldHasTheirFiles) {
+  EXPECT_EQ(LoadLibraryA("clusapi.dll"), nullptr);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_MOD_NOT_FOUND));
+  installModules();
+  EXPECT_EQ(LoadLibraryA("kernel99.dll"), nullptr);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_MOD_NOT_FOUND));
+
+  HMODULE clusapi = LoadLibraryA("CLUSAPI.DLL");
+  HMODULE resutils = LoadLibraryA("C:\\Windows\\System32\\resutils");
+  ASSERT_NE(clusapi, nullptr);
+  ASSERT_NE(resutils, nullptr);
+  for (const char *name : kClusapiEntryPoints)
+    EXPECT_NE(GetProcAddress(clusapi, name), nullptr) << name;
+  for (const char *name : kResutilsEntryPoints)
+    EXPECT_NE(GetProcAddress(resutils, name), nullptr) << name;
+  EXPECT_EQ(GetProcAddress(clusapi, "ResUtilResourceTypesEqual"), nullptr)
+      << "exports belong to their module";
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_PROC_NOT_FOUND));
+
+  char path[MAX_PATH];
+  ASSERT_GT(GetModuleFileNameA(clusapi, path, sizeof path), 0u);
+  EXPECT_STREQ(path, "C:\\windows\\system32\\CLUSAPI.DLL");
+  EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 1);
+  EXPECT_TRUE(FreeLibrary(clusapi));
+  EXPECT_TRUE(FreeLibrary(resutils));
+  EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 0);
+  EXPECT_FALSE(FreeLibrary(clusapi)) << "a freed module handle is no longer valid";
+  EXPECT_EQ(GetProcAddress(clusapi, "OpenCluster"), nullptr);
+}
+
+// The entry points the cluster cases use, bound by name as the command does.
+struct ClusterApi {
+  HMODULE clusapi = nullptr;
+  HMODULE resutils = nullptr;
+  PFN_OpenCluster openCluster;
+  PFN_CloseCluster closeCluster;
+  PFN_OpenClusterGroup openGroup;
+  PFN_CloseClusterGroup closeGroup;
+  PFN_ClusterOpenEnum openEnum;
+  PFN_ClusterEnum enumerate;
+  PFN_ClusterCloseEnum closeEnum;
+  PFN_CreateClusterResourceType createType;
+  PFN_CreateClusterResource createResource;
+  PFN_OpenClusterResource openResource;
+  PFN_CloseClusterResource closeResource;
+  PFN_DeleteClusterResource deleteResource;
+  PFN_AddClusterResourceDependency addDependency;
+  PFN_ClusterResourceOpenEnum openResourceEnum;
+  PFN_ClusterResourceEnum resourceEnum;
+  PFN_ClusterResourceCloseEnum closeResourceEnum;
+  PFN_ClusterResourceControl control;
+  PFN_GetClusterResourceState resourceState;
+  PFN_GetNodeClusterState nodeState;
+  PFN_ResUtilResourceTypesEqual typesEqual;
+
+  void bind() {
+    clusapi = LoadLibraryA("clusapi.dll");
+    resutils = LoadLibraryA("resutils.dll");
+    ASSERT_NE(clusapi, nullptr);
+    ASSERT_NE(resutils, nullptr);
+    openCluster = entry<PFN_OpenCluster>(clusapi, "OpenCluster");
+    closeCluster = entry<PFN_CloseCluster>(clusapi, "CloseCluster");
+    openGroup = entry<PFN_OpenClusterGroup>(clusapi, "OpenClusterGroup");
+    closeGroup = entry<PFN_CloseClusterGroup>(clusapi, "CloseClusterGroup");
+    openEnum = entry<PFN_ClusterOpenEnum>(clusapi, "ClusterOpenEnum");
+    enumerate = entry<PFN_ClusterEnum>(clusapi, "ClusterEnum");
+    closeEnum = entry<PFN_ClusterCloseEnum>(clusapi, "ClusterCloseEnum");
+    createType = entry<PFN_CreateClusterResourceType>(clusapi, "CreateClusterResourceType");
+    createResource = entry<PFN_CreateClusterResource>(clusapi, "CreateClusterResource");
+    openResource = entry<PFN_OpenClusterResource>(clusapi, "OpenClusterResource");
+    closeResource = entry<PFN_CloseClusterResource>(clusapi, "CloseClusterResource");
+    deleteResource = entry<PFN_DeleteClusterResource>(clusapi, "DeleteClusterResource");
+    addDependency = entry<PFN_AddClusterResourceDependency>(clusapi, "AddClusterResourceDependency");
+    openResourceEnum = entry<PFN_ClusterResourceOpenEnum>(clusapi, "ClusterResourceOpenEnum");
+    resourceEnum = entry<PFN_ClusterResourceEnum>(clusapi, "ClusterResourceEnum");
+    closeResourceEnum = entry<PFN_ClusterResourceCloseEnum>(clusapi, "ClusterResourceCloseEnum");
+    control = entry<PFN_ClusterResourceControl>(clusapi, "ClusterResourceControl");
+    resourceState = entry<PFN_GetClusterResourceState>(clusapi, "GetClusterResourceState");
+    nodeState = entry<PFN_GetNodeClusterState>(clusapi, "GetNodeClusterState");
+    typesEqual = entry<PFN_ResUtilResourceTypesEqual>(resutils, "ResUtilResourceTypesEqual");
+  }
+  ~ClusterApi() {
+    if (clusapi != nullptr)
+      FreeLibrary(clusapi);
+    if (resutils != nullptr)
+      FreeLibrary(resutils);
+  }
+
+  std::vector<std::u16string> dependencies(HRESOURCE resource) {
+    std::vector<std::u16string> names;
+    HRESENUM listing = openResourceEnum(resource, CLUSTER_RESOURCE_ENUM_DEPENDS);
+    WCHAR name[65];
+    DWORD type = 0;
+    DWORD rc = ERROR_SUCCESS;
+    for (DWORD i = 0;; ++i) {
+      DWORD size = 65;
+      if ((rc = resourceEnum(listing, i, &type, name, &size)) != ERROR_SUCCESS)
+        break;
+      names.emplace_back(name);
+    }
+    EXPECT_EQ(rc, static_cast<DWORD>(ERROR_NO_MORE_ITEMS));
+    closeResourceEnum(listing);
+    return names;
+  }
+};
+
+class ClusterTest : public ModulesTest {
+protected:
+  void SetUp() override {
+    ModulesTest::SetUp();
+    installModules();
+    setMachineDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", ClusterStateRunning);
+    setMachineDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\G1", "State", 0);
+    api.bind();
+  }
+  ClusterApi api;
+};
+
+TEST_F(ClusterTest, ResourcesAreCreatedEnumeratedLinkedAndDeleted) {
+  HCLUSTER cluster = api.openCluster(nullptr);
+  ASSERT_NE(cluster, nullptr);
+  EXPECT_EQ(api.createType(cluster, u"KXL Server", u"KXL Server", u"kxlserver.dll", 5000, 60000), 0u);
+  EXPECT_EQ(api.createType(cluster, u"kxl server", u"KXL Server", u"kxlserver.dll", 5000, 60000),
+            static_cast<DWORD>(ERROR_ALREADY_EXISTS));
+  EXPECT_EQ(api.createType(cluster, u"Physical Disk", u"Physical Disk", u"clusres.dll", 5000, 60000), 0u);
+
+  EXPECT_EQ(api.openGroup(cluster, u"NoGroup"), nullptr);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_GROUP_NOT_FOUND));
+  HGROUP group = api.openGroup(cluster, u"g1");
+  ASSERT_NE(group, nullptr);
+  HRESOURCE server = api.createResource(group, u"INST1", u"KXL Server", CLUSTER_RESOURCE_SEPARATE_MONITOR);
+  HRESOURCE disk = api.createResource(group, u"Disk1", u"Physical Disk", 0);
+  ASSERT_NE(server, nullptr);
+  ASSERT_NE(disk, nullptr);
+  EXPECT_EQ(api.createResource(group, u"inst1", u"KXL Server", 0), nullptr);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_OBJECT_ALREADY_EXISTS));
+  EXPECT_EQ(api.createResource(group, u"Other", u"No Such Type", 0), nullptr);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_RESOURCE_TYPE_NOT_FOUND));
+
+  EXPECT_EQ(api.addDependency(server, disk), 0u);
+  EXPECT_EQ(api.addDependency(server, disk), static_cast<DWORD>(ERROR_DEPENDENCY_ALREADY_EXISTS));
+  EXPECT_EQ(api.addDependency(disk, server), static_cast<DWORD>(ERROR_CIRCULAR_DEPENDENCY));
+  EXPECT_EQ(api.dependencies(server), std::vector<std::u16string>{u"Disk1"});
+
+  BYTE type[130] = {};
+  DWORD returned = 0;
+  EXPECT_EQ(api.control(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type, sizeof type,
+                        &returned),
+            0u);
+  EXPECT_EQ(std::u16string(reinterpret_cast<const char16_t *>(type)), u"KXL Server");
+  EXPECT_EQ(returned, 22u);
+  EXPECT_EQ(api.control(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type, 4, &returned),
+            static_cast<DWORD>(ERROR_MORE_DATA));
+  EXPECT_EQ(returned, 22u);
+
+  WCHAR groupName[65];
+  DWORD groupSize = 65;
+  EXPECT_EQ(api.resourceState(server, nullptr, nullptr, groupName, &groupSize), ClusterResourceOffline);
+  EXPECT_EQ(std::u16string(groupName), u"G1") << "the group's name as stored";
+  EXPECT_TRUE(api.typesEqual(u"kxl server", server));
+  EXPECT_FALSE(api.typesEqual(u"KXL", server));
+
+  EXPECT_EQ(api.deleteResource(disk), 0u);
+  EXPECT_TRUE(api.dependencies(server).empty()) << "a deleted resource leaves no dangling dependency";
+  EXPECT_EQ(api.openResource(cluster, u"Disk1"), nullptr);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_RESOURCE_NOT_FOUND));
+  HRESOURCE again = api.openResource(cluster, u"inst1");
+  ASSERT_NE(again, nullptr);
+  EXPECT_TRUE(api.closeResource(again));
+  EXPECT_TRUE(api.closeResource(disk));
+  EXPECT_TRUE(api.closeResource(server));
+  EXPECT_FALSE(api.closeResource(server));
+  EXPECT_TRUE(api.closeGroup(group));
+  EXPECT_TRUE(api.closeCluster(cluster));
+}
+
+TEST_F(ClusterTest, EnumerationReportsLengthsAndEndsWithNoMoreItems) {
+  HCLUSTER cluster = api.openCluster(nullptr);
+  ASSERT_NE(cluster, nullptr);
+  api.createType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
+  HGROUP group = api.openGroup(cluster, u"G1");
+  for (const char16_t *name : {u"A-resource", u"B"})
+    api.closeResource(api.createResource(group, name, u"KXL", 0));
+  api.closeGroup(group);
+
+  HCLUSENUM listing = api.openEnum(cluster, CLUSTER_ENUM_RESOURCE);
+  ASSERT_NE(listing, nullptr);
+  std::set<std::u16string> names;
+  WCHAR name[65];
+  DWORD type = 0;
+  DWORD size = 3;
+  EXPECT_EQ(api.enumerate(listing, 0, &type, name, &size), static_cast<DWORD>(ERROR_MORE_DATA));
+  DWORD needed = size;
+  for (DWORD i = 0;; ++i) {
+    size = 65;
+    DWORD rc = api.enumerate(listing, i, &type, name, &size);
+    if (rc == static_cast<DWORD>(ERROR_NO_MORE_ITEMS))
+      break;
+    ASSERT_EQ(rc, 0u);
+    EXPECT_EQ(type, static_cast<DWORD>(CLUSTER_ENUM_RESOURCE));
+    EXPECT_EQ(size, std::u16string(name).size());
+    if (i == 0) {
+      EXPECT_EQ(needed, size) << "the length needed excludes the terminator";
+    }
+    names.insert(name);
+  }
+  EXPECT_EQ(names, (std::set<std::u16string>{u"A-resource", u"B"}));
+  EXPECT_EQ(api.closeEnum(listing), 0u);
+  EXPECT_EQ(api.closeEnum(listing), static_cast<DWORD>(ERROR_INVALID_HANDLE));
+  api.closeCluster(cluster);
+}
+
+TEST_F(ClusterTest, ANodeWhoseServiceIsStoppedHasNoCluster) {
+  DWORD state = 0;
+  EXPECT_EQ(api.nodeState(nullptr, &state), 0u);
+  EXPECT_EQ(state, static_cast<DWORD>(ClusterStateRunning));
+  setMachineDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", ClusterStateNotRunning);
+  EXPECT_EQ(api.nodeState(nullptr, &state), 0u);
+  EXPECT_EQ(state, static_cast<DWORD>(ClusterStateNotRunning));
+  EXPECT_EQ(api.openCluster(nullptr), nullptr);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(RPC_S_SERVER_UNAVAILABLE));
+}
+
+class OdbcTest : public ModulesTest {
+protected:
+  void SetUp() override {
+    ModulesTest::SetUp();
+    installModules();
+    setMachineString(kSources, "SystemSource", "ZAV KXL ODBC DRIVER - COPY1");
+    HKEY user = nullptr;
+    ASSERT_EQ(
+        RegCreateKeyExA(HKEY_CURRENT_USER, kSources, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &user, nullptr),
+        ERROR_SUCCESS);
+    const char driver[] = "Other Driver";
+    ASSERT_EQ(
+        RegSetValueExA(user, "UserSource", 0, REG_SZ, reinterpret_cast<const BYTE *>(driver), sizeof driver),
+        ERROR_SUCCESS);
+    RegCloseKey(user);
+    odbc = LoadLibraryA("odbc32.dll");
+    ASSERT_NE(odbc, nullptr);
+    allocEnv = entry<PFN_SQLAllocEnv>(odbc, "SQLAllocEnv");
+    dataSources = entry<PFN_SQLDataSources>(odbc, "SQLDataSources");
+    ASSERT_EQ(allocEnv(&env), SQL_SUCCESS);
+  }
+  void TearDown() override {
+    FreeLibrary(odbc);
+    ModulesTest::TearDown();
+  }
+
+  // One fetch into 256-byte buffers: the result, then name and description.
+  SQLRETURN fetch(SQLUSMALLINT direction, std::string &name, std::string &driver) {
+    SQLCHAR nameBuffer[256] = {}, driverBuffer[256] = {};
+    SQLSMALLINT nameLength = 0, driverLength = 0;
+    SQLRETURN rc =
+        dataSources(env, direction, nameBuffer, 256, &nameLength, driverBuffer, 256, &driverLength);
+    name = reinterpret_cast<char *>(nameBuffer);
+    driver = reinterpret_cast<char *>(driverBuffer);
+    return rc;
+  }
+
+  static constexpr const char *kSources = "SOFTWARE\\ODBC\\ODBC.INI\\ODBC Data Sources";
+  HMODULE odbc = nullptr;
+  PFN_SQLAllocEnv allocEnv = nullptr;
+  PFN_SQLDataSources dataSources = nullptr;
+  SQLHENV env = nullptr;
+};
+
+TEST_F(OdbcTest, ListsMachineThenUserSourcesAndEndsWithNoData) {
+  std::string name, driver;
+  ASSERT_EQ(fetch(SQL_FETCH_FIRST, name, driver), SQL_SUCCESS);
+  EXPECT_EQ(name, "SystemSource");
+  EXPECT_EQ(driver, "ZAV KXL ODBC DRIVER - COPY1");
+  ASSERT_EQ(fetch(SQL_FETCH_NEXT, name, driver), SQL_SUCCESS);
+  EXPECT_EQ(name, "UserSource");
+  EXPECT_EQ(driver, "Other Driver");
+  EXPECT_EQ(fetch(SQL_FETCH_NEXT, name, driver), SQL_NO_DATA);
+  ASSERT_EQ(fetch(SQL_FETCH_FIRST, name, driver), SQL_SUCCESS) << "first starts over";
+  EXPECT_EQ(name, "SystemSource");
+}
+
+TEST_F(OdbcTest, CutsLongTextsAndRefusesBadHandles) {
+  SQLCHAR name[7], driver[256];
+  SQLSMALLINT nameLength = 0, driverLength = 0;
+  EXPECT_EQ(dataSources(env, SQL_FETCH_FIRST, name, sizeof name, &nameLength, driver, 256, &driverLength),
+            SQL_SUCCESS_WITH_INFO);
+  EXPECT_STREQ(reinterpret_cast<char *>(name), "System");
+  EXPECT_EQ(nameLength, 12);
+  EXPECT_EQ(driverLength, 27);
+  int notAnEnvironment = 0;
+  EXPECT_EQ(dataSources(&notAnEnvironment, SQL_FETCH_FIRST, name, sizeof name, &nameLength, driver, 256,
+                        &driverLength),
+            SQL_INVALID_HANDLE);
+  EXPECT_EQ(dataSources(env, 77, name, sizeof name, &nameLength, driver, 256, &driverLength), SQL_ERROR);
+}
+
+} // namespace
+} // namespace kxlposixtest

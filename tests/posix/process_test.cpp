@@ -1,0 +1,162 @@
+// Programs of the world started through CreateProcessA, the module path, the
+// environment and the computer name.
+#include "world_fixture.h"
+
+#include "sim/posix/cmdline.h"
+
+#include <cstdlib>
+#include <string>
+#include <unistd.h>
+#include <vector>
+
+namespace kxlposixtest {
+namespace {
+
+class ProcessTest : public WorldTest {
+protected:
+  void SetUp() override {
+    WorldTest::SetUp();
+    makeDir("drive_c/KXL/bin");
+    ASSERT_EQ(symlink(KXL_POSIX_CHILD, host("drive_c/KXL/bin/child.exe").c_str()), 0);
+    setenv("KXL_CHILD_REPORT", host("report.txt").c_str(), 1);
+  }
+  void TearDown() override {
+    for (const char *name : {"KXL_CHILD_REPORT", "KXL_CHILD_EXIT", "KXL_CHILD_VALUE", "KXL_CHILD_WAIT_FOR"})
+      unsetenv(name);
+    WorldTest::TearDown();
+  }
+
+  // Runs `commandLine` to its end; returns its exit code (or -1 when it did not start).
+  long long run(const char *application, std::string commandLine, const char *directory = nullptr) {
+    STARTUPINFOA startup{};
+    startup.cb = sizeof startup;
+    PROCESS_INFORMATION info{};
+    if (!CreateProcessA(application, commandLine.empty() ? nullptr : commandLine.data(), nullptr, nullptr,
+                        FALSE, 0, nullptr, directory, &startup, &info))
+      return -1;
+    EXPECT_EQ(WaitForSingleObject(info.hProcess, INFINITE), static_cast<DWORD>(WAIT_OBJECT_0));
+    DWORD code = 0;
+    EXPECT_TRUE(GetExitCodeProcess(info.hProcess, &code));
+    EXPECT_TRUE(CloseHandle(info.hThread));
+    EXPECT_TRUE(CloseHandle(info.hProcess));
+    return code;
+  }
+
+  std::vector<std::string> reportLines(const char *prefix) const {
+    std::vector<std::string> lines;
+    std::string text = readFile(host("report.txt"));
+    size_t start = 0;
+    for (size_t end; (end = text.find('\n', start)) != std::string::npos; start = end + 1)
+      if (text.compare(start, std::string(prefix).size(), prefix) == 0)
+        lines.push_back(
+            text.substr(start + std::string(prefix).size(), end - start - std::string(prefix).size()));
+    return lines;
+  }
+};
+
+TEST_F(ProcessTest, ChildGetsQuotedArgumentsEnvironmentAndDirectoryAndReturnsItsExitCode) {
+  makeDir("drive_c/Work");
+  ASSERT_TRUE(SetEnvironmentVariableA("KXL_CHILD_VALUE", "inherited"));
+  ASSERT_TRUE(SetEnvironmentVariableA("KXL_CHILD_EXIT", "200"));
+  EXPECT_EQ(run(nullptr, R"("C:\KXL\bin\child.exe" plain "with space" a\\\"b "" tail\)", "c:\\work"), 200);
+  EXPECT_EQ(reportLines("arg="), (std::vector<std::string>{"plain", "with space", "a\\\"b", "", "tail\\"}));
+  EXPECT_EQ(reportLines("value="), std::vector<std::string>{"inherited"});
+  EXPECT_EQ(reportLines("cwd="), std::vector<std::string>{host("drive_c/Work")});
+  EXPECT_EQ(reportLines("module="), std::vector<std::string>{"C:\\KXL\\bin\\child.exe"})
+      << "a program started through a link reports the link's location";
+}
+
+TEST_F(ProcessTest, ProgramsNamedWithoutPathAreSearchedInSystemDirectoryAndPath) {
+  makeDir("drive_c/windows/system32");
+  ASSERT_EQ(symlink(KXL_POSIX_CHILD, host("drive_c/windows/system32/sysprog.exe").c_str()), 0);
+  EXPECT_EQ(run(nullptr, "sysprog first"), 0);
+  EXPECT_EQ(reportLines("module="), std::vector<std::string>{"C:\\windows\\system32\\sysprog.exe"});
+
+  makeDir("drive_c/Tools");
+  ASSERT_EQ(symlink(KXL_POSIX_CHILD, host("drive_c/Tools/pathprog.exe").c_str()), 0);
+  std::string savedPath = std::getenv("PATH") != nullptr ? std::getenv("PATH") : "";
+  setenv("PATH", "C:\\Nope;C:\\Tools", 1);
+  EXPECT_EQ(run(nullptr, "pathprog.exe"), 0);
+  setenv("PATH", savedPath.c_str(), 1);
+  EXPECT_EQ(reportLines("module="), std::vector<std::string>{"C:\\Tools\\pathprog.exe"});
+
+  EXPECT_EQ(run(nullptr, "noprog.exe"), -1);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
+  EXPECT_EQ(run("C:\\KXL\\bin\\child.exe", "", "C:\\NoSuchDir"), -1);
+  EXPECT_EQ(GetLastError(), 267u);
+}
+
+TEST_F(ProcessTest, RunningChildIsStillActiveUntilItEnds) {
+  setenv("KXL_CHILD_WAIT_FOR", host("go").c_str(), 1);
+  STARTUPINFOA startup{};
+  PROCESS_INFORMATION info{};
+  char commandLine[] = "C:\\KXL\\bin\\child.exe";
+  ASSERT_TRUE(
+      CreateProcessA(nullptr, commandLine, nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup, &info));
+  EXPECT_EQ(WaitForSingleObject(info.hProcess, 0), static_cast<DWORD>(WAIT_TIMEOUT));
+  DWORD code = 0;
+  EXPECT_TRUE(GetExitCodeProcess(info.hProcess, &code));
+  EXPECT_EQ(code, static_cast<DWORD>(STILL_ACTIVE));
+  makeFile("go");
+  EXPECT_EQ(WaitForSingleObject(info.hThread, INFINITE), static_cast<DWORD>(WAIT_OBJECT_0));
+  EXPECT_TRUE(GetExitCodeProcess(info.hProcess, &code));
+  EXPECT_EQ(code, 0u);
+  CloseHandle(info.hThread);
+  CloseHandle(info.hProcess);
+  EXPECT_EQ(WaitForSingleObject(info.hProcess, 0), WAIT_FAILED);
+}
+
+TEST_F(ProcessTest, ModuleFileNameIsCutToTheBufferAsWindowsDoes) {
+  char full[MAX_PATH];
+  DWORD length = GetModuleFileNameA(nullptr, full, sizeof full);
+  ASSERT_GT(length, 4u);
+  EXPECT_EQ(full[1], ':');
+  char cut[5];
+  EXPECT_EQ(GetModuleFileNameA(nullptr, cut, sizeof cut), 5u);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_INSUFFICIENT_BUFFER));
+  EXPECT_EQ(std::string(cut), std::string(full, 4));
+}
+
+TEST_F(ProcessTest, EnvironmentNamesIgnoreCaseAndFollowBufferRules) {
+  ASSERT_TRUE(SetEnvironmentVariableA("KxlMixedName", "value1"));
+  char buffer[16];
+  EXPECT_EQ(GetEnvironmentVariableA("KXLMIXEDNAME", buffer, sizeof buffer), 6u);
+  EXPECT_STREQ(buffer, "value1");
+  EXPECT_EQ(GetEnvironmentVariableA("kxlmixedname", buffer, 6), 7u);
+  ASSERT_TRUE(SetEnvironmentVariableA("KXLMIXEDNAME", nullptr));
+  EXPECT_EQ(GetEnvironmentVariableA("KxlMixedName", buffer, sizeof buffer), 0u);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_ENVVAR_NOT_FOUND));
+  EXPECT_FALSE(SetEnvironmentVariableA("A=B", "x"));
+}
+
+TEST_F(ProcessTest, ComputerNameComesFromTheWorldsIdentity) {
+  char buffer[32];
+  DWORD size = sizeof buffer;
+  ASSERT_TRUE(GetComputerNameA(buffer, &size));
+  EXPECT_STREQ(buffer, "KXLHOST");
+  EXPECT_EQ(size, 7u);
+
+  setMachineString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "ComputerName", "NODE7");
+  size = 3;
+  EXPECT_FALSE(GetComputerNameA(buffer, &size));
+  EXPECT_EQ(GetLastError(), 111u);
+  EXPECT_EQ(size, 6u);
+  size = sizeof buffer;
+  ASSERT_TRUE(GetComputerNameA(buffer, &size));
+  EXPECT_STREQ(buffer, "NODE7");
+}
+
+TEST(CommandLineSplit, FollowsWindowsQuotingAndBackslashRules) {
+  using kxlsim::posix::splitArguments;
+  EXPECT_EQ(splitArguments(R"(  a  "b c"  d)"), (std::vector<std::string>{"a", "b c", "d"}));
+  EXPECT_EQ(splitArguments(R"(a\\b a\\\\"b c" a\"b)"),
+            (std::vector<std::string>{"a\\\\b", "a\\\\b c", "a\"b"}));
+  EXPECT_EQ(splitArguments(R"("a""b" "")"), (std::vector<std::string>{"a\"b", ""}));
+  EXPECT_EQ(splitArguments(R"(x"y z"w)"), std::vector<std::string>{"xy zw"});
+  std::string rest;
+  EXPECT_EQ(kxlsim::posix::programToken(R"("C:\Program Files\p.exe" -x)", rest), "C:\\Program Files\\p.exe");
+  EXPECT_EQ(rest, " -x");
+}
+
+} // namespace
+} // namespace kxlposixtest
