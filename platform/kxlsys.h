@@ -527,7 +527,8 @@ int32_t sqloread(SQLO_FHANDLE handle, void *buffer, uint32_t size, uint32_t *byt
 int32_t sqlowrite(SQLO_FHANDLE handle, const void *buffer, uint32_t size, uint32_t *bytesWritten);
 int32_t sqloclose(SQLO_FHANDLE handle);
 // Copies one file over the target. SQLO_RC_FILE_NOT_FOUND when the source is missing,
-// SQLO_RC_PATH_NOT_FOUND when a directory of either path is missing.
+// SQLO_RC_PATH_NOT_FOUND when the source's directory is missing; missing directories
+// of the target are created.
 int32_t sqlocopy(const char *source, const char *target, uint32_t flags);
 // Copies a directory tree into `target` (created when missing). Note the order.
 int32_t sqlocopydir(const char *target, const char *source, uint32_t flags);
@@ -607,7 +608,8 @@ int32_t sqlf_get_param_info(uint32_t token, uint32_t reserved, SQLF_PARAM_INFO *
 int32_t sqlfusys(uint16_t count, sqlfupd *items, sqlca *ca);
 
 // ---- names and text --------------------------------------------------------
-// 0 when the two agree ignoring case over `length` characters (0: whole strings).
+// 0 when the two agree ignoring case over `length` characters (0: over the length of
+// `a`, so a text cut to its field still matches the word it begins; "" matches only "").
 int32_t sqlomcpi(const char *a, const char *b, uint32_t length);
 // Upper-cases `length` characters of `text` in place. `codepage` 0: the current one.
 int32_t sqlotoup(uint32_t length, uint32_t codepage, char *text);

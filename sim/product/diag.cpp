@@ -131,7 +131,7 @@ void traceData(uint32_t functionId, uint32_t probe, uint32_t type1, uint64_t siz
   Line line;
   line.add("data 0x%08" PRIX32 " probe=%" PRIu32, functionId, probe);
   line.addItem(type1, size1, data1);
-  if (type2 != 0)
+  if (type2 != 0 && data2 != nullptr)
     line.addItem(type2, size2, data2);
   traceWrite(line);
 }

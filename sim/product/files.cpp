@@ -1,0 +1,343 @@
+// Files and directories of the product library, over the Win32 file calls.
+// Paths may come wrapped in double quotes; the quotes are dropped before the
+// file system sees them.
+#include "platform/kxlsys.h"
+#include "sim/common/simfail.h"
+#include "sim/product/winpath.h"
+
+#include <cstdarg>
+#include <cstdio>
+#include <new>
+
+struct sqlo_file {
+  HANDLE handle;
+};
+
+namespace kxlprod {
+namespace {
+
+// Deepest directory tree the tree operations walk: deeper trees cannot have
+// paths within MAX_PATH anyway.
+constexpr int kMaxTreeDepth = 64;
+
+int32_t codeForLastError(int32_t notFound) {
+  switch (GetLastError()) {
+  case ERROR_FILE_NOT_FOUND:
+    return notFound;
+  case ERROR_PATH_NOT_FOUND:
+    return SQLO_RC_PATH_NOT_FOUND;
+  case ERROR_ACCESS_DENIED:
+    return SQLO_RC_ACCESS_DENIED;
+  case ERROR_NOT_ENOUGH_MEMORY:
+    return SQLO_RC_NO_MEMORY;
+  default:
+    return SQLO_RC_IO_ERROR;
+  }
+}
+
+// Why a path that should exist does not: its own name or a directory above it.
+int32_t missingPathCode(const std::string &path) {
+  std::string parent = parentPath(path);
+  return parent.empty() || isDirectoryPath(parent) ? SQLO_RC_FILE_NOT_FOUND : SQLO_RC_PATH_NOT_FOUND;
+}
+
+DWORD accessFor(uint32_t flags) {
+  DWORD access = 0;
+  if (flags & SQLO_READONLY)
+    access |= GENERIC_READ;
+  if (flags & SQLO_WRITEONLY)
+    access |= GENERIC_WRITE;
+  return access ? access : GENERIC_READ;
+}
+
+DWORD shareFor(uint32_t flags) {
+  DWORD share = 0;
+  if (flags & SQLO_SHAREREAD)
+    share |= FILE_SHARE_READ;
+  if (flags & SQLO_SHAREWRITE)
+    share |= FILE_SHARE_WRITE;
+  return share;
+}
+
+// SQLO_OPEN alone: the file must exist. SQLO_CREATE alone: create it, or
+// replace the content of an existing one. Both: open it, creating it when
+// missing. Neither: open an existing file.
+DWORD dispositionFor(uint32_t flags, bool exists) {
+  bool create = (flags & SQLO_CREATE) != 0;
+  bool open = (flags & SQLO_OPEN) != 0;
+  if (create && open)
+    return OPEN_ALWAYS;
+  if (create)
+    return exists ? TRUNCATE_EXISTING : CREATE_NEW;
+  return OPEN_EXISTING;
+}
+
+bool isDotEntry(const char *name) {
+  return name[0] == '.' && (name[1] == '\0' || (name[1] == '.' && name[2] == '\0'));
+}
+
+bool fitsPath(const std::string &path) {
+  return path.size() < SQLO_PATH_SZ;
+}
+
+// True when `inner` is `outer` or lies below it (ignoring case).
+bool isWithin(const std::string &inner, const std::string &outer) {
+  if (inner.size() < outer.size() || sqlomcpi(inner.c_str(), outer.c_str(), uint32_t(outer.size())) != 0) {
+    return false;
+  }
+  return inner.size() == outer.size() || inner[outer.size()] == '\\' || outer.back() == '\\';
+}
+
+// Calls visit(name, isDirectory) for each entry of a directory; stops at
+// the first non-zero result and returns it.
+template <typename Visit> int32_t forEachEntry(const std::string &dir, Visit visit) {
+  WIN32_FIND_DATAA data;
+  HANDLE search = FindFirstFileA(joinPath(dir, "*").c_str(), &data);
+  if (search == INVALID_HANDLE_VALUE) {
+    return GetLastError() == ERROR_FILE_NOT_FOUND ? 0 : codeForLastError(SQLO_RC_PATH_NOT_FOUND);
+  }
+  int32_t rc = 0;
+  do {
+    data.cFileName[sizeof data.cFileName - 1] = '\0';
+    if (!isDotEntry(data.cFileName)) {
+      rc = visit(std::string(data.cFileName), (data.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY) != 0);
+    }
+  } while (rc == 0 && FindNextFileA(search, &data));
+  FindClose(search);
+  return rc;
+}
+
+int32_t copyTree(const std::string &target, const std::string &source, int depth) {
+  if (depth > kMaxTreeDepth)
+    return SQLO_RC_IO_ERROR;
+  if (!createDirectoryTree(target, true))
+    return SQLO_RC_PATH_NOT_FOUND;
+  return forEachEntry(source, [&](const std::string &name, bool directory) -> int32_t {
+    std::string from = joinPath(source, name);
+    std::string to = joinPath(target, name);
+    if (!fitsPath(from) || !fitsPath(to))
+      return SQLO_RC_IO_ERROR;
+    if (directory)
+      return copyTree(to, from, depth + 1);
+    return CopyFileA(from.c_str(), to.c_str(), FALSE) ? 0 : codeForLastError(SQLO_RC_FILE_NOT_FOUND);
+  });
+}
+
+int32_t deleteTree(const std::string &dir, int depth) {
+  if (depth > kMaxTreeDepth)
+    return SQLO_RC_IO_ERROR;
+  int32_t rc = forEachEntry(dir, [&](const std::string &name, bool directory) -> int32_t {
+    std::string path = joinPath(dir, name);
+    if (!fitsPath(path))
+      return SQLO_RC_IO_ERROR;
+    if (directory)
+      return deleteTree(path, depth + 1);
+    return DeleteFileA(path.c_str()) ? 0 : codeForLastError(SQLO_RC_FILE_NOT_FOUND);
+  });
+  if (rc != 0)
+    return rc;
+  return RemoveDirectoryA(dir.c_str()) ? 0 : codeForLastError(SQLO_RC_PATH_NOT_FOUND);
+}
+
+bool validPathParam(const OSSPathParam *param) {
+  return param != nullptr && param->version == OSS_PATH_PARAM_VERSION && param->path != nullptr;
+}
+
+} // namespace
+} // namespace kxlprod
+
+using namespace kxlprod;
+
+extern "C" {
+
+int32_t sqloopenp(const char *path, uint32_t flags, uint32_t mode, SQLO_FHANDLE *handle, uint32_t reserved) {
+  (void)mode; // permission bits: the Windows file system has none to set
+  (void)reserved;
+  if (handle != nullptr)
+    *handle = nullptr;
+  if (kxlsim::shouldFail("sqloopenp"))
+    return SQLO_RC_IO_ERROR;
+  if (path == nullptr || handle == nullptr)
+    return SQLO_RC_INVALID_ARGUMENT;
+  std::string name = unquotedPath(path);
+  DWORD attributes = GetFileAttributesA(name.c_str());
+  bool exists = attributes != INVALID_FILE_ATTRIBUTES;
+  if (exists && (attributes & FILE_ATTRIBUTE_DIRECTORY))
+    return SQLO_RC_ACCESS_DENIED;
+  DWORD disposition = dispositionFor(flags, exists);
+  if (disposition == OPEN_EXISTING && !exists)
+    return missingPathCode(name);
+  HANDLE file =
+      CreateFileA(name.c_str(), accessFor(flags) | (disposition == TRUNCATE_EXISTING ? GENERIC_WRITE : 0),
+                  shareFor(flags), nullptr, disposition, FILE_ATTRIBUTE_NORMAL, nullptr);
+  if (file == INVALID_HANDLE_VALUE)
+    return codeForLastError(missingPathCode(name));
+  *handle = new (std::nothrow) sqlo_file{file};
+  if (*handle == nullptr) {
+    CloseHandle(file);
+    return SQLO_RC_NO_MEMORY;
+  }
+  return disposition == TRUNCATE_EXISTING ? SQLO_RC_FILE_EXISTED : 0;
+}
+
+int32_t sqloread(SQLO_FHANDLE handle, void *buffer, uint32_t size, uint32_t *bytesRead) {
+  if (bytesRead != nullptr)
+    *bytesRead = 0;
+  if (kxlsim::shouldFail("sqloread"))
+    return SQLO_RC_IO_ERROR;
+  if (handle == nullptr || (buffer == nullptr && size > 0))
+    return SQLO_RC_INVALID_ARGUMENT;
+  DWORD got = 0;
+  if (size > 0 && !ReadFile(handle->handle, buffer, size, &got, nullptr))
+    return SQLO_RC_IO_ERROR;
+  if (bytesRead != nullptr)
+    *bytesRead = got;
+  return 0;
+}
+
+int32_t sqlowrite(SQLO_FHANDLE handle, const void *buffer, uint32_t size, uint32_t *bytesWritten) {
+  if (bytesWritten != nullptr)
+    *bytesWritten = 0;
+  if (kxlsim::shouldFail("sqlowrite"))
+    return SQLO_RC_IO_ERROR;
+  if (handle == nullptr || (buffer == nullptr && size > 0))
+    return SQLO_RC_INVALID_ARGUMENT;
+  DWORD put = 0;
+  bool ok = size == 0 || WriteFile(handle->handle, buffer, size, &put, nullptr);
+  if (bytesWritten != nullptr)
+    *bytesWritten = put;
+  return ok && put == size ? 0 : SQLO_RC_IO_ERROR;
+}
+
+int32_t sqloclose(SQLO_FHANDLE handle) {
+  if (handle == nullptr)
+    return SQLO_RC_INVALID_ARGUMENT;
+  // The handle is released even when the call is made to fail, so that a
+  // failing close never leaks it.
+  bool ok = CloseHandle(handle->handle) != 0;
+  delete handle;
+  if (kxlsim::shouldFail("sqloclose"))
+    return SQLO_RC_IO_ERROR;
+  return ok ? 0 : SQLO_RC_IO_ERROR;
+}
+
+int32_t sqlocopy(const char *source, const char *target, uint32_t flags) {
+  (void)flags; // 0: replace the target; no other mode is offered
+  if (kxlsim::shouldFail("sqlocopy"))
+    return SQLO_RC_IO_ERROR;
+  if (source == nullptr || target == nullptr)
+    return SQLO_RC_INVALID_ARGUMENT;
+  std::string from = unquotedPath(source);
+  std::string to = unquotedPath(target);
+  DWORD attributes = GetFileAttributesA(from.c_str());
+  if (attributes == INVALID_FILE_ATTRIBUTES)
+    return missingPathCode(from);
+  if (attributes & FILE_ATTRIBUTE_DIRECTORY)
+    return SQLO_RC_ACCESS_DENIED;
+  // A missing target directory is made, so that a file being carried over is
+  // never dropped for want of its folder.
+  std::string toDir = parentPath(to);
+  if (!toDir.empty() && !createDirectoryTree(toDir, true))
+    return SQLO_RC_PATH_NOT_FOUND;
+  return CopyFileA(from.c_str(), to.c_str(), FALSE) ? 0 : codeForLastError(SQLO_RC_FILE_NOT_FOUND);
+}
+
+int32_t sqlocopydir(const char *target, const char *source, uint32_t flags) {
+  (void)flags; // 0: the whole tree, files of the target replaced
+  if (kxlsim::shouldFail("sqlocopydir"))
+    return SQLO_RC_IO_ERROR;
+  if (source == nullptr || target == nullptr)
+    return SQLO_RC_INVALID_ARGUMENT;
+  std::string from = unquotedPath(source);
+  std::string to = unquotedPath(target);
+  if (!isDirectoryPath(from))
+    return SQLO_RC_PATH_NOT_FOUND;
+  // A target inside the source would be copied into itself without end.
+  if (isWithin(to, from))
+    return SQLO_RC_INVALID_ARGUMENT;
+  return copyTree(to, from, 0);
+}
+
+int32_t sqlodelete(const char *path, uint32_t flags) {
+  (void)flags;
+  if (kxlsim::shouldFail("sqlodelete"))
+    return SQLO_RC_IO_ERROR;
+  if (path == nullptr)
+    return SQLO_RC_INVALID_ARGUMENT;
+  std::string name = unquotedPath(path);
+  DWORD attributes = GetFileAttributesA(name.c_str());
+  if (attributes == INVALID_FILE_ATTRIBUTES)
+    return missingPathCode(name);
+  if (attributes & FILE_ATTRIBUTE_DIRECTORY)
+    return SQLO_RC_ACCESS_DENIED;
+  return DeleteFileA(name.c_str()) ? 0 : codeForLastError(SQLO_RC_FILE_NOT_FOUND);
+}
+
+int32_t sqlodeletedir(const char *path) {
+  if (kxlsim::shouldFail("sqlodeletedir"))
+    return SQLO_RC_IO_ERROR;
+  if (path == nullptr)
+    return SQLO_RC_INVALID_ARGUMENT;
+  std::string dir = unquotedPath(path);
+  // A whole drive or share is never removed.
+  if (isRootPath(dir))
+    return SQLO_RC_INVALID_ARGUMENT;
+  if (!isDirectoryPath(dir))
+    return SQLO_RC_PATH_NOT_FOUND;
+  return deleteTree(dir, 0);
+}
+
+uint32_t ossPathTest(OSSPathParam *param) {
+  if (kxlsim::shouldFail("ossPathTest"))
+    return OSS_RC_FAILED;
+  if (!validPathParam(param))
+    return OSS_RC_NULL_ARGUMENT;
+  std::string name = unquotedPath(param->path);
+  return GetFileAttributesA(name.c_str()) != INVALID_FILE_ATTRIBUTES ? 0 : OSS_RC_PATH_NOT_FOUND;
+}
+
+uint32_t ossDirectoryCreate(OSSPathParam *param) {
+  if (kxlsim::shouldFail("ossDirectoryCreate"))
+    return OSS_RC_FAILED;
+  if (!validPathParam(param))
+    return OSS_RC_NULL_ARGUMENT;
+  std::string dir = unquotedPath(param->path);
+  bool parents = (param->mode & 2) != 0;
+  if (!parents && !isDirectoryPath(parentPath(dir)) && !isRootPath(parentPath(dir))) {
+    return OSS_RC_PATH_NOT_FOUND;
+  }
+  return createDirectoryTree(dir, parents) ? 0 : OSS_RC_FAILED;
+}
+
+bool ossPathExists(const char *path) {
+  if (kxlsim::shouldFail("ossPathExists") || path == nullptr)
+    return false;
+  return GetFileAttributesA(unquotedPath(path).c_str()) != INVALID_FILE_ATTRIBUTES;
+}
+
+bool ossIsDirectory(const char *path) {
+  if (kxlsim::shouldFail("ossIsDirectory") || path == nullptr)
+    return false;
+  return isDirectoryPath(unquotedPath(path));
+}
+
+int ossSnprintf(char *buffer, size_t size, const char *format, ...) {
+  if (buffer == nullptr || size == 0)
+    return -1;
+  buffer[0] = '\0';
+  if (kxlsim::shouldFail("ossSnprintf") || format == nullptr)
+    return -1;
+  va_list args;
+  va_start(args, format);
+  int wanted = std::vsnprintf(buffer, size, format, args);
+  va_end(args);
+  buffer[size - 1] = '\0';
+  if (wanted < 0) {
+    buffer[0] = '\0';
+    return -1;
+  }
+  // The length actually stored: a cut text reports what it holds.
+  return size_t(wanted) < size ? wanted : int(size - 1);
+}
+
+} // extern "C"

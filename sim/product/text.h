@@ -1,0 +1,16 @@
+// Name and language helpers of the product library. Internal; the tests use
+// them directly.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace kxlprod {
+
+// A locale text ("de_DE.UTF-8@euro", "de-de", "C") as a message directory
+// name: language in lower case, territory in upper case, codeset and
+// modifier dropped; "C" and "POSIX" give "en_US". "" when the text is no
+// usable locale name.
+std::string normalizeLanguage(std::string_view locale);
+
+} // namespace kxlprod

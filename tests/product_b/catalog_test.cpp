@@ -1,0 +1,194 @@
+// Message catalogs: the MO reader on good, swapped and damaged images,
+// placeholder filling, and the message service over a world's catalogs.
+#include "fixture.h"
+#include "sim/product/mocatalog.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+
+using kxlprod::MoCatalog;
+
+namespace {
+
+std::string bytesOf(const std::vector<unsigned char> &bytes) {
+  return std::string(bytes.begin(), bytes.end());
+}
+
+void put32le(std::vector<unsigned char> &image, size_t at, uint32_t value) {
+  for (int i = 0; i < 4; ++i)
+    image[at + i] = uint8_t(value >> (8 * i));
+}
+
+std::string lookup(const MoCatalog &catalog, const char *key) {
+  std::string_view text;
+  return catalog.find(key, text) ? std::string(text) : "<none>";
+}
+
+TEST(MoCatalog, ReadsBothByteOrders) {
+  for (const char *path : {KXL_TESTCAT_LE, KXL_TESTCAT_BE}) {
+    MoCatalog catalog;
+    ASSERT_TRUE(catalog.load(kxltest::hostFileBytes(path))) << path;
+    EXPECT_EQ("KXL1951W  The instance \"<instance-name>\" was not found.", lookup(catalog, "KXL1951"));
+    EXPECT_EQ("SQL0100W  No row was found.", lookup(catalog, "SQL0100W"));
+    EXPECT_EQ("first form", lookup(catalog, "KXL0042")) << "plural entries give their first form";
+    EXPECT_EQ("<none>", lookup(catalog, "KXL9999"));
+    EXPECT_EQ("<none>", lookup(catalog, "KXL195")) << "keys match whole";
+  }
+}
+
+TEST(MoCatalog, RefusesOrSurvivesDamagedImages) {
+  std::vector<unsigned char> good = kxltest::hostFileBytes(KXL_TESTCAT_LE);
+  ASSERT_GT(good.size(), 28u);
+  MoCatalog catalog;
+  // Every truncation either fails to load or finds nothing outside the image.
+  for (size_t cut = 0; cut < good.size(); cut += 7) {
+    std::vector<unsigned char> part(good.begin(), good.begin() + cut);
+    if (catalog.load(part))
+      lookup(catalog, "KXL1951");
+  }
+  std::vector<unsigned char> badMagic = good;
+  badMagic[0] ^= 0xFF;
+  EXPECT_FALSE(catalog.load(badMagic));
+
+  std::vector<unsigned char> hugeCount = good;
+  put32le(hugeCount, 8, 0x20000000u);
+  EXPECT_FALSE(catalog.load(hugeCount)) << "tables that do not fit are refused";
+
+  std::vector<unsigned char> wildTable = good;
+  put32le(wildTable, 12, 0xFFFFFFF0u);
+  EXPECT_FALSE(catalog.load(wildTable));
+
+  // String offsets pointing past the end: the entry is skipped, no crash.
+  std::vector<unsigned char> wildStrings = good;
+  uint32_t originals =
+      uint32_t(good[12]) | uint32_t(good[13]) << 8 | uint32_t(good[14]) << 16 | uint32_t(good[15]) << 24;
+  uint32_t count = uint32_t(good[8]) | uint32_t(good[9]) << 8;
+  for (uint32_t i = 0; i < count; ++i) {
+    put32le(wildStrings, originals + 8 * i, 0x7FFFFFFFu);
+    put32le(wildStrings, originals + 8 * i + 4, uint32_t(good.size() - 2));
+  }
+  ASSERT_TRUE(catalog.load(wildStrings));
+  EXPECT_EQ("<none>", lookup(catalog, "KXL1951"));
+}
+
+TEST(Placeholders, TokensFillInOrderAndTheRestStays) {
+  char out[128];
+  std::string text = "A \"<first>\" and <second-one> and <third_x>";
+  EXPECT_EQ(3u, kxlprod::countPlaceholders(text));
+  kxlprod::fillPlaceholders(text, {"1", "2"}, out, sizeof out);
+  EXPECT_STREQ("A \"1\" and 2 and <third_x>\n", out);
+
+  kxlprod::fillPlaceholders(text, {}, out, sizeof out);
+  EXPECT_EQ(text + "\n", out);
+  kxlprod::fillPlaceholders("ends\n", {}, out, sizeof out);
+  EXPECT_STREQ("ends\n", out) << "a final line feed is not doubled";
+
+  // Angle brackets around anything but a name are text.
+  kxlprod::fillPlaceholders("a < b <> c <x y> <ok>\n", {"T"}, out, sizeof out);
+  EXPECT_STREQ("a < b <> c <x y> T\n", out);
+}
+
+TEST(Placeholders, OutputIsCutToTheBuffer) {
+  char out[8];
+  std::memset(out, 'Z', sizeof out);
+  size_t length = kxlprod::fillPlaceholders("<a><b>", {"12345", "67890"}, out, sizeof out);
+  EXPECT_EQ(7u, length);
+  EXPECT_STREQ("1234567", out);
+  char one[1] = {'Z'};
+  EXPECT_EQ(0u, kxlprod::fillPlaceholders("text", {}, one, sizeof one));
+  EXPECT_EQ('\0', one[0]);
+}
+
+class MessageService : public kxltest::LibraryWorld {
+protected:
+  void installCatalog(const char *language, const char *name, const char *hostMo) {
+    writeFile(std::string(kInstall) + "\\msg\\" + language + "\\" + name,
+              bytesOf(kxltest::hostFileBytes(hostMo)));
+  }
+  std::string message(const char *catalog, uint32_t number, const char *const *tokens = nullptr) {
+    char buffer[SQLO_MSG_BUFFER_SZ];
+    int32_t rc = 12345;
+    int32_t result = sqlogmsg(catalog, number, nullptr, tokens, buffer, sizeof buffer, &rc, 0, 0, 0);
+    if (result <= 0)
+      return "<none>";
+    EXPECT_EQ(0, rc);
+    EXPECT_EQ(size_t(result), std::strlen(buffer));
+    return buffer;
+  }
+};
+
+TEST_F(MessageService, WithoutTokensPlaceholdersSurviveWithTheirQuotes) {
+  installCatalog("en_US", "kxlinst.mo", KXL_TESTCAT_LE);
+  EXPECT_EQ("KXL1951W  The instance \"<instance-name>\" was not found.\n", message("kxlinst.mo", 1951));
+  EXPECT_EQ("KXL1951W  The instance \"<instance-name>\" was not found.\n", message("kxlinst", 1951));
+}
+
+TEST_F(MessageService, TokensGoIntoPlaceholdersInOrder) {
+  installCatalog("en_US", "kxlclp.mo", KXL_TESTCAT_BE);
+  const char *prefix[] = {"KXLIUPGRADE"};
+  uint64_t lengths[] = {11};
+  char buffer[SQLO_MSG_BUFFER_SZ];
+  int32_t rc = -1;
+  int32_t result = sqlogmsg("kxlclp.mo", 1000, lengths, prefix, buffer, sizeof buffer, &rc, 0, 0, 0);
+  EXPECT_STREQ("KXL1000I  KXLIUPGRADE processing completed successfully.\n", buffer);
+  EXPECT_EQ(int32_t(std::strlen(buffer)), result);
+
+  const char *two[] = {"kxlckupgrade", "7"};
+  EXPECT_EQ("KXL1069E  \"kxlckupgrade\" ended with \"7\".\n", message("kxlclp.mo", 1069, two));
+  const char *cut[] = {"only", nullptr};
+  EXPECT_EQ("KXL1069E  \"only\" ended with \"<exit-code>\".\n", message("kxlclp.mo", 1069, cut));
+}
+
+TEST_F(MessageService, LanguageFallsBackToEnglish) {
+  installCatalog("en_US", "kxlinst.mo", KXL_TESTCAT_LE);
+  setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "Language", "de_DE");
+  writeFile(std::string(kInstall) + "\\msg\\de_DE\\kxlinst.mo", "not a catalog");
+  EXPECT_EQ("KXL1951W  The instance \"<instance-name>\" was not found.\n", message("kxlinst.mo", 1951));
+}
+
+TEST_F(MessageService, MissingCatalogOrMessageReportsNoText) {
+  EXPECT_EQ("<none>", message("kxlinst.mo", 1951));
+  installCatalog("en_US", "kxlinst.mo", KXL_TESTCAT_LE);
+  char buffer[64] = "old";
+  int32_t rc = 0;
+  EXPECT_LE(sqlogmsg("kxlinst.mo", 1953, nullptr, nullptr, buffer, sizeof buffer, &rc, 0, 0, 0), 0);
+  EXPECT_NE(0, rc);
+  EXPECT_STREQ("", buffer);
+  // A small buffer gets a cut, terminated text.
+  char small[10];
+  EXPECT_EQ(9, sqlogmsg("kxlinst.mo", 1951, nullptr, nullptr, small, sizeof small, &rc, 0, 0, 0));
+  EXPECT_STREQ("KXL1951W ", small);
+}
+
+TEST_F(MessageService, StatusBlockTextCarriesItsTokens) {
+  installCatalog("en_US", "kxlsql.mo", KXL_TESTCAT_LE);
+  sqlca ca;
+  sqloinca(&ca);
+  const char *id[] = {"JOE"};
+  uint64_t lengths[] = {3};
+  ASSERT_EQ(0, sqlegsca(-1092, 1, lengths, id, &ca));
+  char buffer[SQLO_MSG_BUFFER_SZ];
+  int32_t length = sqlaintp_api(buffer, sizeof buffer, 0, "kxlsql.mo", &ca);
+  EXPECT_STREQ("SQL1092N  The user \"JOE\" lacks the authority for the command.\n", buffer);
+  EXPECT_EQ(int32_t(std::strlen(buffer)), length);
+
+  EXPECT_GT(sqlaintp_api(buffer, sizeof buffer, 20, "kxlsql.mo", &ca), 0);
+  EXPECT_STREQ("SQL1092N  The user\n\"JOE\" lacks the\nauthority for the\ncommand.\n", buffer);
+
+  ca.sqlcode = 100;
+  ca.sqlerrml = 0;
+  EXPECT_GT(sqlaintp_api(buffer, sizeof buffer, 0, "kxlsql.mo", &ca), 0);
+  EXPECT_STREQ("SQL0100W  No row was found.\n", buffer);
+  ca.sqlcode = -100;
+  EXPECT_LE(sqlaintp_api(buffer, sizeof buffer, 0, "kxlsql.mo", &ca), 0);
+}
+
+TEST_F(MessageService, InjectedFailureGivesNoText) {
+  installCatalog("en_US", "kxlinst.mo", KXL_TESTCAT_LE);
+  failCalls("sqlogmsg:1");
+  EXPECT_EQ("<none>", message("kxlinst.mo", 1951));
+  EXPECT_NE("<none>", message("kxlinst.mo", 1951));
+}
+
+} // namespace

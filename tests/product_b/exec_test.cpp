@@ -1,0 +1,106 @@
+// Running programs: the command line a program receives, its exit code, and
+// the failure codes when it cannot be started.
+#include "fixture.h"
+#include "sim/product/cmdline.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <filesystem>
+
+namespace {
+
+std::string lineFor(std::initializer_list<const char *> arguments) {
+  std::string line;
+  for (const char *argument : arguments)
+    kxlprod::appendArgument(line, argument);
+  return line;
+}
+
+TEST(CommandLine, ArgumentsAreQuotedForTheRunTimeParser) {
+  EXPECT_EQ("prog -h plain", lineFor({"prog", "-h", "plain"}));
+  EXPECT_EQ("\"C:\\Program Files\\x.exe\" \"\"", lineFor({"C:\\Program Files\\x.exe", ""}));
+  EXPECT_EQ("\"say \\\"hi\\\"\"", lineFor({"say \"hi\""}));
+  // Backslashes are doubled only before a quote, including the closing one.
+  EXPECT_EQ("\"a b\\\\\" c\\d", lineFor({"a b\\", "c\\d"}));
+  EXPECT_EQ("\"x\\\\\\\"y z\"", lineFor({"x\\\"y z"}));
+  // An argument already wrapped in quotes keeps being one argument.
+  EXPECT_EQ("\"C:\\my dir\\upgrade.log\"", lineFor({"\"C:\\my dir\\upgrade.log\""}));
+  EXPECT_EQ("\"C:\\dir\\\\\"", lineFor({"\"C:\\dir\\\""}));
+  EXPECT_EQ("\"C:\"", lineFor({"\"C:\""}));
+}
+
+TEST(CommandLine, BlocksAndCommandTexts) {
+  const char block[] = "C:\\KXL\\bin\\tool.exe\0-c\0\"C:\\i n\\SSLconfig.ini\"\0\0garbage";
+  std::string line;
+  ASSERT_TRUE(kxlprod::commandLineFromBlock(block, line));
+  EXPECT_EQ("C:\\KXL\\bin\\tool.exe -c \"C:\\i n\\SSLconfig.ini\"", line);
+
+  std::string program, rest;
+  kxlprod::splitCommandText("kxlset.exe -cleanup  -x", program, rest);
+  EXPECT_EQ("kxlset.exe", program);
+  EXPECT_EQ("-cleanup  -x", rest);
+  kxlprod::splitCommandText("\"C:\\a b\\p.exe\" arg", program, rest);
+  EXPECT_EQ("C:\\a b\\p.exe", program);
+  EXPECT_EQ("arg", rest);
+  kxlprod::splitCommandText("kxlimaudcfg.exe", program, rest);
+  EXPECT_EQ("kxlimaudcfg.exe", program);
+  EXPECT_EQ("", rest);
+}
+
+#ifndef _WIN32
+class Programs : public kxltest::LibraryWorld {
+protected:
+  void SetUp() override {
+    LibraryWorld::SetUp();
+    if (IsSkipped() || HasFatalFailure())
+      return;
+    namespace fs = std::filesystem;
+    fs::path bin = fs::path(worldRoot()) / "drive_c" / "KXL101" / "bin";
+    fs::create_directories(bin);
+    fs::copy_file(KXL_ARGDUMP, bin / "argdump.exe");
+    dumpPath_ = (fs::path(worldRoot()) / "args.txt").string();
+    kxltest::setProcessVariable("KXLTEST_ARGDUMP", dumpPath_.c_str());
+  }
+  void TearDown() override {
+    kxltest::setProcessVariable("KXLTEST_ARGDUMP", nullptr);
+    LibraryWorld::TearDown();
+  }
+  std::string dumpPath_;
+};
+
+TEST_F(Programs, ArgumentsArriveUnchangedAndTheExitCodeIsReported) {
+  const char block[] = "C:\\KXL101\\bin\\argdump.exe\0-l\0\"C:\\my dir\\upgrade.log\"\0two words\0"
+                       "say \"hi\"\0back\\slash\\\0\0";
+  uint32_t pid = 0;
+  SQLO_EXEC_RESULT result{};
+  ASSERT_EQ(0, sqloexec2("C:\\KXL101\\bin\\argdump.exe", block, 0, 0x40, &pid, &result, 0, 0));
+  EXPECT_EQ(1u, result.state);
+  EXPECT_EQ(7u, result.exitCode);
+  EXPECT_NE(0u, pid);
+  EXPECT_EQ("-l\nC:\\my dir\\upgrade.log\ntwo words\nsay \"hi\"\nback\\slash\\\n",
+            kxltest::hostFileText(dumpPath_));
+}
+
+TEST_F(Programs, ProgramsByNameAreFoundInTheCurrentCopy) {
+  SQLO_EXEC_RESULT result{};
+  ASSERT_EQ(0, sqloexec2("argdump.exe -cleanup", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
+  EXPECT_EQ(7u, result.exitCode);
+  EXPECT_EQ("-cleanup\n", kxltest::hostFileText(dumpPath_));
+  ASSERT_EQ(0, sqloexec2("argdump", nullptr, 0, 0xC0, nullptr, &result, 0, 0)) << "\".exe\" is implied";
+  EXPECT_EQ("", kxltest::hostFileText(dumpPath_));
+}
+
+TEST_F(Programs, AProgramThatCannotStartIsAnError) {
+  SQLO_EXEC_RESULT result{};
+  EXPECT_EQ(SQLO_RC_EXEC_FAILED,
+            sqloexec2("C:\\KXL101\\bin\\none.exe", nullptr, 0, 0x40, nullptr, &result, 0, 0));
+  EXPECT_EQ(SQLO_RC_EXEC_FAILED, sqloexec2("nothere.exe", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
+  EXPECT_EQ(0u, result.state);
+  failCalls("sqloexec2:1");
+  EXPECT_EQ(SQLO_RC_EXEC_FAILED, sqloexec2("argdump.exe", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
+  EXPECT_EQ(0, sqloexec2("argdump.exe", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
+}
+#endif
+
+} // namespace

@@ -1,0 +1,161 @@
+// Files and directories: open flags, copies and their failure codes, whole
+// trees, path tests and directory creation, quoted paths.
+#include "fixture.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+
+namespace {
+
+class Files : public kxltest::LibraryWorld {
+protected:
+  static uint32_t pathTest(const char *path) {
+    OSSPathParam param{OSS_PATH_PARAM_VERSION, path, 1, 0};
+    return ossPathTest(&param);
+  }
+  static uint32_t createDirectory(const char *path, uint64_t mode) {
+    OSSPathParam param{OSS_PATH_PARAM_VERSION, path, 0, mode};
+    return ossDirectoryCreate(&param);
+  }
+  // A small instance-like tree under `root`.
+  static void makeTree(const std::string &root) {
+    writeFile(root + "\\kxlsystm", std::string("\x01\x02\0\x03", 4));
+    writeFile(root + "\\cfg\\kxldj.ini", "dj");
+    writeFile(root + "\\security\\audit\\kxlaudit.cfg", "audit");
+    makeDirectories(root + "\\empty");
+  }
+};
+
+TEST_F(Files, OpenFlagsSelectReadingCreatingAndReplacing) {
+  SQLO_FHANDLE handle = nullptr;
+  EXPECT_EQ(SQLO_RC_FILE_NOT_FOUND, sqloopenp("C:\\KXL101\\none", 0x314, 0x750, &handle, 0));
+  EXPECT_EQ(nullptr, handle);
+  EXPECT_EQ(SQLO_RC_PATH_NOT_FOUND, sqloopenp("C:\\nodir\\none", 0x314, 0x750, &handle, 0));
+
+  // Create and write (the flags the partition files are written with).
+  ASSERT_EQ(0, sqloopenp("C:\\KXL101\\new.cfg", 842, 1604, &handle, 0));
+  uint32_t done = 0;
+  EXPECT_EQ(0, sqlowrite(handle, "first line\r\n", 12, &done));
+  EXPECT_EQ(12u, done);
+  EXPECT_EQ(0, sqloclose(handle));
+
+  // The same flags on an existing file replace its content and say so.
+  ASSERT_EQ(SQLO_RC_FILE_EXISTED, sqloopenp("C:\\KXL101\\new.cfg", 843, 1604, &handle, 0));
+  EXPECT_EQ(0, sqlowrite(handle, "two", 3, &done));
+  EXPECT_EQ(0, sqloclose(handle));
+  EXPECT_EQ("two", readFile("C:\\KXL101\\new.cfg"));
+
+  // Open existing for reading, read to the end.
+  ASSERT_EQ(0, sqloopenp("C:\\KXL101\\new.cfg", 0x314, 0x750, &handle, 0));
+  char buffer[16] = {};
+  EXPECT_EQ(0, sqloread(handle, buffer, sizeof buffer, &done));
+  EXPECT_EQ(3u, done);
+  EXPECT_EQ(0, sqloread(handle, buffer, sizeof buffer, &done));
+  EXPECT_EQ(0u, done);
+  EXPECT_EQ(0, sqloclose(handle));
+
+  EXPECT_EQ(SQLO_RC_ACCESS_DENIED, sqloopenp("C:\\KXL101", 0x314, 0x750, &handle, 0));
+}
+
+TEST_F(Files, CopyReplacesTheTargetAndNamesWhatIsMissing) {
+  writeFile("C:\\src\\a.txt", "new");
+  writeFile("C:\\dst\\a.txt", "old and longer");
+  EXPECT_EQ(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\a.txt", 0));
+  EXPECT_EQ("new", readFile("C:\\dst\\a.txt"));
+
+  EXPECT_EQ(int32_t(0x860F000Au), sqlocopy("C:\\src\\missing.txt", "C:\\dst\\b.txt", 0));
+  EXPECT_EQ(int32_t(0x870F0011u), sqlocopy("C:\\src\\cfg\\missing.txt", "C:\\dst\\b.txt", 0));
+  EXPECT_FALSE(exists("C:\\dst\\b.txt"));
+
+  // A file carried into a folder the target lacks gets that folder.
+  EXPECT_EQ(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\bin\\a.txt", 0));
+  EXPECT_EQ("new", readFile("C:\\dst\\bin\\a.txt"));
+
+  // Quoted paths, as directories with blanks are passed, work as well.
+  writeFile("C:\\with blank\\q.txt", "quoted");
+  EXPECT_EQ(0, sqlocopy("\"C:\\with blank\\q.txt\"", "\"C:\\with blank\\r.txt\"", 0));
+  EXPECT_EQ("quoted", readFile("C:\\with blank\\r.txt"));
+}
+
+TEST_F(Files, DirectoryTreesAreCopiedWholeAndDeletedWhole) {
+  makeTree("C:\\inst\\INST1");
+  // Into an existing, non-empty target: files merge, same names are replaced.
+  writeFile("C:\\backup\\kxlsystm", "stale");
+  writeFile("C:\\backup\\keep.txt", "kept");
+  ASSERT_EQ(0, sqlocopydir("C:\\backup", "C:\\inst\\INST1", 0));
+  EXPECT_EQ(std::string("\x01\x02\0\x03", 4), readFile("C:\\backup\\kxlsystm"));
+  EXPECT_EQ("dj", readFile("C:\\backup\\cfg\\kxldj.ini"));
+  EXPECT_EQ("audit", readFile("C:\\backup\\security\\audit\\kxlaudit.cfg"));
+  EXPECT_TRUE(ossIsDirectory("C:\\backup\\empty"));
+  EXPECT_EQ("kept", readFile("C:\\backup\\keep.txt"));
+
+  // A missing target is created with its parents.
+  ASSERT_EQ(0, sqlocopydir("C:\\new\\profile\\INST1", "C:\\inst\\INST1", 0));
+  EXPECT_EQ("dj", readFile("C:\\new\\profile\\INST1\\cfg\\kxldj.ini"));
+
+  EXPECT_EQ(SQLO_RC_PATH_NOT_FOUND, sqlocopydir("C:\\x", "C:\\inst\\none", 0));
+  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, sqlocopydir("C:\\inst\\INST1\\cfg\\inner", "C:\\inst\\INST1", 0))
+      << "a tree is never copied into itself";
+  EXPECT_FALSE(exists("C:\\inst\\INST1\\cfg\\inner"));
+
+  ASSERT_EQ(0, sqlodeletedir("C:\\backup"));
+  EXPECT_FALSE(exists("C:\\backup"));
+  EXPECT_TRUE(exists("C:\\inst\\INST1\\kxlsystm"));
+  EXPECT_EQ(SQLO_RC_PATH_NOT_FOUND, sqlodeletedir("C:\\backup"));
+  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, sqlodeletedir("C:\\"));
+  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, sqlodeletedir("C:"));
+  EXPECT_TRUE(exists("C:\\inst"));
+}
+
+TEST_F(Files, DeleteRemovesFilesOnly) {
+  writeFile("C:\\d\\f.txt", "x");
+  EXPECT_EQ(SQLO_RC_ACCESS_DENIED, sqlodelete("C:\\d", 0));
+  EXPECT_EQ(0, sqlodelete("C:\\d\\f.txt", 0));
+  EXPECT_EQ(SQLO_RC_FILE_NOT_FOUND, sqlodelete("C:\\d\\f.txt", 0));
+}
+
+TEST_F(Files, PathTestsAndDirectoryCreation) {
+  writeFile("C:\\p\\file.txt", "x");
+  EXPECT_EQ(0u, pathTest("C:\\p\\file.txt"));
+  EXPECT_EQ(0u, pathTest("C:\\p"));
+  EXPECT_EQ(0u, pathTest("\"C:\\p\""));
+  EXPECT_EQ(0x9000001Au, pathTest("C:\\p\\none"));
+  EXPECT_EQ(0x9000001Au, pathTest("C:\\none\\deeper"));
+  OSSPathParam badVersion{1, "C:\\p", 1, 0};
+  EXPECT_EQ(OSS_RC_NULL_ARGUMENT, ossPathTest(&badVersion));
+  EXPECT_EQ(OSS_RC_NULL_ARGUMENT, ossPathTest(nullptr));
+
+  EXPECT_TRUE(ossPathExists("C:\\p\\file.txt"));
+  EXPECT_FALSE(ossIsDirectory("C:\\p\\file.txt"));
+  EXPECT_TRUE(ossIsDirectory("C:\\p"));
+  EXPECT_FALSE(ossPathExists("C:\\p\\none"));
+
+  EXPECT_EQ(0u, createDirectory("C:\\a\\b\\c", 2)) << "mode 2 creates the parents";
+  EXPECT_TRUE(ossIsDirectory("C:\\a\\b\\c"));
+  EXPECT_EQ(0u, createDirectory("C:\\a\\b\\c", 2)) << "an existing directory is fine";
+  EXPECT_EQ(0x9000001Au, createDirectory("C:\\x\\y", 0));
+  EXPECT_FALSE(exists("C:\\x"));
+  EXPECT_NE(0u, createDirectory("C:\\p\\file.txt", 2));
+}
+
+TEST_F(Files, BoundedFormatting) {
+  char id[10];
+  EXPECT_EQ(9, ossSnprintf(id, sizeof id, "%s", "ADMINISTRATOR"));
+  EXPECT_STREQ("ADMINISTR", id);
+  EXPECT_EQ(2, ossSnprintf(id, sizeof id, "%d", 42));
+  EXPECT_STREQ("42", id);
+  EXPECT_EQ(-1, ossSnprintf(id, 0, "%s", "x"));
+}
+
+TEST_F(Files, InjectedFailures) {
+  writeFile("C:\\src\\a.txt", "new");
+  failCalls("sqlocopy:2,ossPathTest:1");
+  EXPECT_EQ(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\a.txt", 0));
+  EXPECT_NE(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\b.txt", 0));
+  EXPECT_FALSE(exists("C:\\dst\\b.txt"));
+  EXPECT_NE(0u, pathTest("C:\\src\\a.txt"));
+  EXPECT_EQ(0u, pathTest("C:\\src\\a.txt"));
+}
+
+} // namespace

@@ -1,0 +1,171 @@
+// Names and text: comparisons, upper-casing, instance names, languages and
+// the password prompt.
+#include "fixture.h"
+#include "sim/product/text.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <string>
+
+#ifdef _WIN32
+#include <fcntl.h>
+#include <io.h>
+#else
+#include <unistd.h>
+#endif
+
+namespace {
+
+TEST(Compare, IgnoresCaseOverTheGivenLength) {
+  struct Case {
+    const char *a, *b;
+    uint32_t length;
+    bool equal;
+  } cases[] = {
+      {"q", "q", 1, true},
+      {"Quiet", "q", 1, true},
+      {"INSTALLx", "install", 7, true},
+      {"instal", "install", 7, false},
+      {"", "?", 1, false},
+      {"p", "q", 1, false},
+      {"server", "SERVER", 0, true},
+      {"SERVERX", "SERVER", 0, false},
+      // A value cut to its 19-character field still names its word.
+      {"kerberos_server_enc", "KERBEROS_SERVER_ENCRYPT", 0, true},
+      {"DCS_ENCRYPT", "DCS", 0, false},
+      {"", "SERVER", 0, false},
+      {"", "", 0, true},
+  };
+  for (const Case &c : cases) {
+    EXPECT_EQ(c.equal, sqlomcpi(c.a, c.b, c.length) == 0) << c.a << " / " << c.b << " / " << c.length;
+  }
+  EXPECT_LT(sqlomcpi("a", "B", 1), 0);
+  EXPECT_GT(sqlomcpi("c", "B", 1), 0);
+}
+
+TEST(Upper, ConvertsInPlaceWithinTheLength) {
+  char name[] = "inst1x@";
+  EXPECT_EQ(0, sqlotoup(5, 0, name));
+  EXPECT_STREQ("INST1x@", name);
+  EXPECT_EQ(0, sqlotoup(0, 0, name));
+  EXPECT_STREQ("INST1X@", name);
+  char shortText[] = "ab";
+  EXPECT_EQ(0, sqlotoup(8, 0, shortText));
+  EXPECT_STREQ("AB", shortText);
+}
+
+TEST(InstanceNames, AcceptOnlyShortNamesOfNameCharacters) {
+  for (const char *good : {"KXL", "INST1", "A", "ABCDEFGH", "a_b$c#d@"}) {
+    EXPECT_EQ(0, sqloacss(good, 16)) << good;
+  }
+  for (const char *bad : {"", "1INST", "_INST", "ABCDEFGHI", "IN ST", "INST-1", "INST.1", "\xC4INST"}) {
+    EXPECT_NE(0, sqloacss(bad, 16)) << bad;
+  }
+  EXPECT_NE(0, sqloacss(nullptr, 16));
+}
+
+TEST(Languages, LocaleTextsBecomeDirectoryNames) {
+  EXPECT_EQ("de_DE", kxlprod::normalizeLanguage("de_DE.UTF-8@euro"));
+  EXPECT_EQ("pt_BR", kxlprod::normalizeLanguage("PT-br"));
+  EXPECT_EQ("fr", kxlprod::normalizeLanguage("fr"));
+  EXPECT_EQ("en_US", kxlprod::normalizeLanguage("C.UTF-8"));
+  EXPECT_EQ("en_US", kxlprod::normalizeLanguage("POSIX"));
+  EXPECT_EQ("es_419", kxlprod::normalizeLanguage("es_419"));
+  for (const char *bad : {"", "english", "de_", "../x", "d3_DE", "de_DE_X"}) {
+    EXPECT_EQ("", kxlprod::normalizeLanguage(bad)) << bad;
+  }
+}
+
+class EnvironmentLanguage : public kxltest::ProductWorld {
+protected:
+  void TearDown() override {
+    kxltest::setProcessVariable("LC_ALL", nullptr);
+    kxltest::setProcessVariable("LANG", nullptr);
+    ProductWorld::TearDown();
+  }
+};
+
+TEST_F(EnvironmentLanguage, IdentityThenEnvironmentThenEnglish) {
+  kxltest::setProcessVariable("LC_ALL", nullptr);
+  kxltest::setProcessVariable("LANG", nullptr);
+  EXPECT_STREQ("en_US", sqloGetNormalizedEnvLang(1));
+  kxltest::setProcessVariable("LANG", "fr_FR.UTF-8");
+  EXPECT_STREQ("fr_FR", sqloGetNormalizedEnvLang(1));
+  kxltest::setProcessVariable("LC_ALL", "it_IT");
+  EXPECT_STREQ("it_IT", sqloGetNormalizedEnvLang(1));
+  setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "Language", "ja-jp");
+  EXPECT_STREQ("ja_JP", sqloGetNormalizedEnvLang(1));
+  kxltest::setProcessVariable("LC_ALL", "nonsense!");
+  setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "Language", "");
+  EXPECT_STREQ("fr_FR", sqloGetNormalizedEnvLang(1)) << "unusable values are passed over";
+}
+
+// Standard input replaced by a pipe holding `input` for one case.
+class PipedInput : public kxltest::ProductWorld {
+protected:
+  void feed(const std::string &input) {
+    int fds[2];
+#ifdef _WIN32
+    ASSERT_EQ(0, _pipe(fds, 4096, _O_BINARY));
+    saved_ = _dup(0);
+    ASSERT_EQ(int(input.size()), _write(fds[1], input.data(), unsigned(input.size())));
+    _close(fds[1]);
+    _dup2(fds[0], 0);
+    _close(fds[0]);
+#else
+    ASSERT_EQ(0, pipe(fds));
+    saved_ = dup(0);
+    ASSERT_EQ(ssize_t(input.size()), write(fds[1], input.data(), input.size()));
+    close(fds[1]);
+    dup2(fds[0], 0);
+    close(fds[0]);
+#endif
+  }
+  void TearDown() override {
+    if (saved_ >= 0) {
+#ifdef _WIN32
+      _dup2(saved_, 0);
+      _close(saved_);
+#else
+      dup2(saved_, 0);
+      close(saved_);
+#endif
+    }
+    ProductWorld::TearDown();
+  }
+  int saved_ = -1;
+};
+
+TEST_F(PipedInput, PasswordIsReadFromANonTerminal) {
+  feed("s3cret pass\r\nnext line\n");
+  char password[256] = "old";
+  ::testing::internal::CaptureStdout();
+  int32_t rc = sqlo_get_password("joe", password, sizeof password);
+  std::string shown = ::testing::internal::GetCapturedStdout();
+  EXPECT_EQ(0, rc);
+  EXPECT_STREQ("s3cret pass", password);
+  EXPECT_EQ("Enter password for joe:", shown);
+}
+
+TEST_F(PipedInput, PasswordIsCutToTheBufferAndEndOfInputFails) {
+  feed("abcdefghij");
+  char password[5];
+  ::testing::internal::CaptureStdout();
+  EXPECT_EQ(0, sqlo_get_password("joe", password, sizeof password));
+  EXPECT_STREQ("abcd", password);
+  EXPECT_NE(0, sqlo_get_password("joe", password, sizeof password)) << "nothing left to read";
+  EXPECT_STREQ("", password);
+  ::testing::internal::GetCapturedStdout();
+}
+
+TEST(TextFaults, InjectedFailureOfTheComparison) {
+  kxltest::setProcessVariable("KXLSIM_FAIL", "sqlomcpi:1");
+  kxlsim::resetFaults();
+  EXPECT_NE(0, sqlomcpi("q", "q", 1));
+  EXPECT_EQ(0, sqlomcpi("q", "q", 1));
+  kxltest::setProcessVariable("KXLSIM_FAIL", nullptr);
+  kxlsim::resetFaults();
+}
+
+} // namespace
