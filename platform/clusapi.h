@@ -1,6 +1,6 @@
 // The cluster API ("clusapi.dll") and the resource utility library
 // ("resutils.dll"), bound at run time by name. On Windows the types come from
-// the system headers; elsewhere they are declared here with Windows' values.
+// the system's cluster header; elsewhere they are declared here with Windows' values.
 // Either way this header adds one function-pointer type per entry point the
 // command looks up, named PFN_<entry point>.
 #pragma once
@@ -9,8 +9,16 @@
 
 #if defined(_WIN32)
 
+// The toolchain's cluster header declares its newer types twice when it is
+// asked for them; the entry points bound here all predate them. Its resource
+// utility header does not build on its own, and only the service handle type
+// of the three resource utility entry points is needed from it.
+#include <winsvc.h>
+#pragma push_macro("_WIN32_WINNT")
+#undef _WIN32_WINNT
+#define _WIN32_WINNT 0x0502
 #include <clusapi.h>
-#include <resapi.h>
+#pragma pop_macro("_WIN32_WINNT")
 
 #else // simulated Windows
 

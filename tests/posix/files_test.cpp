@@ -1,6 +1,8 @@
 // Files, searches and directories of the world, with Windows' codes.
 #include "world_fixture.h"
 
+#include "sim/common/simfail.h"
+
 #include <cerrno>
 #include <cstdlib>
 #include <set>
@@ -211,6 +213,27 @@ TEST_F(FilesTest, TempnamGivesDistinctNamesThatDoNotExist) {
   ASSERT_NE(name, nullptr);
   EXPECT_EQ(std::string(name).rfind("C:\\Fallback\\KXL", 0), 0u) << name;
   std::free(name);
+}
+
+} // namespace
+} // namespace kxlposixtest
+
+namespace kxlposixtest {
+namespace {
+
+TEST_F(FilesTest, InjectedFaultFailsOnlyTheNamedCall) {
+  makeDir("drive_c/D");
+  setenv("KXLSIM_FAIL", "GetFileAttributesA:2,CreateDirectoryA:1", 1);
+  kxlsim::resetFaults();
+  EXPECT_EQ(GetFileAttributesA("C:\\D"), static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY));
+  EXPECT_EQ(GetFileAttributesA("C:\\D"), INVALID_FILE_ATTRIBUTES);
+  EXPECT_NE(GetLastError(), 0u);
+  EXPECT_EQ(GetFileAttributesA("C:\\D"), static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY));
+  EXPECT_FALSE(CreateDirectoryA("C:\\D\\E", nullptr));
+  EXPECT_FALSE(exists("drive_c/D/E")) << "a failed call changes nothing";
+  EXPECT_TRUE(CreateDirectoryA("C:\\D\\E", nullptr));
+  unsetenv("KXLSIM_FAIL");
+  kxlsim::resetFaults();
 }
 
 } // namespace
