@@ -35,7 +35,7 @@ constexpr DefaultValue kServerDefaults[] = {
     {96, 2, 1, kAll},
     {98, 2, 0xFFFF, kAll},
     {812, 4, 1000, kAll},
-    {798, 2, 64, kAll},
+
     {808, 4, kCpuMeasureBits, kAll},
     {800, 4, 32, kAll},
     {804, 4, kMinusOne, kAll},
@@ -62,7 +62,8 @@ constexpr DefaultValue kServerDefaults[] = {
 
 // Values every node type keeps, the client type included.
 constexpr DefaultValue kCommonDefaults[] = {
-    {36, 2, 8192, kAll}, {796, 2, 128, kAll}, {794, 2, 1, kAll}, {1034, 2, 3, kAll}, {3124, 4, 2048, kAll},
+    {36, 2, 8192, kAll}, {796, 2, 128, kAll}, {798, 2, 64, kAll},
+    {794, 2, 1, kAll},   {1034, 2, 3, kAll},  {3124, 4, 2048, kAll},
 };
 
 void applyDefaults(std::vector<uint8_t> &image, const DefaultValue *first, const DefaultValue *last,

@@ -1,0 +1,133 @@
+// Comparing worlds: equal worlds, and each kind of change named readably.
+#include "world_fixture.h"
+
+#include "sim/kxlsim/diff.h"
+#include "sim/kxlsim/snapshot.h"
+#include "sim/kxlsim/world_reader.h"
+
+#include <sstream>
+
+namespace kxlsim::test {
+namespace {
+
+class WorldPair : public TempDirTest {
+protected:
+  void SetUp() override {
+    TempDirTest::SetUp();
+    before_ = sharedDemoWorld();
+    after_ = path("after");
+    std::string error;
+    ASSERT_TRUE(snapshotWorld(before_, after_, error)) << error;
+    ASSERT_TRUE(selectWorld(after_, error)) << error;
+  }
+  int diff(std::string &text, bool reversed = false) {
+    std::ostringstream out;
+    int rc = reversed ? diffWorlds(after_, before_, out) : diffWorlds(before_, after_, out);
+    text = out.str();
+    return rc;
+  }
+  std::string before_, after_;
+  WorldWriter w_;
+};
+
+TEST_F(WorldPair, SnapshotOfAWorldEqualsIt) {
+  std::string text;
+  EXPECT_EQ(diff(text), 0);
+  EXPECT_EQ(text, "");
+}
+
+TEST_F(WorldPair, ChangedValuesAreNamedByKeyAndMachine) {
+  w_.setDword(localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1", "State", 4);
+  w_.setString(remoteMachine("WINSRV2"), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1", "ImagePath",
+               "C:\\Program Files\\ZAV\\KXL101\\bin\\kxlsyscs.exe");
+  ASSERT_TRUE(w_.ok());
+  std::string text;
+  EXPECT_EQ(diff(text), 1);
+  EXPECT_NE(
+      text.find("registry ~ HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1 \"State\": dword:1 -> dword:4\n"),
+      std::string::npos)
+      << text;
+  EXPECT_NE(text.find("registry ~ [WINSRV2] HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1 \"ImagePath\": "
+                      "\"C:\\Program Files\\ZAV\\KXL95\\bin\\kxlsyscs.exe\" -> "
+                      "\"C:\\Program Files\\ZAV\\KXL101\\bin\\kxlsyscs.exe\""),
+            std::string::npos)
+      << text;
+}
+
+TEST_F(WorldPair, AddedKeysAndValuesShowInBothDirections) {
+  w_.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1", "KXLCOMM",
+               "tcp");
+  w_.setMultiString(currentUser(), "Software\\Test", "List", {"a", "b"});
+  ASSERT_TRUE(w_.ok());
+  std::string text;
+  EXPECT_EQ(diff(text), 1);
+  EXPECT_NE(text.find("registry + HKLM\\SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1\n"),
+            std::string::npos)
+      << text;
+  EXPECT_NE(text.find("+ \"KXLCOMM\" = \"tcp\""), std::string::npos) << text;
+  EXPECT_NE(text.find("registry + HKCU\\Software\\Test"), std::string::npos) << text;
+  EXPECT_NE(text.find("\"List\" = multi:[\"a\", \"b\"]"), std::string::npos) << text;
+  EXPECT_EQ(diff(text, true), 1);
+  EXPECT_NE(text.find("registry - HKLM\\SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1\n"),
+            std::string::npos)
+      << text;
+}
+
+TEST_F(WorldPair, FileChangesAreListedTextByLineBinaryBySizeAndHash) {
+  w_.writeText("C:\\Program Files\\ZAV\\KXL95\\INST1\\notes.log", "new\r\n");
+  ASSERT_TRUE(DeleteFileA("C:\\Program Files\\ZAV\\KXL95\\function\\kxludf.dll"));
+  std::vector<uint8_t> image;
+  ASSERT_TRUE(readFileHead("C:\\Program Files\\ZAV\\KXL95\\INST1\\kxlsystm", 16384, image));
+  image[100] ^= 1;
+  w_.writeFile("C:\\Program Files\\ZAV\\KXL95\\INST1\\kxlsystm", image);
+  std::vector<uint8_t> services;
+  ASSERT_TRUE(readFileHead("C:\\windows\\system32\\drivers\\etc\\services", 65536, services));
+  std::string servicesText(services.begin(), services.end());
+  w_.writeText("C:\\windows\\system32\\drivers\\etc\\services", servicesText + "KXL_INST9 61000/tcp\r\n");
+  ASSERT_TRUE(w_.ok());
+
+  std::string text;
+  EXPECT_EQ(diff(text), 1);
+  EXPECT_NE(text.find("file + C:\\Program Files\\ZAV\\KXL95\\INST1\\notes.log (5 bytes, fnv "),
+            std::string::npos)
+      << text;
+  EXPECT_NE(text.find("file - C:\\Program Files\\ZAV\\KXL95\\function\\kxludf.dll\n"), std::string::npos)
+      << text;
+  EXPECT_NE(text.find("file ~ C:\\Program Files\\ZAV\\KXL95\\INST1\\kxlsystm (16384 bytes, fnv "),
+            std::string::npos)
+      << text;
+  EXPECT_NE(text.find("file ~ C:\\windows\\system32\\drivers\\etc\\services\n       + KXL_INST9 61000/tcp\n"),
+            std::string::npos)
+      << text;
+}
+
+TEST_F(WorldPair, RegistryFilesAreNotListedAsFiles) {
+  w_.writeText("C:\\x.txt", "");
+  std::string text;
+  diff(text);
+  EXPECT_NE(text.find("file + C:\\x.txt (0 bytes"), std::string::npos) << text;
+  EXPECT_EQ(text.find("system.reg"), std::string::npos) << "hives are compared as registry, not as files";
+}
+
+TEST_F(TempDirTest, SnapshotRefusesAnExistingTargetAndANonWorld) {
+  std::string world = makeWorld("w", "empty");
+  std::string error;
+  EXPECT_FALSE(snapshotWorld(world, world, error));
+  EXPECT_FALSE(snapshotWorld(path("none"), path("copy"), error));
+  std::ostringstream out;
+  EXPECT_EQ(diffWorlds(world, path("none"), out), 2);
+}
+
+TEST(DisplayKeyPath, MachinesAreNamedAndRootsShortened) {
+  EXPECT_EQ(displayKeyPath("HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV"), "HKLM\\SOFTWARE\\ZAV");
+  EXPECT_EQ(displayKeyPath("HKEY_CURRENT_USER\\Software"), "HKCU\\Software");
+  EXPECT_EQ(
+      displayKeyPath("HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV\\KXLSIM\\Machines\\WINSRV2\\SOFTWARE\\ZAV\\KXL"),
+      "[WINSRV2] HKLM\\SOFTWARE\\ZAV\\KXL");
+  EXPECT_EQ(displayKeyPath("HKEY_LOCAL_MACHINE\\software\\zav\\kxlsim\\machines\\node3"), "[node3] HKLM");
+  EXPECT_EQ(displayKeyPath("HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV\\KXLSIM\\Machines"),
+            "HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Machines");
+}
+
+} // namespace
+} // namespace kxlsim::test
