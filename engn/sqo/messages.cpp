@@ -1,0 +1,196 @@
+// Final messages: catalog texts through the product library, written to
+// standard output exactly as they are (never as a format string).
+#include "engn/sqo/messages.h"
+
+#include "engn/sqo/boundedtext.h"
+#include "platform/kxlsys.h"
+
+#include <cstdio>
+#include <cstring>
+
+namespace {
+
+constexpr uint32_t kTraceInstanceMessage = 0x187805A1;
+
+constexpr char kInstanceCatalog[] = "kxlinst.mo";
+constexpr char kCommandCatalog[] = "kxlclp.mo";
+constexpr char kSqlCatalog[] = "kxlsql.mo";
+constexpr char kNewCommandName[] = "KXLIUPGRADE";
+
+constexpr int kTextSearchWarning = 1273;
+constexpr int kDeprecatedCommand = 1392;
+constexpr int kUnsupportedInstanceType = 1231;
+
+// Work buffer of replaceMessageToken: one more than a message buffer.
+constexpr std::size_t kWorkBufferSize = SQLO_MSG_BUFFER_SZ + 1;
+
+// Display words of node types 1 to 4.
+constexpr const char *kInstanceTypeWords[] = {"STANDALONE", "CLIENT", "SERVER", "PARTITIONED"};
+
+void writeText(const char *text) {
+  std::fwrite(text, 1, std::strlen(text), stdout);
+  std::fflush(stdout);
+}
+
+const char *orEmpty(const char *text) {
+  return text != nullptr ? text : "";
+}
+
+uint32_t messageNumber(int code) {
+  return code < 0 ? 0u - uint32_t(code) : uint32_t(code);
+}
+
+void printInstanceFallback(const char *prefix, const char *text, int code) {
+  std::printf("%s:%s, RC = %d\n", orEmpty(prefix), orEmpty(text), code);
+  std::fflush(stdout);
+}
+
+// First occurrence of `needle` in `haystack`, ignoring the case of ASCII letters.
+const char *findIgnoringCase(const char *haystack, const char *needle) {
+  std::size_t length = std::strlen(needle);
+  for (const char *at = haystack; *at != '\0'; ++at) {
+    if (sqlomcpi(at, needle, uint32_t(length)) == 0)
+      return at;
+  }
+  return length == 0 ? haystack : nullptr;
+}
+
+void fillCodePlaceholders(char *message, const char *prefix, int code, const UpgradeOptions *options) {
+  if (code == kDeprecatedCommand) {
+    replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<deprecated-command-name>\"", orEmpty(prefix));
+    replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<new-command-name>\"", kNewCommandName);
+    return;
+  }
+  if (options == nullptr)
+    return;
+  if (code == kTextSearchWarning) {
+    char reason[16] = {};
+    std::snprintf(reason, sizeof reason, "%d", int(options->partitionRecord.textSearchReasonCode));
+    replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<reason-code>\"", reason);
+  } else if (code == kUnsupportedInstanceType) {
+    char name[UPGRADE_INSTANCE_NAME_SZ] = {};
+    copyText(name, sizeof name, options->instanceName);
+    replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<instance-name>\"", name);
+    replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<original-instance-type>\"",
+                        instanceTypeWord(options->oldInstanceType));
+    replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<upgraded-instance-type>\"",
+                        instanceTypeWord(options->newInstanceType));
+  }
+}
+
+// The next non-empty piece of `text` between double quotes, from `*cursor`.
+bool nextPiece(const char *&cursor, const char *&piece, std::size_t &length) {
+  while (*cursor == '"')
+    ++cursor;
+  if (*cursor == '\0')
+    return false;
+  piece = cursor;
+  length = std::strcspn(cursor, "\"");
+  cursor += length;
+  return true;
+}
+
+// Each record token goes, in double quotes, where the next quoted piece stood.
+void spliceTokens(const char *message, const UpgradeOptions &options, TextBuilder &out) {
+  const char *cursor = message;
+  const char *piece = nullptr;
+  std::size_t length = 0;
+  uint32_t count = options.tokenCount < UPGRADE_MAX_TOKENS ? options.tokenCount : UPGRADE_MAX_TOKENS;
+  for (uint32_t i = 0; i < count; ++i) {
+    if (!nextPiece(cursor, piece, length))
+      return;
+    out.append(piece, length);
+    out.append('"');
+    out.append(orEmpty(options.tokens[i]));
+    out.append('"');
+    nextPiece(cursor, piece, length); // the placeholder's name
+  }
+  while (nextPiece(cursor, piece, length))
+    out.append(piece, length);
+}
+
+} // namespace
+
+const char *instanceTypeWord(uint32_t nodeType) {
+  if (nodeType >= 1 && nodeType <= sizeof kInstanceTypeWords / sizeof kInstanceTypeWords[0])
+    return kInstanceTypeWords[nodeType - 1];
+  return "";
+}
+
+void replaceMessageToken(char *message, std::size_t size, const char *placeholder, const char *value) {
+  if (message == nullptr || placeholder == nullptr)
+    return;
+  if (std::strlen(message) + std::strlen(placeholder) > size)
+    return;
+  if (findIgnoringCase(message, placeholder) == nullptr)
+    return;
+  const char *open = std::strstr(message, "\"<");
+  if (open == nullptr)
+    return;
+  // The closing mark is looked for after the opening one, so that a stray
+  // '>"' earlier in the text cannot duplicate a part of it.
+  const char *close = std::strstr(open, ">\"");
+  if (close == nullptr)
+    return;
+  char work[kWorkBufferSize];
+  TextBuilder out(work, sizeof work);
+  out.append(message, std::size_t(open - message));
+  out.append(orEmpty(value));
+  out.append(close + 2);
+  copyText(message, size, out.text());
+}
+
+void printInstanceMessage(const char *prefix, int code, const char *text, const UpgradeOptions *options) {
+  pdtEntry(kTraceInstanceMessage);
+  char message[SQLO_MSG_BUFFER_SZ] = {};
+  int32_t detail = 0;
+  int32_t length = sqlogmsg(kInstanceCatalog, messageNumber(code), nullptr, nullptr, message, sizeof message,
+                            &detail, 0, 0, 0);
+  if (length <= 0) {
+    printInstanceFallback(prefix, text, code);
+    pdtExit(kTraceInstanceMessage, length, 1);
+    return;
+  }
+  message[sizeof message - 1] = '\0';
+  fillCodePlaceholders(message, prefix, code, options);
+  if (options == nullptr || options->tokenCount == 0) {
+    writeText(message);
+    if (code == kTextSearchWarning)
+      printInstanceFallback(prefix, text, code);
+  } else {
+    char spliced[SQLO_MSG_BUFFER_SZ];
+    TextBuilder out(spliced, sizeof spliced);
+    spliceTokens(message, *options, out);
+    writeText(out.text());
+  }
+  pdtExit(kTraceInstanceMessage, 0, 0);
+}
+
+void printSqlcaMessage(const char *prefix, const sqlca *status, const char *text) {
+  char message[SQLO_MSG_BUFFER_SZ] = {};
+  int32_t length = status != nullptr ? sqlaintp_api(message, sizeof message, 0, kSqlCatalog, status) : 0;
+  if (length > 0) {
+    message[sizeof message - 1] = '\0';
+    writeText(message);
+    return;
+  }
+  std::printf("%s:%s, SQLCODE=%d\n", orEmpty(prefix), orEmpty(text),
+              status != nullptr ? int(sqlcaCode(*status)) : 0);
+  std::fflush(stdout);
+}
+
+void printSuccessMessage(const char *prefix, int code) {
+  const char *tokens[] = {orEmpty(prefix), nullptr};
+  const uint64_t lengths[] = {std::strlen(tokens[0]), 0};
+  char message[SQLO_MSG_BUFFER_SZ] = {};
+  int32_t detail = 0;
+  int32_t length = sqlogmsg(kCommandCatalog, messageNumber(code), lengths, tokens, message, sizeof message,
+                            &detail, 0, 0, 0);
+  if (length > 0) {
+    message[sizeof message - 1] = '\0';
+    writeText(message);
+    return;
+  }
+  std::printf("%s: processing completed successfully.\n", orEmpty(prefix));
+  std::fflush(stdout);
+}

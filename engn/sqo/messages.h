@@ -1,0 +1,28 @@
+// The messages the command prints at the end of a run: texts of the product's
+// message catalogs, or fixed fallback lines when a text cannot be had.
+#pragma once
+
+#include "engn/sqo/options.h"
+
+#include <cstddef>
+
+// Message |code| of "kxlinst.mo" with its code-specific placeholders filled and
+// the record's tokens spliced in; "<prefix>:<text>, RC = <code>" when the
+// catalog has no text. `options` may be null.
+void printInstanceMessage(const char *prefix, int code, const char *text, const UpgradeOptions *options);
+
+// The "kxlsql.mo" text for the block's SQLCODE, or
+// "<prefix>:<text>, SQLCODE=<code>".
+void printSqlcaMessage(const char *prefix, const sqlca *status, const char *text);
+
+// Message |code| of "kxlclp.mo" with the prefix as its one token, or
+// "<prefix>: processing completed successfully.".
+void printSuccessMessage(const char *prefix, int code);
+
+// Replaces the first quoted placeholder ("<...>", quotes included) of
+// `message` (capacity `size`) with `value`, provided `placeholder` occurs in
+// it, ignoring case. Placeholders are therefore replaced in text order.
+void replaceMessageToken(char *message, std::size_t size, const char *placeholder, const char *value);
+
+// The display word of a node type in message 1231; "" for an unknown type.
+const char *instanceTypeWord(uint32_t nodeType);
