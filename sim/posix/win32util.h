@@ -9,7 +9,6 @@
 namespace kxlsim::posix {
 
 // Error codes the surface reports that the public header does not list.
-constexpr DWORD kErrorInvalidFunction = 1;
 constexpr DWORD kErrorDirectory = 267;
 constexpr DWORD kErrorBufferOverflow = 111;
 constexpr DWORD kErrorNotSameDevice = 17;
