@@ -17,21 +17,18 @@ inline constexpr uint32_t KXLI_RC_NAME_NOT_FOUND = 0x9000006Du;   // no entry of
 inline constexpr uint32_t KXLI_RC_NO_MEMORY = 0x9000000Du;        // allocation failed
 
 // Names of copies and instances are single-byte text compared ignoring case.
+inline char kxliUpper(char c) {
+  return c >= 'a' && c <= 'z' ? static_cast<char>(c - 'a' + 'A') : c;
+}
+
 inline bool kxliSameName(const char *a, const char *b) {
   if (a == nullptr || b == nullptr)
     return a == b;
-  for (;; ++a, ++b) {
-    unsigned char ca = static_cast<unsigned char>(*a);
-    unsigned char cb = static_cast<unsigned char>(*b);
-    if (ca >= 'a' && ca <= 'z')
-      ca = static_cast<unsigned char>(ca - 'a' + 'A');
-    if (cb >= 'a' && cb <= 'z')
-      cb = static_cast<unsigned char>(cb - 'a' + 'A');
-    if (ca != cb)
-      return false;
-    if (ca == '\0')
+  for (; kxliUpper(*a) == kxliUpper(*b); ++a, ++b) {
+    if (*a == '\0')
       return true;
   }
+  return false;
 }
 
 // Destroys an object a list owned: strings were allocated with malloc

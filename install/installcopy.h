@@ -66,12 +66,12 @@ public:
   char path[KXLI_COPY_PATH_SZ];        // "KXL Path Name", one trailing backslash removed
   char registryKey[KXLI_COPY_PATH_SZ]; // under HKEY_LOCAL_MACHINE
   uint8_t isV8;
-  uint8_t perUser;   // the copy's key has a "Users" subkey
-  uint32_t view32;   // KXLI_VIEW32 or 0
-  uint32_t view64;   // KXLI_VIEW64 or 0
+  uint8_t perUser;                      // the copy's key has a "Users" subkey
+  uint32_t view32;                      // KXLI_VIEW32 or 0
+  uint32_t view64;                      // KXLI_VIEW64 or 0
   InstalledProdList *installedProducts; // owned, null until asked for
   IKXLINSTANCELIST *instances;          // owned, null until asked for
-  uint32_t status; // 0 valid, 1 registration unreadable, 2 no "Components" (32-bit view)
+  uint32_t status;                      // 0 valid, 1 registration unreadable, 2 no "Components" (32-bit view)
   ILIST<char> components;
 
 private:

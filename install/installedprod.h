@@ -78,6 +78,7 @@ public:
   uint32_t status;   // always 0
 
 private:
+  void addProduct(const char *code, const char *registered);
   void addCurrentReleaseProducts();
   void addV8Products();
 };

@@ -1,0 +1,155 @@
+#include "install/kxlinstance.h"
+
+#include "install/installcopy.h"
+#include "install/iutil.h"
+#include "platform/kxlsys.h"
+#include "platform/win32.h"
+
+#include <cstdio>
+#include <cstring>
+#include <new>
+
+namespace {
+
+// Read and set-value access to an instance's profile key.
+constexpr REGSAM kProfileAccess = 0x2001B;
+constexpr const char kClusterValue[] = "KXLCLUSTER";
+
+// The platform reports every copy's instances; this one belongs to `owner` when
+// its copy is the owner, or when it has no copy and the owner is the
+// version-8 installation.
+bool belongsTo(const OSSInstanceInfo_t &info, const char *ownerName) {
+  if (kxliSameName(info.copyName, ownerName))
+    return true;
+  return info.copyName[0] == '\0' && kxliSameName(ownerName, KXLI_V8_COPY_NAME);
+}
+
+// The record's text fields are the platform's; make sure each ends in its field.
+void terminateFields(OSSInstanceInfo_t &info) {
+  info.instanceName[sizeof info.instanceName - 1] = '\0';
+  info.instanceDir[sizeof info.instanceDir - 1] = '\0';
+  info.copyName[sizeof info.copyName - 1] = '\0';
+}
+
+} // namespace
+
+// ---------------------------------------------------------------------------
+// IKXLINSTANCE
+// ---------------------------------------------------------------------------
+
+IKXLINSTANCE::IKXLINSTANCE()
+    : owner(nullptr), instanceDir{}, name{}, clusterName{}, isClustered(0), dbmCfgImage{} {}
+
+IKXLINSTANCE::IKXLINSTANCE(const char *instanceName, InstallCopy *copy, const char *directory)
+    : owner(copy), instanceDir{}, name{}, clusterName{}, isClustered(0), dbmCfgImage{} {
+  kxliSetString(name, sizeof name, instanceName);
+  kxliSetString(instanceDir, sizeof instanceDir, directory);
+  // A missing kxlsystm leaves the snapshot empty; the instance still counts.
+  kxliReadDbmCfg(instanceDir, dbmCfgImage, sizeof dbmCfgImage);
+  if (owner != nullptr)
+    readClusterName();
+}
+
+IKXLINSTANCE::~IKXLINSTANCE() = default;
+
+void IKXLINSTANCE::readClusterName() {
+  char key[KXLI_PATH_BUFFER_SZ];
+  if (owner->IsV8Copy()) {
+    std::snprintf(key, sizeof key, "SOFTWARE\\ZAV\\KXL\\PROFILES\\%s", name);
+  } else {
+    char copyName[KXLI_COPY_NAME_SZ] = {};
+    owner->GetName(copyName, sizeof copyName);
+    std::snprintf(key, sizeof key, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\%s\\PROFILES\\%s", copyName, name);
+  }
+  if (kxliReadRegString(HKEY_LOCAL_MACHINE, key, kProfileAccess, kClusterValue, clusterName,
+                        sizeof clusterName) == ERROR_SUCCESS)
+    isClustered = 1;
+  else
+    clusterName[0] = '\0';
+}
+
+uint32_t IKXLINSTANCE::GetName(char *buffer, uint32_t size) const {
+  return kxliGetString(name, buffer, size);
+}
+
+uint32_t IKXLINSTANCE::GetInstanceDir(char *buffer, uint32_t size) const {
+  return kxliGetString(instanceDir, buffer, size);
+}
+
+uint32_t IKXLINSTANCE::GetClusterName(char *buffer, uint32_t size) const {
+  return kxliGetString(clusterName, buffer, size);
+}
+
+// The directory is taken to end in "\" + name. One shorter than that has no
+// parent to give, and yields "" rather than a cut before its start.
+uint32_t IKXLINSTANCE::GetInstanceParentDir(char *buffer, uint32_t size) const {
+  if (buffer == nullptr)
+    return KXLI_RC_NULL_ARGUMENT;
+  size_t dirLength = std::strlen(instanceDir);
+  size_t cut = std::strlen(name) + 1;
+  size_t keep = dirLength > cut ? dirLength - cut : 0;
+  if (size < keep + 1)
+    return KXLI_RC_BUFFER_TOO_SMALL;
+  std::memcpy(buffer, instanceDir, keep);
+  buffer[keep] = '\0';
+  return 0;
+}
+
+uint32_t IKXLINSTANCE::GetCopyName(char *buffer, uint32_t size) const {
+  if (owner == nullptr)
+    return KXLI_RC_NOT_USABLE;
+  return owner->GetName(buffer, size);
+}
+
+uint16_t IKXLINSTANCE::GetNodeType() const {
+  return sqloLe16(dbmCfgImage, KXLI_NODE_TYPE_OFFSET);
+}
+
+uint32_t IKXLINSTANCE::ReloadDbmCfg(const char *dir) {
+  return kxliReadDbmCfg(dir != nullptr ? dir : instanceDir, dbmCfgImage, sizeof dbmCfgImage)
+             ? 0
+             : KXLI_RC_NULL_ARGUMENT;
+}
+
+// ---------------------------------------------------------------------------
+// IKXLINSTANCELIST
+// ---------------------------------------------------------------------------
+
+IKXLINSTANCELIST::IKXLINSTANCELIST(InstallCopy *copy) : owner(copy), status(0) {
+  // Without an owner every instance of the version-8 installation would match
+  // the empty name.
+  char ownerName[KXLI_COPY_NAME_SZ] = {};
+  if (owner == nullptr || owner->GetName(ownerName, sizeof ownerName) != 0 || ownerName[0] == '\0') {
+    status = 1;
+    return;
+  }
+  OSSInstanceListHandle handle = nullptr;
+  if (ossOpenInstanceList("KXL", &handle, false, false) != 0) {
+    status = 1;
+    return;
+  }
+  // The record is large; it lives on the heap for the walk.
+  OSSInstanceInfo_t *info = new (std::nothrow) OSSInstanceInfo_t;
+  uint32_t rc = info != nullptr ? 0 : KXLI_RC_NO_MEMORY;
+  while (rc == 0) {
+    std::memset(info, 0, sizeof *info);
+    rc = ossGetNextInstance(handle, info, false);
+    if (rc != 0)
+      break;
+    terminateFields(*info);
+    if (!belongsTo(*info, ownerName))
+      continue;
+    IKXLINSTANCE *instance = new (std::nothrow) IKXLINSTANCE(info->instanceName, owner, info->instanceDir);
+    rc = instance != nullptr ? Append(instance) : KXLI_RC_NO_MEMORY;
+  }
+  if (rc != OSS_RC_END_OF_LIST)
+    status = 1;
+  delete info;
+  ossCloseInstanceList(handle);
+}
+
+IKXLINSTANCELIST::~IKXLINSTANCELIST() = default;
+
+uint32_t IKXLINSTANCELIST::Find(const char *instanceName, IKXLINSTANCE **out) {
+  return FindByName(instanceName, out);
+}
