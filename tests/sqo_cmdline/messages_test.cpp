@@ -61,14 +61,6 @@ TEST(ReplaceMessageToken, StrayClosingMarkBeforeThePlaceholderIsNotCopiedTwice) 
   EXPECT_STREQ("a>\" b V c", message);
 }
 
-TEST(InstanceTypeWord, FourKnownTypesOthersEmpty) {
-  for (uint32_t type = 1; type <= 4; ++type)
-    EXPECT_GT(std::strlen(instanceTypeWord(type)), 0u) << type;
-  EXPECT_STRNE(instanceTypeWord(1), instanceTypeWord(3));
-  EXPECT_STREQ("", instanceTypeWord(0));
-  EXPECT_STREQ("", instanceTypeWord(5));
-}
-
 // A world whose current copy may hold the built message catalogs.
 class MessageWorld : public kxltest::ProductWorld {
 protected:
