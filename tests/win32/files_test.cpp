@@ -274,5 +274,55 @@ TEST_F(FilesTest, CreateFileAlwaysReportsAnExistingFile) {
   CloseHandle(h);
 }
 
+// --- Moving, removing and reading ---------------------------------------
+
+TEST_F(FilesTest, MoveFileReplacesOnlyWhenAsked) {
+  ASSERT_TRUE(writeFile(at("from"), "moved"));
+  ASSERT_TRUE(writeFile(at("to"), "old"));
+  SetLastError(0);
+  EXPECT_FALSE(MoveFileExA(at("from").c_str(), at("to").c_str(), 0));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
+  EXPECT_EQ("old", readFile(at("to")));
+  EXPECT_TRUE(MoveFileExA(at("from").c_str(), at("to").c_str(), MOVEFILE_REPLACE_EXISTING));
+  EXPECT_EQ("moved", readFile(at("to")));
+  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(at("from").c_str()));
+  // A folder moves with its contents.
+  ASSERT_TRUE(CreateDirectoryA(at("folder").c_str(), nullptr));
+  ASSERT_TRUE(writeFile(at("folder\\inside"), "in"));
+  EXPECT_TRUE(MoveFileExA(at("folder").c_str(), at("renamed").c_str(), 0));
+  EXPECT_EQ("in", readFile(at("renamed\\inside")));
+}
+
+TEST_F(FilesTest, RemovalFailuresTellWhy) {
+  ASSERT_TRUE(CreateDirectoryA(at("full").c_str(), nullptr));
+  ASSERT_TRUE(writeFile(at("full\\file"), "x"));
+  SetLastError(0);
+  EXPECT_FALSE(RemoveDirectoryA(at("full").c_str()));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_DIR_NOT_EMPTY), GetLastError());
+  SetLastError(0);
+  EXPECT_FALSE(RemoveDirectoryA(at("missing").c_str()));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
+  SetLastError(0);
+  EXPECT_FALSE(DeleteFileA(at("missing").c_str()));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
+  EXPECT_TRUE(DeleteFileA(at("full\\file").c_str()));
+  EXPECT_TRUE(RemoveDirectoryA(at("full").c_str()));
+}
+
+TEST_F(FilesTest, ReadingPastTheEndGivesNothingAndSucceeds) {
+  ASSERT_TRUE(writeFile(at("short"), "abcdef"));
+  HANDLE h = createWith(at("short"), GENERIC_READ, OPEN_EXISTING);
+  ASSERT_NE(INVALID_HANDLE_VALUE, h);
+  EXPECT_EQ(6u, SetFilePointer(h, 0, nullptr, FILE_END));
+  char buffer[8];
+  DWORD got = 99;
+  EXPECT_TRUE(ReadFile(h, buffer, sizeof buffer, &got, nullptr));
+  EXPECT_EQ(0u, got);
+  EXPECT_EQ(2u, SetFilePointer(h, 2, nullptr, FILE_BEGIN));
+  EXPECT_TRUE(ReadFile(h, buffer, sizeof buffer, &got, nullptr));
+  EXPECT_EQ("cdef", std::string(buffer, got));
+  CloseHandle(h);
+}
+
 } // namespace
 } // namespace kxltest
