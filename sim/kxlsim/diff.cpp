@@ -278,6 +278,18 @@ void diffFile(const std::string &shown, const fs::path &a, const fs::path &b, Re
   report.line("file ~ " + shown + " (" + sizeAndHash(bytesA) + " -> " + sizeAndHash(bytesB) + ")");
 }
 
+constexpr size_t kMaxAddedLinesShown = 20;
+
+// A new small text file (an event log, a log file) is shown with its lines.
+void reportAddedFile(const std::string &shown, const std::string &bytes, Report &report) {
+  report.line("file + " + shown + " (" + sizeAndHash(bytes) + ")");
+  std::vector<std::string> lines = splitLines(bytes);
+  if (!isText(bytes) || lines.size() > kMaxAddedLinesShown)
+    return;
+  for (const std::string &line : lines)
+    report.detail("       + " + line);
+}
+
 void diffFiles(const fs::path &a, const fs::path &b, Report &report) {
   std::map<std::string, fs::path> filesA = worldFiles(a), filesB = worldFiles(b);
   for (const auto &[relative, path] : filesA) {
@@ -289,7 +301,7 @@ void diffFiles(const fs::path &a, const fs::path &b, Report &report) {
   }
   for (const auto &[relative, path] : filesB)
     if (filesA.count(relative) == 0)
-      report.line("file + " + displayFilePath(relative) + " (" + sizeAndHash(readAll(path)) + ")");
+      reportAddedFile(displayFilePath(relative), readAll(path), report);
 }
 
 } // namespace

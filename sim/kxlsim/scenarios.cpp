@@ -14,6 +14,9 @@ constexpr const char *kRemoteHost = "winsrv2.zav.test";
 // the same product does.
 constexpr const char *kServerCode95 = "{6E1C2A40-9F3B-4D21-8A10-5B2C7D0E9A01}";
 constexpr const char *kServerCode101 = "{6E1C2A40-9F3B-4D21-8A11-5B2C7D0E9A01}";
+constexpr const char *kClientCode95 = "{6E1C2A49-9F3B-4D21-8A10-5B2C7D0E9A01}";
+constexpr const char *kClientCode101 = "{6E1C2A49-9F3B-4D21-8A11-5B2C7D0E9A01}";
+constexpr const char *kZelquorCode101 = "{6E1C2A4A-9F3B-4D21-8A10-5B2C7D0E9A01}";
 
 IdentitySpec localIdentity() {
   IdentitySpec id;
@@ -47,7 +50,8 @@ CopySpec copy95() {
   copy.release = 5;
   copy.fixLevel = 3;
   copy.components = {"KXL Server", "KXL Client"};
-  copy.products = {{"hpe", kServerCode95, "KXL Server Haldor Prime Edition"}};
+  copy.products = {{"hpe", kServerCode95, "KXL Server Haldor Prime Edition"},
+                   {"cli", kClientCode95, "KXL Client"}};
   return copy;
 }
 
@@ -58,7 +62,9 @@ CopySpec copy101() {
   copy.version = 10;
   copy.release = 1;
   copy.components = {"KXL Server", "KXL Client", "KXL Zelquor Client"};
-  copy.products = {{"hpe", kServerCode101, "KXL Server Haldor Prime Edition"}};
+  copy.products = {{"hpe", kServerCode101, "KXL Server Haldor Prime Edition"},
+                   {"cli", kClientCode101, "KXL Client"},
+                   {"zqc", kZelquorCode101, "KXL Zelquor Client"}};
   copy.installCommand = true;
   return copy;
 }
@@ -90,6 +96,9 @@ void addSinglePartitionInstance(WorldWriter &w, const CopySpec &copy) {
   inst.release = copy.release;
   addInstance(w, inst);
   addService(w, {"", inst.name, serviceImage(copy), "KXL - KXL95 - INST1", "LocalSystem", 2, 1});
+  w.writeText(inst.directory + "\\security\\kxlaudit.cfg",
+              "# audit settings of INST1\r\nactive = yes\r\nerrortype = normal\r\nadmin = both\r\n"
+              "instance = both\r\n");
 }
 
 // Partitions 0 on this machine, 1 and 2 (logical port 1) on the other one.
