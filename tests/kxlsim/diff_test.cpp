@@ -91,6 +91,7 @@ TEST_F(WorldPair, FileChangesAreListedTextByLineBinaryBySizeAndHash) {
   EXPECT_NE(text.find("file + C:\\Program Files\\ZAV\\KXL95\\INST1\\notes.log (5 bytes, fnv "),
             std::string::npos)
       << text;
+  EXPECT_NE(text.find(")\n       + new\n"), std::string::npos) << "a new small text file shows its lines";
   EXPECT_NE(text.find("file - C:\\Program Files\\ZAV\\KXL95\\function\\kxludf.dll\n"), std::string::npos)
       << text;
   EXPECT_NE(text.find("file ~ C:\\Program Files\\ZAV\\KXL95\\INST1\\kxlsystm (16384 bytes, fnv "),
