@@ -82,9 +82,8 @@ bool fitsPath(const std::string &path) {
 
 // True when `inner` is `outer` or lies below it (ignoring case).
 bool isWithin(const std::string &inner, const std::string &outer) {
-  if (inner.size() < outer.size() || sqlomcpi(inner.c_str(), outer.c_str(), uint32_t(outer.size())) != 0) {
+  if (!startsWithIgnoringCase(inner, outer))
     return false;
-  }
   return inner.size() == outer.size() || inner[outer.size()] == '\\' || outer.back() == '\\';
 }
 

@@ -4,6 +4,7 @@
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
 #include "sim/product/mocatalog.h"
+#include "sim/product/text.h"
 #include "sim/product/winpath.h"
 
 #include <cstdio>
@@ -18,7 +19,8 @@ constexpr const char kFallbackLanguage[] = "en_US";
 
 std::string catalogFileName(const char *catalog) {
   std::string name = catalog;
-  bool hasSuffix = name.size() >= 3 && sqlomcpi(name.c_str() + name.size() - 3, ".mo", 3) == 0;
+  bool hasSuffix =
+      name.size() >= 3 && startsWithIgnoringCase(std::string_view(name).substr(name.size() - 3), ".mo");
   return hasSuffix ? name : name + ".mo";
 }
 
@@ -35,8 +37,8 @@ bool findMessage(const char *catalogName, const char *key, MoCatalog &catalog, s
   if (catalogName == nullptr || catalogName[0] == '\0' || !currentInstallationPath(install))
     return false;
   std::string file = catalogFileName(catalogName);
-  const char *language = sqloGetNormalizedEnvLang(1);
-  return findInLanguage(install, language, file, key, catalog, text) ||
+  std::string language = environmentLanguage();
+  return findInLanguage(install, language.c_str(), file, key, catalog, text) ||
          findInLanguage(install, kFallbackLanguage, file, key, catalog, text);
 }
 

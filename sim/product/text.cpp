@@ -113,6 +113,16 @@ std::string normalizeLanguage(std::string_view locale) {
   return out;
 }
 
+std::string environmentLanguage() {
+  for (const std::string &source :
+       {identityLanguage(), environmentValue("LC_ALL"), environmentValue("LANG")}) {
+    std::string normalized = normalizeLanguage(source);
+    if (!normalized.empty())
+      return normalized;
+  }
+  return kDefaultLanguage;
+}
+
 } // namespace kxlprod
 
 using namespace kxlprod;
@@ -189,17 +199,9 @@ int32_t sqlo_get_password(const char *userName, char *password, uint32_t size) {
 const char *sqloGetNormalizedEnvLang(uint32_t kind) {
   (void)kind; // 1: the message language; no other kind is offered
   static char language[16];
-  std::snprintf(language, sizeof language, "%s", kDefaultLanguage);
-  if (kxlsim::shouldFail("sqloGetNormalizedEnvLang"))
-    return language;
-  for (const std::string &source :
-       {identityLanguage(), environmentValue("LC_ALL"), environmentValue("LANG")}) {
-    std::string normalized = normalizeLanguage(source);
-    if (!normalized.empty()) {
-      std::snprintf(language, sizeof language, "%s", normalized.c_str());
-      break;
-    }
-  }
+  std::string value =
+      kxlsim::shouldFail("sqloGetNormalizedEnvLang") ? kDefaultLanguage : environmentLanguage();
+  std::snprintf(language, sizeof language, "%s", value.c_str());
   return language;
 }
 

@@ -13,4 +13,8 @@ namespace kxlprod {
 // usable locale name.
 std::string normalizeLanguage(std::string_view locale);
 
+// The environment's message language: the machine identity's "Language",
+// else LC_ALL, else LANG, normalised; "en_US" when none is usable.
+std::string environmentLanguage();
+
 } // namespace kxlprod

@@ -5,6 +5,18 @@
 
 namespace kxlprod {
 
+bool startsWithIgnoringCase(std::string_view text, std::string_view prefix) {
+  if (text.size() < prefix.size())
+    return false;
+  for (std::size_t i = 0; i < prefix.size(); ++i) {
+    char a = text[i] >= 'a' && text[i] <= 'z' ? char(text[i] - 32) : text[i];
+    char b = prefix[i] >= 'a' && prefix[i] <= 'z' ? char(prefix[i] - 32) : prefix[i];
+    if (a != b)
+      return false;
+  }
+  return true;
+}
+
 std::string unquotedPath(const char *path) {
   std::string text = path ? path : "";
   if (!text.empty() && text.front() == '"') {

@@ -4,8 +4,12 @@
 
 #include <cstddef>
 #include <string>
+#include <string_view>
 
 namespace kxlprod {
+
+// True when `text` begins with `prefix`, ignoring ASCII case.
+bool startsWithIgnoringCase(std::string_view text, std::string_view prefix);
 
 // The path without one pair of enclosing double quotes: callers may pass paths
 // wrapped in quotes (a directory with blanks keeps them), which the file
