@@ -1,0 +1,82 @@
+#include "NT/instfiles.h"
+
+#include "NT/pathjoin.h"
+#include "engn/sqo/run.h"
+#include "platform/kxlsys.h"
+
+#include <cstdio>
+
+namespace {
+
+// Configuration template per node type 1 to 5, in the copy's CFG folder.
+constexpr const char *kTemplates[] = {"kxlsyssv", "kxlsysrq", "kxlsyssr", "kxlsysmp", "kxlsysst"};
+
+constexpr uint32_t kTemplateOpenFlags = 0x314;
+constexpr uint32_t kTemplateOpenMode = 0x750;
+constexpr uint32_t kServiceNameSize = 30; // "%s-%d": 29 characters
+
+bool isActiveState(int32_t code) {
+  return code == SQLO_RC_SVC_RUNNING || code == SQLO_RC_SVC_START_PENDING || code == SQLO_RC_SVC_PAUSED;
+}
+
+bool serviceActive(const char *serviceName, const char *machine) {
+  SQLO_SVC_OUT out{};
+  return isActiveState(sqloQueryKXLService(serviceName, &out, machine));
+}
+
+// Loads the nodes file into the context; false when there is no entry to ask about.
+bool loadNodeList(UpgradeContext &context, const UpgradeOptions &options) {
+  char directory[SQLO_PATH_SZ] = {};
+  if (context.instance == nullptr || context.instance->GetInstanceDir(directory, sizeof directory) != 0)
+    return false;
+  char nodesFile[KXL_JOINED_PATH_SZ];
+  joinPath(nodesFile, directory, "\\kxlnodes.cfg");
+  uint32_t entries = 0, maxNode = 0;
+  int32_t rc =
+      sqloReadKxlnodes(nodesFile, 4, &context.nodeList, 5, &entries, &maxNode, 1, options.instanceName, 1, 0);
+  if (rc != 0) {
+    pdtError(KXL_FN_IS_INSTANCE_ACTIVE, 1, rc);
+    return false;
+  }
+  return sqloNodeListFirst(context.nodeList) != nullptr;
+}
+
+bool anyPartitionActive(UpgradeContext &context, const UpgradeOptions &options) {
+  if (!loadNodeList(context, options))
+    return false;
+  const unsigned char *entry = sqloNodeListFirst(context.nodeList);
+  for (int32_t i = 0; i < sqloNodeListCount(context.nodeList); ++i, entry = sqloNodeNext(entry)) {
+    char service[kServiceNameSize];
+    ossSnprintf(service, sizeof service, "%s-%d", options.instanceName, sqloNodeNumber(entry));
+    if (serviceActive(service, sqloNodeMachine(entry)))
+      return true;
+  }
+  return false;
+}
+
+} // namespace
+
+bool isInstanceActive(UpgradeContext &context, UpgradeOptions &options) {
+  pdtEntry(KXL_FN_IS_INSTANCE_ACTIVE);
+  bool active = options.partitionedInstance == 0 ? serviceActive(options.instanceName, nullptr)
+                                                 : anyPartitionActive(context, options);
+  pdtExit(KXL_FN_IS_INSTANCE_ACTIVE, active ? 1 : 0, 0);
+  return active;
+}
+
+bool hasNodeTypeTemplate(UpgradeContext &, UpgradeOptions &options, uint32_t nodeType) {
+  pdtEntry(KXL_FN_HAS_NODE_TYPE_TEMPLATE);
+  bool found = false;
+  if (nodeType >= 1 && nodeType <= 5) {
+    char folder[KXL_JOINED_PATH_SZ], path[KXL_JOINED_PATH_SZ];
+    joinPath(folder, options.currentInstallPath, "CFG");
+    joinPath(path, folder, kTemplates[nodeType - 1]);
+    SQLO_FHANDLE handle = nullptr;
+    if (sqloopenp(path, kTemplateOpenFlags, kTemplateOpenMode, &handle, 0) == 0) {
+      sqloclose(handle);
+      found = true;
+    }
+  }
+  pdtExit(KXL_FN_HAS_NODE_TYPE_TEMPLATE, found ? 1 : 0, 0);
+  return found;
+}

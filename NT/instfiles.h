@@ -1,0 +1,20 @@
+// The instance's files seen by the checks: whether any of its services runs,
+// and whether the current copy ships a node type's configuration template.
+#pragma once
+
+#include "engn/sqo/options.h"
+
+#include <cstdint>
+
+class UpgradeContext;
+
+inline constexpr uint32_t KXL_FN_IS_INSTANCE_ACTIVE = 0x18780520u;
+inline constexpr uint32_t KXL_FN_HAS_NODE_TYPE_TEMPLATE = 0x18780521u;
+
+// True when a service of the instance is running, starting or paused. A
+// partitioned instance's node list is loaded into the context first; an
+// unreadable nodes file or an unknown service state counts as not active.
+bool isInstanceActive(UpgradeContext &context, UpgradeOptions &options);
+
+// True when the current copy's template of `nodeType` (1 to 5) can be opened.
+bool hasNodeTypeTemplate(UpgradeContext &context, UpgradeOptions &options, uint32_t nodeType);

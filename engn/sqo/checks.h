@@ -1,0 +1,34 @@
+// Checks around the upgrade: the caller's authority and the databases before
+// it, ODBC data sources that need cataloguing again after it.
+#pragma once
+
+#include "engn/sqo/options.h"
+
+#include <cstdint>
+
+class UpgradeContext;
+
+inline constexpr uint32_t KXL_FN_CHECK_LOCAL_ADMIN = 0x187805C0u;
+inline constexpr uint32_t KXL_FN_RUN_DATABASE_CHECK = 0x187805C1u;
+inline constexpr uint32_t KXL_FN_FIND_ODBC_SOURCES = 0x187805C2u;
+
+inline constexpr int32_t UPGRADE_RC_INSTANCE_ACTIVE = -1953;
+inline constexpr int32_t UPGRADE_RC_CHECK_PROBLEMS = -1205;
+inline constexpr int32_t UPGRADE_RC_CHECK_FAILED = -1069;
+inline constexpr int32_t UPGRADE_ODBC_NOT_AVAILABLE = 1168;
+
+// 0 when the user may upgrade; -1 with the reason in `status` (SQLCODE -1403:
+// no authorization ID; -1092 naming the user: not an administrator); another
+// negative value from the platform's administrator test.
+int checkLocalAdmin(sqlca *status);
+
+// Refuses an active instance (-1953), then runs the database check tool of the
+// instance's copy over its databases from the current directory: 0 to go on
+// (warnings print message 1225), -1205 or -1069 with the record's tokens set,
+// or the program start's own failure.
+int runDatabaseCheck(UpgradeContext &context, UpgradeOptions &options);
+
+// True when an ODBC data source uses the product's driver (of copy `copyName`,
+// or of any copy when null). *status: the last fetch's result, 100 when there
+// are no data sources, -1 or -2 on an ODBC error, 1168 without ODBC.
+bool findOdbcDataSources(const char *copyName, int32_t *status);
