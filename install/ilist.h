@@ -65,7 +65,8 @@ public:
   ILIST(const ILIST &) = delete;
   ILIST &operator=(const ILIST &) = delete;
 
-  // Takes ownership of `object` and puts it after the tail. When no node can
+  // Takes ownership of `object` and puts it after the tail. The cursor stays
+  // where it is, so a walk of a freshly built list starts at its head. When no node can
   // be allocated the object is destroyed, so nothing leaks, and
   // KXLI_RC_NO_MEMORY is returned. A null object is refused.
   uint32_t Append(T *object) {
@@ -77,7 +78,7 @@ public:
       return KXLI_RC_NO_MEMORY;
     }
     if (tail == nullptr) {
-      head = cursor = tail = node;
+      head = tail = node;
     } else {
       node->prev = tail;
       tail->next = node;

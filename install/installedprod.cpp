@@ -45,30 +45,6 @@ bool samePath(const char *a, const char *b) {
   return true;
 }
 
-// The product code with its fourth group raised by k (kept to four hex
-// digits). False when the code does not have five groups.
-bool derivedCode(const char *code, uint32_t k, char *out, size_t size) {
-  const char *dash[4] = {};
-  const char *at = code;
-  for (int i = 0; i < 4; ++i) {
-    dash[i] = std::strchr(at, '-');
-    if (dash[i] == nullptr)
-      return false;
-    at = dash[i] + 1;
-  }
-  if (std::strchr(dash[3] + 1, '-') != nullptr || dash[3] - dash[2] - 1 != 4)
-    return false;
-  char group[5] = {};
-  std::memcpy(group, dash[2] + 1, 4);
-  char *end = nullptr;
-  unsigned long value = std::strtoul(group, &end, 16);
-  if (end != group + 4)
-    return false;
-  int prefix = static_cast<int>(dash[2] + 1 - code);
-  return std::snprintf(out, size, "%.*s%04X%s", prefix, code, static_cast<unsigned>((value + k) & 0xFFFF),
-                       dash[3]) < static_cast<int>(size);
-}
-
 // Windows Installer knows `productCode` as installed in installPath.
 bool installedAt(const char *productCode, const char *installPath) {
   if (MsiQueryProductStateA(productCode) != INSTALLSTATE_DEFAULT)
@@ -89,7 +65,7 @@ bool matchColumn(const char *columnCode, const char *installPath, char *register
   char candidate[KXLI_PRODUCT_CODE_SZ + 8];
   kxliSetString(candidate, sizeof candidate, columnCode);
   for (uint32_t k = 0; k <= kDerivedCodes; ++k) {
-    if (k > 0 && !derivedCode(columnCode, k, candidate, sizeof candidate))
+    if (k > 0 && !kxliDerivedCode(columnCode, k, candidate, sizeof candidate))
       return false;
     if (installedAt(candidate, installPath)) {
       if (registeredCodeOut != nullptr)

@@ -3,6 +3,10 @@
 #include "install/ilist.h"
 #include "install/installedprod.h"
 
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+
 namespace {
 
 constexpr uint32_t kClientBits = 0x0080 | 0x0100;
@@ -113,4 +117,26 @@ const KxliProductRow *kxliFindProductRow(const char *code, bool v8) {
       return &table.rows[i];
   }
   return nullptr;
+}
+
+bool kxliDerivedCode(const char *code, uint32_t k, char *out, size_t size) {
+  const char *dash[4] = {};
+  const char *at = code;
+  for (int i = 0; i < 4; ++i) {
+    dash[i] = std::strchr(at, '-');
+    if (dash[i] == nullptr)
+      return false;
+    at = dash[i] + 1;
+  }
+  if (std::strchr(dash[3] + 1, '-') != nullptr || dash[3] - dash[2] - 1 != 4)
+    return false;
+  char group[5] = {};
+  std::memcpy(group, dash[2] + 1, 4);
+  char *end = nullptr;
+  unsigned long value = std::strtoul(group, &end, 16);
+  if (end != group + 4)
+    return false;
+  int prefix = static_cast<int>(dash[2] + 1 - code);
+  return std::snprintf(out, size, "%.*s%04X%s", prefix, code, static_cast<unsigned>((value + k) & 0xFFFF),
+                       dash[3]) < static_cast<int>(size);
 }

@@ -36,3 +36,8 @@ KxliProductTable kxliProductTable(bool v8);
 
 // The row whose code equals `code` ignoring case, or null.
 const KxliProductRow *kxliFindProductRow(const char *code, bool v8);
+
+// `code` (a braced product code of five groups) with its fourth group raised
+// by k, kept to four upper-case hexadecimal digits. False when the code does
+// not have that form or the result does not fit in size bytes.
+bool kxliDerivedCode(const char *code, uint32_t k, char *out, size_t size);

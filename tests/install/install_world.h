@@ -1,0 +1,104 @@
+// A temporary machine for the installation registry cases, with helpers that
+// lay out copies, instances, configuration files and installer registrations.
+#pragma once
+
+#include "../product/world_fixture.h"
+#include "install/ilist.h"
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace kxltest {
+
+class InstallWorld : public ProductWorld {
+protected:
+  static constexpr const char *kCopies = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\";
+
+  static void createKey(HKEY root, const std::string &path) {
+    HKEY key = nullptr;
+    ASSERT_EQ(ERROR_SUCCESS,
+              RegCreateKeyExA(root, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr));
+    RegCloseKey(key);
+  }
+
+  static void setValue(HKEY root, const std::string &path, const char *name, const std::string &value) {
+    HKEY key = nullptr;
+    ASSERT_EQ(ERROR_SUCCESS,
+              RegCreateKeyExA(root, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr));
+    RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
+                   static_cast<DWORD>(value.size() + 1));
+    RegCloseKey(key);
+  }
+
+  // CurrentVersion of a copy key ("" fix level: the value is left out).
+  static void setVersion(const std::string &copyKey, const char *version, const char *release,
+                         const char *modification, const char *fixLevel, const char *serviceLevel) {
+    std::string key = copyKey + "\\CurrentVersion";
+    setString(key, "Version", version);
+    setString(key, "Release", release);
+    setString(key, "Modification", modification);
+    if (fixLevel[0] != '\0')
+      setString(key, "Fix Level", fixLevel);
+    setString(key, "Service Level", serviceLevel);
+  }
+
+  // Writes a file at a Windows path, creating its folders.
+  static void writeFile(const std::string &windowsPath, const std::vector<unsigned char> &bytes) {
+    makeDirectories(windowsPath.substr(0, windowsPath.rfind('\\')));
+    HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS,
+                              FILE_ATTRIBUTE_NORMAL, nullptr);
+    ASSERT_NE(INVALID_HANDLE_VALUE, file) << windowsPath;
+    DWORD written = 0;
+    WriteFile(file, bytes.data(), static_cast<DWORD>(bytes.size()), &written, nullptr);
+    CloseHandle(file);
+    ASSERT_EQ(bytes.size(), written);
+  }
+
+  // A configuration image of `size` bytes with the node type word at 40 and,
+  // past the word, a recognisable byte at the end.
+  static std::vector<unsigned char> configImage(uint16_t nodeType, size_t size = 16384) {
+    std::vector<unsigned char> image(size, 0);
+    if (size >= 42) {
+      image[40] = static_cast<unsigned char>(nodeType & 0xFF);
+      image[41] = static_cast<unsigned char>(nodeType >> 8);
+    }
+    if (size > 42)
+      image[size - 1] = 0x5A;
+    return image;
+  }
+
+  // Windows Installer knows `code` as installed at `location`.
+  static void registerInstaller(const std::string &code, const std::string &location) {
+    setString("SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\" + code, "InstallLocation",
+              location);
+  }
+
+  // Every element of a list, walked from its head.
+  template <class T> static std::vector<T *> elements(ILIST<T> &list) {
+    std::vector<T *> all;
+    list.Rewind();
+    for (T *element = list.Next(); element != nullptr; element = list.Next())
+      all.push_back(element);
+    return all;
+  }
+
+  template <class T> static std::vector<std::string> names(ILIST<T> &list) {
+    std::vector<std::string> all;
+    for (T *element : elements(list)) {
+      char name[256] = {};
+      element->GetName(name, sizeof name);
+      all.push_back(name);
+    }
+    return all;
+  }
+
+  static std::vector<std::string> strings(ILIST<char> &list) {
+    std::vector<std::string> all;
+    for (char *text : elements(list))
+      all.push_back(text);
+    return all;
+  }
+};
+
+} // namespace kxltest

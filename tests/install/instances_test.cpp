@@ -1,0 +1,183 @@
+// Instances of a copy: membership from the instance registry, cluster
+// membership, the configuration snapshot and the getters.
+#include "install/installcopy.h"
+#include "install/kxlinstance.h"
+#include "install_world.h"
+
+#include <memory>
+
+namespace {
+
+using kxltest::InstallWorld;
+using Names = std::vector<std::string>;
+
+class Instances : public InstallWorld {
+protected:
+  void SetUp() override {
+    InstallWorld::SetUp();
+    registerV8("C:\\SQLLIB");
+    registerCopy("KXL95", "C:\\Prog\\KXL95");
+    registerCopy("KXL101", "C:\\Prog\\KXL101");
+  }
+
+  // The instance list of `copyName` in a fresh copy list.
+  IKXLINSTANCELIST *instancesOf(const char *copyName) {
+    copies_ = std::make_unique<InstallCopyList>(false, false);
+    InstallCopy *copy = nullptr;
+    EXPECT_EQ(0u, copies_->Find(copyName, &copy));
+    IKXLINSTANCELIST *list = nullptr;
+    if (copy != nullptr) {
+      EXPECT_EQ(0u, copy->GetInstanceList(&list));
+    }
+    return list;
+  }
+
+  IKXLINSTANCE *instance(const char *copyName, const char *name) {
+    IKXLINSTANCELIST *list = instancesOf(copyName);
+    IKXLINSTANCE *found = nullptr;
+    if (list != nullptr) {
+      EXPECT_EQ(0u, list->Find(name, &found));
+    }
+    return found;
+  }
+
+  std::unique_ptr<InstallCopyList> copies_;
+};
+
+TEST_F(Instances, BelongToTheCopyNamedInTheInstanceRegistry) {
+  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "kxl95");
+  registerInstance("INST2", "C:\\Prog\\KXL95\\INST2", "KXL95");
+  registerInstance("NEW1", "C:\\Prog\\KXL101\\NEW1", "KXL101");
+  registerInstance("V8INST", "C:\\SQLLIB\\V8INST", "");
+  EXPECT_EQ(Names({"INST1", "INST2"}), names(*instancesOf("KXL95")));
+  EXPECT_EQ(Names({"NEW1"}), names(*instancesOf("KXL101")));
+  // Instances without a copy name belong to the version-8 installation only.
+  EXPECT_EQ(Names({"V8INST"}), names(*instancesOf("KXLV8")));
+}
+
+TEST_F(Instances, AreFoundByNameIgnoringCase) {
+  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
+  IKXLINSTANCELIST *list = instancesOf("KXL95");
+  IKXLINSTANCE *found = nullptr;
+  ASSERT_EQ(0u, list->Find("inst1", &found));
+  char dir[256] = {};
+  ASSERT_EQ(0u, found->GetInstanceDir(dir, sizeof dir));
+  EXPECT_STREQ("C:\\Prog\\KXL95\\INST1", dir);
+  EXPECT_EQ(KXLI_RC_NAME_NOT_FOUND, list->Find("INST", &found));
+  EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, list->Find("INST1", nullptr));
+}
+
+TEST_F(Instances, ListFailsWhenTheInstanceRegistryFails) {
+  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
+  InstallCopy copy("KXL95", false, false);
+  failCalls("ossGetNextInstance:1");
+  IKXLINSTANCELIST failed(&copy);
+  EXPECT_EQ(1u, failed.status);
+  IKXLINSTANCELIST ownerless(nullptr);
+  EXPECT_EQ(1u, ownerless.status);
+}
+
+TEST_F(Instances, KnowTheirCopyAndParentDirectory) {
+  registerInstance("INST1", "D:\\profiles\\INST1", "KXL95");
+  IKXLINSTANCE *inst = instance("KXL95", "INST1");
+  ASSERT_NE(nullptr, inst);
+  char text[129] = {};
+  ASSERT_EQ(0u, inst->GetCopyName(text, sizeof text));
+  EXPECT_STREQ("KXL95", text);
+  ASSERT_EQ(0u, inst->GetInstanceParentDir(text, sizeof text));
+  EXPECT_STREQ("D:\\profiles", text);
+  // "D:\profiles" needs 12 bytes.
+  EXPECT_EQ(KXLI_RC_BUFFER_TOO_SMALL, inst->GetInstanceParentDir(text, 11));
+  EXPECT_EQ(0u, inst->GetInstanceParentDir(text, 12));
+  EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, inst->GetInstanceParentDir(nullptr, 12));
+}
+
+TEST_F(Instances, NamesFitNineBytes) {
+  registerInstance("LONGNAME", "C:\\P\\LONGNAME", "KXL95");
+  IKXLINSTANCE *inst = instance("KXL95", "LONGNAME");
+  ASSERT_NE(nullptr, inst);
+  char name[9] = {};
+  EXPECT_EQ(KXLI_RC_BUFFER_TOO_SMALL, inst->GetName(name, 8));
+  ASSERT_EQ(0u, inst->GetName(name, 9));
+  EXPECT_STREQ("LONGNAME", name);
+}
+
+TEST_F(Instances, CutItsFieldsAndGuardItsParentDirectory) {
+  IKXLINSTANCE inst("INSTANCE99", nullptr, "C:\\I");
+  char text[256] = {};
+  ASSERT_EQ(0u, inst.GetName(text, sizeof text));
+  EXPECT_STREQ("INSTANCE", text);
+  // A directory shorter than "\" + name has no parent to give.
+  ASSERT_EQ(0u, inst.GetInstanceParentDir(text, sizeof text));
+  EXPECT_STREQ("", text);
+  EXPECT_EQ(KXLI_RC_NOT_USABLE, inst.GetCopyName(text, sizeof text));
+  EXPECT_EQ(0, inst.isClustered);
+  std::string longDir(300, 'd');
+  IKXLINSTANCE cut("I", nullptr, longDir.c_str());
+  ASSERT_EQ(0u, cut.GetInstanceDir(text, sizeof text));
+  EXPECT_EQ(std::string(255, 'd'), text);
+}
+
+TEST_F(Instances, AreClusteredWhenTheirProfileNamesACluster) {
+  registerInstance("CLU1", "C:\\Prog\\KXL95\\CLU1", "KXL95");
+  registerInstance("PLAIN", "C:\\Prog\\KXL95\\PLAIN", "KXL95");
+  registerInstance("V8CLU", "C:\\SQLLIB\\V8CLU", "");
+  setString(std::string(kCopies) + "KXL95\\PROFILES\\CLU1", "KXLCLUSTER", "KXLCLUS");
+  setString(std::string(kCopies) + "KXL95\\PROFILES\\PLAIN", "KXLPATH", "C:\\x");
+  setString("SOFTWARE\\ZAV\\KXL\\PROFILES\\V8CLU", "KXLCLUSTER", "OLDCLUS");
+  IKXLINSTANCE *clustered = instance("KXL95", "CLU1");
+  ASSERT_NE(nullptr, clustered);
+  EXPECT_EQ(1, clustered->isClustered);
+  char cluster[16] = {};
+  ASSERT_EQ(0u, clustered->GetClusterName(cluster, sizeof cluster));
+  EXPECT_STREQ("KXLCLUS", cluster);
+  EXPECT_EQ(KXLI_RC_BUFFER_TOO_SMALL, clustered->GetClusterName(cluster, 7));
+
+  IKXLINSTANCE *plain = instance("KXL95", "PLAIN");
+  EXPECT_EQ(0, plain->isClustered);
+  EXPECT_EQ(0u, plain->GetClusterName(cluster, sizeof cluster));
+  EXPECT_STREQ("", cluster);
+
+  IKXLINSTANCE *v8 = instance("KXLV8", "V8CLU");
+  EXPECT_EQ(1, v8->isClustered);
+}
+
+TEST_F(Instances, KeepASnapshotOfTheirConfigurationFile) {
+  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
+  registerInstance("NOCFG", "C:\\Prog\\KXL95\\NOCFG", "KXL95");
+  writeFile("C:\\Prog\\KXL95\\INST1\\kxlsystm", configImage(4));
+  makeDirectories("C:\\Prog\\KXL95\\NOCFG");
+  IKXLINSTANCE *inst = instance("KXL95", "INST1");
+  ASSERT_NE(nullptr, inst);
+  EXPECT_EQ(4, inst->GetNodeType());
+  EXPECT_EQ(0x5A, inst->dbmCfgImage[16383]);
+  // Changing the file does not change the snapshot.
+  writeFile("C:\\Prog\\KXL95\\INST1\\kxlsystm", configImage(1));
+  EXPECT_EQ(4, inst->GetNodeType());
+  // An instance without the file is listed all the same.
+  IKXLINSTANCE *bare = instance("KXL95", "NOCFG");
+  ASSERT_NE(nullptr, bare);
+  EXPECT_EQ(0, bare->GetNodeType());
+}
+
+TEST_F(Instances, ReloadTheirConfigurationFromAnyDirectory) {
+  writeFile("C:\\Saved\\kxlsystm", configImage(3, 4096));
+  writeFile("C:\\Home\\INST1\\kxlsystm", configImage(0x0105));
+  IKXLINSTANCE holder;
+  EXPECT_EQ(0, holder.GetNodeType());
+  ASSERT_EQ(0u, holder.ReloadDbmCfg("C:\\Saved"));
+  EXPECT_EQ(3, holder.GetNodeType());
+  EXPECT_EQ(0x5A, holder.dbmCfgImage[4095]);
+  EXPECT_EQ(0, holder.dbmCfgImage[16383]);
+  // A missing file leaves the snapshot as it was.
+  EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, holder.ReloadDbmCfg("C:\\Nowhere"));
+  EXPECT_EQ(3, holder.GetNodeType());
+
+  IKXLINSTANCE inst("INST1", nullptr, "C:\\Home\\INST1");
+  ASSERT_EQ(0u, inst.ReloadDbmCfg("C:\\Saved"));
+  EXPECT_EQ(3, inst.GetNodeType());
+  ASSERT_EQ(0u, inst.ReloadDbmCfg(nullptr));
+  EXPECT_EQ(0x0105, inst.GetNodeType());
+}
+
+} // namespace
