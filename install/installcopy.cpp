@@ -142,45 +142,34 @@ uint32_t InstallCopy::GetVersion(CopyVersion **out) {
   return static_cast<uint32_t>(rc);
 }
 
-// A list whose build failed is not kept: the next call tries again instead of
-// handing out a partial list as if it were whole.
 uint32_t InstallCopy::GetInstanceList(IKXLINSTANCELIST **out) {
-  if (out == nullptr)
-    return KXLI_RC_NULL_ARGUMENT;
-  *out = nullptr;
-  if (name[0] == '\0')
-    return KXLI_RC_NOT_USABLE;
-  if (instances == nullptr) {
-    IKXLINSTANCELIST *built = new (std::nothrow) IKXLINSTANCELIST(this);
-    if (built == nullptr)
-      return KXLI_RC_NO_MEMORY;
-    if (built->status != 0) {
-      delete built;
-      return KXLI_RC_NOT_USABLE;
-    }
-    instances = built;
-  }
-  *out = instances;
-  return 0;
+  return subList(instances, out);
 }
 
 uint32_t InstallCopy::GetInstalledProdList(InstalledProdList **out) {
+  return subList(installedProducts, out);
+}
+
+// Builds a sub-list on first use and keeps it. A list whose build failed is not
+// kept: the next call tries again instead of handing out a partial list as if
+// it were whole.
+template <class List> uint32_t InstallCopy::subList(List *&kept, List **out) {
   if (out == nullptr)
     return KXLI_RC_NULL_ARGUMENT;
   *out = nullptr;
   if (name[0] == '\0')
     return KXLI_RC_NOT_USABLE;
-  if (installedProducts == nullptr) {
-    InstalledProdList *built = new (std::nothrow) InstalledProdList(this);
+  if (kept == nullptr) {
+    List *built = new (std::nothrow) List(this);
     if (built == nullptr)
       return KXLI_RC_NO_MEMORY;
     if (built->status != 0) {
       delete built;
       return KXLI_RC_NOT_USABLE;
     }
-    installedProducts = built;
+    kept = built;
   }
-  *out = installedProducts;
+  *out = kept;
   return 0;
 }
 

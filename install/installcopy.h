@@ -79,6 +79,7 @@ private:
   void readUsersKey();
   void readComponentsKey();
   void readComponentNames();
+  template <class List> uint32_t subList(List *&kept, List **out);
 };
 
 inline constexpr uint32_t KXLI_COPY_OK = 0;

@@ -211,6 +211,9 @@ protected:
     }
     return rc;
   }
+  static std::vector<int32_t> numbers(const CopyVersion &record) {
+    return {record.version, record.release, record.modification, record.fixLevel};
+  }
 };
 
 TEST_F(Version, FillsTheRecordFromCurrentVersion) {
@@ -219,10 +222,7 @@ TEST_F(Version, FillsTheRecordFromCurrentVersion) {
   InstallCopy copy("KXL95", false, false);
   CopyVersion record{};
   ASSERT_EQ(0u, read(copy, record));
-  EXPECT_EQ(9, record.version);
-  EXPECT_EQ(5, record.release);
-  EXPECT_EQ(0, record.modification);
-  EXPECT_EQ(3, record.fixLevel);
+  EXPECT_EQ(std::vector<int32_t>({9, 5, 0, 3}), numbers(record));
   EXPECT_STREQ("kxl9.5.0.3", record.serviceLevel);
   EXPECT_EQ(80u, sizeof(CopyVersion));
 }
@@ -233,10 +233,7 @@ TEST_F(Version, OfTheVersion8InstallationHasNoFixLevel) {
   InstallCopy copy(KXLI_V8_COPY_NAME, false, false);
   CopyVersion record{};
   ASSERT_EQ(0u, read(copy, record));
-  EXPECT_EQ(8, record.version);
-  EXPECT_EQ(2, record.release);
-  EXPECT_EQ(1, record.modification);
-  EXPECT_EQ(0, record.fixLevel);
+  EXPECT_EQ(std::vector<int32_t>({8, 2, 1, 0}), numbers(record));
   EXPECT_STREQ("", record.serviceLevel);
 }
 
@@ -246,9 +243,7 @@ TEST_F(Version, StopsAtTheFirstMissingValueWithTheRegistryCode) {
   InstallCopy copy("KXL97", false, false);
   CopyVersion record{};
   EXPECT_EQ(static_cast<uint32_t>(ERROR_FILE_NOT_FOUND), read(copy, record));
-  EXPECT_EQ(9, record.version);
-  EXPECT_EQ(7, record.release);
-  EXPECT_EQ(2, record.modification);
+  EXPECT_EQ(std::vector<int32_t>({9, 7, 2, 0}), numbers(record));
   EXPECT_STREQ("", record.serviceLevel);
 }
 
