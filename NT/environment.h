@@ -1,0 +1,43 @@
+// Re-creation of an instance under the current copy: the instance itself, its
+// configuration file tuned to this machine and, for a partitioned instance,
+// partition 0. Whatever a failing call created is removed again.
+#pragma once
+
+#include "engn/sqo/options.h"
+#include "platform/kxlsys.h"
+
+#include <cstdint>
+
+inline constexpr uint32_t KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT = 0x18780540u;
+
+// Results besides those passed up from the platform calls.
+inline constexpr int32_t ENVIRONMENT_RC_CONFIG_FILE = -5005;   // kxlsystm open/read/seek/write
+inline constexpr int32_t ENVIRONMENT_RC_HOST_UNKNOWN = -1922;  // given host name does not resolve
+inline constexpr int32_t ENVIRONMENT_RC_SERVICES_FILE = -1923; // ports cannot be reserved
+inline constexpr int32_t ENVIRONMENT_RC_PROFILE_VALUE = -1918; // variable 159 or 160 not set
+inline constexpr int32_t ENVIRONMENT_SQLCODE_COMM = -1042;     // status block code for the -1 results
+
+// Layout of the fields this step writes into the 16384-byte kxlsystm image.
+inline constexpr uint32_t ENV_CFG_IMAGE_SZ = 16384;
+inline constexpr uint32_t ENV_CFG_NODE_TYPE = 40;        // u16
+inline constexpr uint32_t ENV_CFG_WORKSTATION_FLAG = 46; // u16
+inline constexpr uint32_t ENV_CFG_CPU_MEASURE = 808;     // f32
+inline constexpr uint32_t ENV_CFG_WORKSTATION = 1968;    // 9 bytes
+inline constexpr uint32_t ENV_CFG_WORKSTATION_SZ = 9;
+inline constexpr uint32_t ENV_CFG_BANDWIDTH = 3120;        // f32
+inline constexpr uint32_t ENV_CFG_CLIENT_COMPONENT = 3124; // u32
+inline constexpr uint32_t ENV_CFG_JAVA_PATH = 3128;        // 256 bytes
+inline constexpr uint32_t ENV_CFG_JAVA_PATH_SZ = 256;
+inline constexpr uint32_t ENV_CLIENT_COMPONENT_VALUE = 2048;
+
+// Creates instanceName under instanceProfilePath with the copy at installPath
+// (may be null), tunes its kxlsystm and, when newNodeType is 4 and a partition
+// record is given, sets up partition 0 (the record's empty fields are filled).
+// userName / password: null when not given. 0 on success, else the failing
+// step's result (-1 with SQLCODE -1042 in `ca` where documented) and nothing of
+// the new instance is left.
+int32_t upgradeInstanceEnvironment(const char *instanceName, const char *instanceProfilePath,
+                                   const char *installPath, const char *userName, const char *password,
+                                   uint32_t oldNodeType, uint32_t newNodeType,
+                                   PartitionRecord *partitionRecord, sqlca *ca, uint32_t createFlag,
+                                   uint32_t workstationFlag);

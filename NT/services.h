@@ -1,0 +1,21 @@
+// The services step of the upgrade: re-creates the instance under the current
+// copy and makes every service of the instance run the current copy's programs.
+#pragma once
+
+#include "engn/sqo/options.h"
+
+#include <cstdint>
+
+class UpgradeContext;
+
+inline constexpr uint32_t KXL_FN_UPGRADE_INSTANCE_SERVICES = 0x18780500u;
+
+// Result codes of the step besides those passed up from its callees.
+inline constexpr int32_t SERVICES_RC_NO_SERVICE_CONFIG = -1925; // start type unreadable
+inline constexpr int32_t SERVICES_RC_MACHINE_REGISTRY = -1913;  // a machine's registry cannot be opened
+inline constexpr int32_t SERVICES_SQLCODE_HOST = -1042;         // status block code: no full host name
+
+// Re-creates the context's instance under the current copy (through
+// upgradeInstanceEnvironment) and re-points its services. Writes the context's
+// service start type word. 0 on success; -1 with the reason in options.status.
+int32_t upgradeInstanceServices(UpgradeContext &context, UpgradeOptions &options);
