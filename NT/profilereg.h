@@ -1,0 +1,35 @@
+// The instance's profile registry key: moving it from the owning copy's branch
+// to the current copy's on every machine that serves the instance, and the undo.
+#pragma once
+
+#include "engn/sqo/options.h"
+#include "platform/win32.h"
+
+#include <cstdint>
+
+class UpgradeContext;
+
+inline constexpr uint32_t KXL_FN_MOVE_INSTANCE_PROFILE = 0x18780506u;
+inline constexpr uint32_t KXL_FN_REVERT_INSTANCE_PROFILE = 0x18780507u;
+
+// Results of the profile move besides 0 and the callees' own codes.
+inline constexpr int32_t KXL_RC_PROFILE_KEY = -1918;        // a profile key cannot be created or copied
+inline constexpr int32_t KXL_RC_MACHINE_REGISTRY = -1913;   // a machine's registry cannot be opened
+inline constexpr int32_t KXL_RC_NO_LOCAL_HOST_NAME = -1042; // put into options.status.sqlcode; result -1
+
+// Moves the profile key on the one machine whose HKEY_LOCAL_MACHINE is
+// `machineRoot`. force 1: the current copy gets the empty force-copy-name key
+// and the old key is deleted without being copied.
+int32_t moveProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptions &options, uint8_t force);
+
+// Moves the profile key on every machine of the instance: each partition's
+// machine (partitioned), else the local one; then the other cluster machines.
+int32_t moveInstanceProfile(UpgradeContext &context, UpgradeOptions &options);
+
+// The undo of moveProfileKey on one machine: nothing when the old key still
+// exists, otherwise the old key is rebuilt from the current copy's key.
+int32_t revertProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptions &options, uint8_t force);
+
+// The undo of moveInstanceProfile; also points the instance's services at the
+// owning copy's program again.
+int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options);
