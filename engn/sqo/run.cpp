@@ -433,12 +433,12 @@ void expandLongPath(const char *path, char *output, std::size_t size) {
     out.append(in + i, end - i);
     WIN32_FIND_DATAA found;
     HANDLE search = FindFirstFileA(out.c_str(), &found);
+    i = end;
     if (search == INVALID_HANDLE_VALUE)
       break;
     FindClose(search);
     out.resize(componentAt);
     out.append(found.cFileName);
-    i = end;
   }
   out.append(in + i);
   copyText(output, size, out.c_str());
