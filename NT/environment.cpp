@@ -1,0 +1,424 @@
+#include "NT/environment.h"
+
+#include "NT/pathjoin.h"
+#include "platform/kxlsys.h"
+#include "platform/win32.h"
+
+#include <cctype>
+#include <cstring>
+
+namespace {
+
+constexpr uint32_t kFullHostName = 5;
+constexpr uint32_t kResolveFlags = 1;
+constexpr uint32_t kReservePorts = 3;
+constexpr uint32_t kNodesFileFlags = 842;     // create, write only, shared, binary
+constexpr uint32_t kProfileScriptFlags = 843; // the same, written through
+constexpr uint32_t kTextFileMode = 0x644;
+constexpr uint32_t kCharsetClassPrefix = 13; // the name characters follow the class prefix
+constexpr size_t kWorkstationChars = ENV_CFG_WORKSTATION_SZ - 1;
+constexpr const char kClientComponent[] = "KXL Zelquor Client";
+
+// Trace points, one per step that can fail.
+enum Probe : uint32_t {
+  kProbeCreate = 10,
+  kProbeOpen = 20,
+  kProbeRead = 21,
+  kProbeCpu = 22,
+  kProbeBandwidth = 23,
+  kProbeSeek = 24,
+  kProbeWrite = 25,
+  kProbeCommInit = 30,
+  kProbeHost = 31,
+  kProbeComputer = 32,
+  kProbePorts = 33,
+  kProbeVariables = 34,
+  kProbeAddNode = 35,
+  kProbeNodesFile = 36,
+  kProbeProfileScript = 37,
+};
+
+int32_t traced(uint32_t probe, int32_t rc) {
+  pdtError(KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT, probe, rc);
+  return rc;
+}
+
+// The -1 result whose reason is SQLCODE -1042 in the caller's status block.
+int32_t commFailure(uint32_t probe, sqlca *ca) {
+  if (ca != nullptr)
+    sqlcaSetCode(*ca, ENVIRONMENT_SQLCODE_COMM);
+  return traced(probe, UPGRADE_RC_SQLCA);
+}
+
+bool sameNameIgnoringCase(const char *a, const char *b) {
+  for (; *a != '\0' && *b != '\0'; ++a, ++b)
+    if (std::toupper(static_cast<unsigned char>(*a)) != std::toupper(static_cast<unsigned char>(*b)))
+      return false;
+  return *a == *b;
+}
+
+// What this call has created, so that a failure can take it away again.
+struct CreatedInstance {
+  const char *name = nullptr;
+  char directory[KXL_JOINED_PATH_SZ] = {};
+  bool partitionAdded = false;
+};
+
+void undoCreation(const CreatedInstance &created) {
+  if (created.partitionAdded) {
+    SQLO_INST_OUT first{}, second{};
+    sqlo_instance_delnode(created.name, 0, nullptr, 0, &first, &second);
+  }
+  sqlo_instance_drop(created.name, created.directory);
+}
+
+// ---- the configuration image ----------------------------------------------
+
+void putU16(unsigned char *image, uint32_t offset, uint16_t value) {
+  image[offset] = static_cast<unsigned char>(value & 0xFF);
+  image[offset + 1] = static_cast<unsigned char>(value >> 8);
+}
+
+void putU32(unsigned char *image, uint32_t offset, uint32_t value) {
+  for (uint32_t i = 0; i < 4; ++i)
+    image[offset + i] = static_cast<unsigned char>((value >> (8 * i)) & 0xFF);
+}
+
+void putF32(unsigned char *image, uint32_t offset, float value) {
+  uint32_t bits = 0;
+  static_assert(sizeof bits == sizeof value);
+  std::memcpy(&bits, &value, sizeof bits);
+  putU32(image, offset, bits);
+}
+
+// Writes `text` into a field of `size` bytes, zero-padded; false when it does not fit.
+bool putText(unsigned char *image, uint32_t offset, uint32_t size, const char *text) {
+  size_t length = std::strlen(text);
+  if (length >= size)
+    return false;
+  std::memset(image + offset, 0, size);
+  std::memcpy(image + offset, text, length);
+  return true;
+}
+
+uint32_t imageChecksum(const unsigned char *image) {
+  uint32_t sum = 0;
+  for (uint32_t i = 4; i < ENV_CFG_IMAGE_SZ; ++i)
+    sum += image[i];
+  return sum;
+}
+
+// The copy's components and its Java folder. True when a field was written.
+bool tuneComponents(unsigned char *image, const char *installPath) {
+  char copyName[SQLO_COPY_NAME_SZ] = {};
+  if (sqloGetCurrentInstallationName(copyName, sizeof copyName) != 0)
+    return false;
+  char keyPath[64 + SQLO_COPY_NAME_SZ];
+  ossSnprintf(keyPath, sizeof keyPath, "SOFTWARE\\ZAV\\KXL\\INSTALLEDCOPIES\\%s\\COMPONENTS", copyName);
+  HKEY key = nullptr;
+  if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, keyPath, 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
+    return false;
+  bool changed = false;
+  if (RegQueryValueExA(key, kClientComponent, nullptr, nullptr, nullptr, nullptr) == ERROR_SUCCESS) {
+    putU32(image, ENV_CFG_CLIENT_COMPONENT, ENV_CLIENT_COMPONENT_VALUE);
+    changed = true;
+  }
+  if (installPath != nullptr) {
+    char javaPath[KXL_JOINED_PATH_SZ];
+    joinPath(javaPath, installPath, "java\\jdk");
+    OSSPathParam test{OSS_PATH_PARAM_VERSION, javaPath, 1, 0};
+    // A path too long for its field is left out rather than written cut.
+    if (ossPathTest(&test) == 0 && putText(image, ENV_CFG_JAVA_PATH, ENV_CFG_JAVA_PATH_SZ, javaPath))
+      changed = true;
+  }
+  RegCloseKey(key);
+  return changed;
+}
+
+// Decimal text of (instance profiles other than the global one) - 1, or "".
+void workstationSuffix(char *suffix, size_t size) {
+  char globalName[SQLO_PREG_VALUE_SZ] = {};
+  uint32_t variable = KXL_VAR_KXLINSTANCE;
+  bool known = sqloPRegValue(SQLO_PREG_GET, &variable, 0, globalName, KXL_GLOBAL_PROFILE_NAME) == 0;
+  uint32_t count = 0;
+  char profile[SQLO_PREG_PROFILE_SZ] = {};
+  for (uint32_t action = SQLO_PREG_FIRST; sqloPRegProfile(action, profile) == 0; action = SQLO_PREG_NEXT) {
+    profile[sizeof profile - 1] = '\0';
+    if (!known || !sameNameIgnoringCase(profile, globalName))
+      ++count;
+  }
+  suffix[0] = '\0';
+  if (count > 1)
+    ossSnprintf(suffix, size, "%u", count - 1);
+}
+
+// The machine's name as the configuration assistant reports it.
+bool assistantMachineName(char *name, size_t size) {
+  if (caProIfInit() != 0)
+    return false;
+  CAPRO_REQUEST request;
+  std::memset(&request, 0, sizeof request);
+  request.queryKind = CAPRO_QUERY_MACHINE_NAME;
+  CAPRO_RESULT result{};
+  bool found = caProIfQuery(&request, &result) == 0;
+  if (found)
+    ossSnprintf(name, size, "%.*s", static_cast<int>(sizeof request.machineName - 1), request.machineName);
+  caProIfTerm();
+  return found;
+}
+
+bool isNameCharacter(char c) {
+  return c != '\0' && std::strchr(sqlz_charset + kCharsetClassPrefix, c) != nullptr;
+}
+
+// Machine name up to its first ".", upper case, a letter first, cut so that the
+// profile suffix fits into 8 characters; false when no name can be formed.
+bool workstationName(char *name) {
+  char machine[sizeof(CAPRO_REQUEST::machineName)] = {};
+  if (!assistantMachineName(machine, sizeof machine))
+    return false;
+  machine[std::strcspn(machine, ".")] = '\0';
+  if (machine[0] == '\0')
+    return false;
+  for (char *c = machine; *c != '\0'; ++c)
+    *c = static_cast<char>(std::toupper(static_cast<unsigned char>(*c)));
+  if (!std::isalpha(static_cast<unsigned char>(machine[0])))
+    machine[0] = 'd';
+  char suffix[16];
+  workstationSuffix(suffix, sizeof suffix);
+  size_t suffixLength = std::strlen(suffix);
+  size_t keep = suffixLength < kWorkstationChars ? kWorkstationChars - suffixLength : 0;
+  ossSnprintf(name, ENV_CFG_WORKSTATION_SZ, "%.*s%s", static_cast<int>(keep), machine, suffix);
+  for (char *c = name + 1; *c != '\0'; ++c)
+    if (!isNameCharacter(*c))
+      *c = '_';
+  return true;
+}
+
+// The machine-specific fields of a server image. `changed` is set when one
+// is written; a failed measure ends the tuning with its code.
+int32_t tuneMeasures(unsigned char *image, uint32_t workstationFlag, bool &changed) {
+  uint16_t nodeType = sqloLe16(image, ENV_CFG_NODE_TYPE);
+  if (nodeType == 2)
+    return 0;
+  float cpu = 0;
+  int32_t rc = sqlocpum(&cpu);
+  if (rc != 0)
+    return traced(kProbeCpu, rc);
+  putF32(image, ENV_CFG_CPU_MEASURE, cpu);
+  changed = true;
+  if (nodeType == 4) {
+    float bandwidth = 0;
+    rc = sqloGetCommBandwidth(&bandwidth, nodeType);
+    if (rc != 0)
+      return traced(kProbeBandwidth, rc);
+    putF32(image, ENV_CFG_BANDWIDTH, bandwidth);
+  }
+  char name[ENV_CFG_WORKSTATION_SZ] = {};
+  if (workstationName(name))
+    putText(image, ENV_CFG_WORKSTATION, ENV_CFG_WORKSTATION_SZ, name);
+  if (workstationFlag != 0)
+    putU16(image, ENV_CFG_WORKSTATION_FLAG, 1);
+  return 0;
+}
+
+bool readWhole(HANDLE file, unsigned char *image) {
+  DWORD got = 0;
+  return ReadFile(file, image, ENV_CFG_IMAGE_SZ, &got, nullptr) && got == ENV_CFG_IMAGE_SZ;
+}
+
+int32_t rewriteImage(HANDLE file, unsigned char *image) {
+  putU32(image, 0, imageChecksum(image));
+  if (SetFilePointer(file, 0, nullptr, FILE_BEGIN) == INVALID_SET_FILE_POINTER)
+    return traced(kProbeSeek, ENVIRONMENT_RC_CONFIG_FILE);
+  DWORD written = 0;
+  if (!WriteFile(file, image, ENV_CFG_IMAGE_SZ, &written, nullptr) || written != ENV_CFG_IMAGE_SZ)
+    return traced(kProbeWrite, ENVIRONMENT_RC_CONFIG_FILE);
+  return 0;
+}
+
+int32_t tuneConfigFile(const char *instanceDir, const char *installPath, uint32_t workstationFlag) {
+  char path[KXL_JOINED_PATH_SZ];
+  joinPath(path, instanceDir, "kxlsystm");
+  HANDLE file = CreateFileA(path, GENERIC_READ | GENERIC_WRITE, 0, nullptr, OPEN_EXISTING,
+                            FILE_ATTRIBUTE_NORMAL, nullptr);
+  if (file == INVALID_HANDLE_VALUE)
+    return traced(kProbeOpen, ENVIRONMENT_RC_CONFIG_FILE);
+  unsigned char image[ENV_CFG_IMAGE_SZ];
+  int32_t rc = 0;
+  if (!readWhole(file, image)) {
+    rc = traced(kProbeRead, ENVIRONMENT_RC_CONFIG_FILE);
+  } else {
+    bool changed = tuneComponents(image, installPath);
+    rc = tuneMeasures(image, workstationFlag, changed);
+    if (rc == 0 && changed)
+      rc = rewriteImage(file, image);
+  }
+  CloseHandle(file);
+  return rc;
+}
+
+// ---- partition 0 ----------------------------------------------------------
+
+// The record's text fields end inside their fields whatever the caller left there.
+void terminateFields(PartitionRecord &record) {
+  record.portStart[sizeof record.portStart - 1] = '\0';
+  record.portEnd[sizeof record.portEnd - 1] = '\0';
+  record.hostName[sizeof record.hostName - 1] = '\0';
+  record.computerName[sizeof record.computerName - 1] = '\0';
+  record.netName[sizeof record.netName - 1] = '\0';
+}
+
+// A given host must resolve; an empty one becomes this machine's short host name.
+int32_t settleHostName(PartitionRecord &record, sqlca *ca) {
+  if (record.hostName[0] != '\0') {
+    char resolved[SQLO_HOSTNAME_SZ] = {};
+    if (sqloPdbTcpIpResolveHostName(record.hostName, resolved, kFullHostName, kResolveFlags) != 0)
+      return traced(kProbeHost, ENVIRONMENT_RC_HOST_UNKNOWN);
+    return 0;
+  }
+  if (sqloPdbTcpIpGetFullHostName(record.hostName, kFullHostName) != 0) {
+    record.hostName[0] = '\0';
+    return commFailure(kProbeHost, ca);
+  }
+  record.hostName[sizeof record.hostName - 1] = '\0';
+  record.hostName[std::strcspn(record.hostName, ".")] = '\0';
+  return 0;
+}
+
+int32_t settleComputerName(PartitionRecord &record, sqlca *ca) {
+  if (record.computerName[0] != '\0')
+    return 0;
+  uint32_t size = sizeof record.computerName;
+  if (sqloGetComputerNameA(record.computerName, &size) == 0) {
+    record.computerName[0] = '\0';
+    return commFailure(kProbeComputer, ca);
+  }
+  record.computerName[sizeof record.computerName - 1] = '\0';
+  return 0;
+}
+
+int32_t settlePorts(const char *instanceName, PartitionRecord &record) {
+  if (record.portStart[0] != '\0' && record.portEnd[0] != '\0')
+    return 0;
+  if (sqloUpdateServiceFile(kReservePorts, instanceName, record.portStart, record.portEnd) != 0)
+    return traced(kProbePorts, ENVIRONMENT_RC_SERVICES_FILE);
+  terminateFields(record);
+  return 0;
+}
+
+int32_t setInstanceVariable(const char *instanceName, uint32_t variable, const char *value) {
+  char text[SQLO_PREG_VALUE_SZ];
+  ossSnprintf(text, sizeof text, "%s", value);
+  if (sqloPRegValuePE(SQLO_PREG_SET, &variable, 0, text, instanceName, SQLO_PREG_ANY_NODE, 0) != 0)
+    return traced(kProbeVariables, ENVIRONMENT_RC_PROFILE_VALUE);
+  return 0;
+}
+
+int32_t setPartitionVariables(const char *instanceName, const PartitionRecord &record) {
+  char ports[2 * SQLO_PORT_TEXT_SZ];
+  ossSnprintf(ports, sizeof ports, "%s:%s", record.portStart, record.portEnd);
+  int32_t rc = setInstanceVariable(instanceName, KXL_VAR_KXLPORTRANGE, ports);
+  if (rc == 0)
+    rc = setInstanceVariable(instanceName, KXL_VAR_KXLNODECOMPUTER, record.computerName);
+  return rc;
+}
+
+int32_t addPartitionZero(CreatedInstance &created, const char *userName, const char *password) {
+  SQLO_INST_OUT first{}, second{};
+  int32_t rc = sqlo_instance_addnode(created.name, 0, nullptr, 0, userName, password, &first, &second);
+  if (rc == 0) {
+    created.partitionAdded = true;
+    return 0;
+  }
+  // The out record carries the reason; a call that fails without one still fails.
+  return traced(kProbeAddNode, second.code != 0 ? second.code : rc);
+}
+
+bool writeTextFile(const char *directory, const char *name, uint32_t flags, const char *text) {
+  char path[KXL_JOINED_PATH_SZ];
+  joinPath(path, directory, name);
+  SQLO_FHANDLE handle = nullptr;
+  int32_t rc = sqloopenp(path, flags, kTextFileMode, &handle, 0);
+  if (rc != 0 && rc != SQLO_RC_FILE_EXISTED)
+    return false;
+  uint32_t length = static_cast<uint32_t>(std::strlen(text));
+  uint32_t written = 0;
+  bool complete = sqlowrite(handle, text, length, &written) == 0 && written == length;
+  return sqloclose(handle) == 0 && complete;
+}
+
+int32_t writePartitionFiles(const CreatedInstance &created, const PartitionRecord &record, sqlca *ca) {
+  char line[SQLO_HOSTNAME_SZ + SQLO_COMPUTERNAME_SZ + UPGRADE_NET_NAME_SZ + 16];
+  ossSnprintf(line, sizeof line, "0 %s %s 0 %s\r\n", record.hostName, record.computerName, record.netName);
+  if (!writeTextFile(created.directory, "kxlnodes.cfg", kNodesFileFlags, line))
+    return commFailure(kProbeNodesFile, ca);
+  char script[64];
+  ossSnprintf(script, sizeof script, "@echo off%sSET KXLINSTANCE=%s%s", "\r\n", created.name, "\r\n");
+  if (!writeTextFile(created.directory, "kxlprofile.bat", kProfileScriptFlags, script))
+    return commFailure(kProbeProfileScript, ca);
+  return 0;
+}
+
+int32_t setUpPartitionZero(CreatedInstance &created, const char *userName, const char *password,
+                           PartitionRecord &record, sqlca *ca) {
+  terminateFields(record);
+  if (sqloPdbCommFncInit() != 0)
+    return commFailure(kProbeCommInit, ca);
+  int32_t rc = settleHostName(record, ca);
+  if (rc == 0)
+    rc = settleComputerName(record, ca);
+  if (rc == 0)
+    rc = settlePorts(created.name, record);
+  if (rc == 0)
+    rc = setPartitionVariables(created.name, record);
+  if (rc == 0)
+    rc = addPartitionZero(created, userName, password);
+  if (rc == 0)
+    rc = writePartitionFiles(created, record, ca);
+  return rc;
+}
+
+int32_t createInstance(const char *instanceName, const char *instanceProfilePath, const char *installPath,
+                       const char *userName, const char *password, uint32_t oldNodeType, uint32_t newNodeType,
+                       PartitionRecord *partitionRecord, uint32_t createFlag) {
+  PartitionRecord none{};
+  PartitionRecord &record = partitionRecord != nullptr ? *partitionRecord : none;
+  record.clusterName[sizeof record.clusterName - 1] = '\0';
+  record.textSearchService[sizeof record.textSearchService - 1] = '\0';
+  const char *clusterName = record.clusterName[0] != '\0' ? record.clusterName : nullptr;
+  return sqlo_instance_create_extended(
+      instanceName, instanceProfilePath, installPath, 0, userName, password, 0, oldNodeType, newNodeType,
+      clusterName, record.serviceStepFlag, createFlag, record.textSearchRequested, record.textSearchService,
+      record.textSearchPort, &record.textSearchReasonCode, &record.extraMessage);
+}
+
+} // namespace
+
+int32_t upgradeInstanceEnvironment(const char *instanceName, const char *instanceProfilePath,
+                                   const char *installPath, const char *userName, const char *password,
+                                   uint32_t oldNodeType, uint32_t newNodeType,
+                                   PartitionRecord *partitionRecord, sqlca *ca, uint32_t createFlag,
+                                   uint32_t workstationFlag) {
+  pdtEntry(KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT);
+  int32_t rc = createInstance(instanceName, instanceProfilePath, installPath, userName, password, oldNodeType,
+                              newNodeType, partitionRecord, createFlag);
+  if (rc != 0) {
+    traced(kProbeCreate, rc);
+    pdtExit(KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT, rc, kProbeCreate);
+    return rc;
+  }
+  CreatedInstance created;
+  created.name = instanceName;
+  joinPath(created.directory, instanceProfilePath, instanceName);
+  sqloPutEnv(KXL_VAR_KXLINSTANCE, instanceName);
+  sqloPutEnv(KXL_VAR_KXLINSTPROF, instanceProfilePath);
+
+  rc = tuneConfigFile(created.directory, installPath, workstationFlag);
+  if (rc == 0 && newNodeType == 4 && partitionRecord != nullptr)
+    rc = setUpPartitionZero(created, userName, password, *partitionRecord, ca);
+  if (rc != 0)
+    undoCreation(created);
+  pdtExit(KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT, rc, 0);
+  return rc;
+}
