@@ -1,0 +1,493 @@
+#include "NT/profilereg.h"
+
+#include "engn/sqo/run.h"
+#include "install/installcopy.h"
+#include "install/iutil.h"
+#include "install/kxlinstance.h"
+#include "platform/kxlsys.h"
+
+#include <cctype>
+#include <cstddef>
+#include <cstdio>
+#include <cstring>
+
+namespace {
+
+constexpr const char kProductRoot[] = "SOFTWARE\\ZAV\\KXL";
+constexpr const char kServiceProgram[] = "kxlsyscs.exe";
+constexpr const char kClusterListValue[] = "KXLCLUSTERLIST";
+constexpr const char kLegacyPathValue[] = "KXLPATH";
+constexpr REGSAM kAllAccess = 0xF003F;
+constexpr REGSAM kReadAccess = 0x20019;
+constexpr uint32_t kFullHostNameKind = 5;
+constexpr int32_t kFirstNamedCopyVersion = 9; // copies from 9 on keep profiles under their name
+constexpr size_t kKeyPathSize = 512;
+constexpr size_t kCopyNameSize = 129;   // 128 characters
+constexpr DWORD kRegValueBuffer = 257;  // 256 bytes read, plus a terminator kept back
+constexpr size_t kServiceNameSize = 30; // "%s-%d": 29 characters
+constexpr size_t kDisplayNameSize = 256;
+constexpr size_t kProgramPathSize = 261;
+constexpr DWORD kUnknownSystemError = 31; // a failed call that left no error code
+
+// Trace points.
+constexpr uint32_t kProbeLocalHost = 10;
+constexpr uint32_t kProbePartitionOpen = 10;
+constexpr uint32_t kProbePartitionKey = 20;
+constexpr uint32_t kProbeLocalKey = 30;
+constexpr uint32_t kProbeComputerName = 40;
+constexpr uint32_t kProbeClusterName = 50;
+constexpr uint32_t kProbeClusterOpen = 60;
+constexpr uint32_t kProbeClusterKey = 70;
+constexpr uint32_t kProbeClusterLocalKey = 80;
+constexpr uint32_t kProbeCreateKey = 100;
+constexpr uint32_t kProbeCopyKey = 110;
+
+int32_t traced(uint32_t function, uint32_t probe, int32_t rc) {
+  pdtError(function, probe, rc);
+  return rc;
+}
+
+// Equal ignoring case over at most `limit` characters.
+bool sameText(const char *a, const char *b, size_t limit) {
+  for (size_t i = 0; i < limit; ++i) {
+    int ca = std::tolower(static_cast<unsigned char>(a[i]));
+    int cb = std::tolower(static_cast<unsigned char>(b[i]));
+    if (ca != cb)
+      return false;
+    if (ca == '\0')
+      return true;
+  }
+  return true;
+}
+
+// snprintf that reports whether the whole text fitted.
+template <class... Args> bool formatWhole(char *buffer, size_t size, const char *format, Args... args) {
+  int length = std::snprintf(buffer, size, format, args...);
+  return length >= 0 && static_cast<size_t>(length) < size;
+}
+
+// The keys one machine's move works on, and what they were formed from.
+struct ProfileKeys {
+  char currentCopy[kCopyNameSize] = {};
+  int32_t ownerVersion = 0;        // major version of the copy that owned the instance
+  char current[kKeyPathSize] = {}; // profile key under the current copy
+  char force[kKeyPathSize] = {};   // force-copy-name placeholder of the current copy
+  char old[kKeyPathSize] = {};     // profile key under the owning copy
+};
+
+bool namedProfileKey(char (&path)[kKeyPathSize], const char *copy, const char *instance) {
+  return formatWhole(path, sizeof path, "%s\\InstalledCopies\\%s\\PROFILES\\%s", kProductRoot, copy,
+                     instance);
+}
+
+// 0 when the owning copy's version cannot be had at all: without it the old
+// key is unknown, and guessing could move another installation's profile.
+int32_t ownerMajorVersion(const UpgradeContext &context) {
+  if (context.copy == nullptr)
+    return 0;
+  CopyVersion *version = nullptr;
+  context.copy->GetVersion(&version);
+  int32_t major = version != nullptr ? version->version : 0;
+  delete version;
+  return major;
+}
+
+bool formOldKey(const UpgradeContext &context, const char *instance, ProfileKeys &keys) {
+  if (keys.ownerVersion < kFirstNamedCopyVersion)
+    return formatWhole(keys.old, sizeof keys.old, "%s\\PROFILES\\%s", kProductRoot, instance);
+  char copyName[kCopyNameSize] = {};
+  if (context.instance == nullptr || context.instance->GetCopyName(copyName, sizeof copyName) != 0)
+    return false;
+  return namedProfileKey(keys.old, copyName, instance);
+}
+
+bool loadKeys(const UpgradeContext &context, const UpgradeOptions &options, ProfileKeys &keys) {
+  if (sqloGetCurrentInstallationName(keys.currentCopy, sizeof keys.currentCopy) != 0 ||
+      keys.currentCopy[0] == '\0')
+    return false;
+  keys.currentCopy[sizeof keys.currentCopy - 1] = '\0';
+  keys.ownerVersion = ownerMajorVersion(context);
+  if (keys.ownerVersion <= 0)
+    return false;
+  const char *instance = options.instanceName;
+  return namedProfileKey(keys.current, keys.currentCopy, instance) &&
+         formatWhole(keys.force, sizeof keys.force, "%s\\FORCE_COPY_NAME\\InstalledCopies\\%s\\PROFILES\\%s",
+                     kProductRoot, keys.currentCopy, instance) &&
+         formOldKey(context, instance, keys);
+}
+
+// RegCreateKeyExA as the move and its undo call it.
+LONG createKey(HKEY root, const char *path, HKEY *key, DWORD *disposition) {
+  return RegCreateKeyExA(root, path, 0, nullptr, REG_OPTION_NON_VOLATILE, kAllAccess, nullptr, key,
+                         disposition);
+}
+
+int32_t moveKey(HKEY root, const ProfileKeys &keys, bool force) {
+  const char *target = force ? keys.force : keys.current;
+  HKEY newKey = nullptr;
+  DWORD disposition = 0;
+  if (createKey(root, target, &newKey, &disposition) != ERROR_SUCCESS)
+    return traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
+  int32_t rc = 0;
+  if (!sameText(keys.old, target, kKeyPathSize)) {
+    if (!force && SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS)
+      rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
+    else
+      SHDeleteKeyA(root, keys.old);
+  }
+  RegCloseKey(newKey);
+  return rc;
+}
+
+int32_t revertKey(HKEY root, const ProfileKeys &keys, bool force) {
+  HKEY oldKey = nullptr;
+  DWORD disposition = 0;
+  if (createKey(root, keys.old, &oldKey, &disposition) != ERROR_SUCCESS)
+    return traced(KXL_FN_REVERT_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
+  int32_t rc = 0;
+  if (disposition != REG_OPENED_EXISTING_KEY) {
+    if (force)
+      SHDeleteKeyA(root, keys.force);
+    else if (SHCopyKeyA(root, keys.current, oldKey, 0) != ERROR_SUCCESS)
+      rc = traced(KXL_FN_REVERT_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
+    else
+      SHDeleteKeyA(root, keys.current);
+  }
+  RegCloseKey(oldKey);
+  return rc;
+}
+
+using KeyOperation = int32_t (*)(UpgradeContext &, HKEY, UpgradeOptions &, uint8_t);
+
+// One pass over the instance's machines: the per-machine operation, the trace
+// identifier it reports under, and the one machine registry kept open.
+struct MachineWalk {
+  UpgradeContext &context;
+  UpgradeOptions &options;
+  uint32_t function;
+  KeyOperation operation;
+  const ProfileKeys *keys; // the undo's service names; null for the move
+  SQLO_PREG_MACHINE *machine = nullptr;
+
+  MachineWalk(UpgradeContext &c, UpgradeOptions &o, uint32_t f, KeyOperation op, const ProfileKeys *k)
+      : context(c), options(o), function(f), operation(op), keys(k) {}
+  ~MachineWalk() { release(); }
+  MachineWalk(const MachineWalk &) = delete;
+  MachineWalk &operator=(const MachineWalk &) = delete;
+
+  void release() {
+    if (machine != nullptr)
+      sqloPRegMachineClose(&machine);
+  }
+};
+
+int32_t onLocalMachine(MachineWalk &walk, uint32_t probe) {
+  int32_t rc = walk.operation(walk.context, HKEY_LOCAL_MACHINE, walk.options, 0);
+  if (rc != 0)
+    pdtError(walk.function, probe, rc);
+  return rc;
+}
+
+int32_t onMachine(MachineWalk &walk, const char *machineName, uint8_t force, uint32_t openProbe,
+                  uint32_t keyProbe) {
+  if (sqloPRegMachineOpen(machineName, &walk.machine) != 0 || walk.machine == nullptr)
+    return traced(walk.function, openProbe, KXL_RC_MACHINE_REGISTRY);
+  int32_t rc = walk.operation(walk.context, walk.machine->hklm, walk.options, force);
+  if (rc != 0)
+    pdtError(walk.function, keyProbe, rc);
+  return rc;
+}
+
+// ---------------------------------------------------------------------------
+// Partitions
+// ---------------------------------------------------------------------------
+
+// The node list's entries in order. An entry whose names would run past it or
+// past the block ends the walk.
+class NodeCursor {
+public:
+  explicit NodeCursor(const SQLO_NODELIST *list)
+      : base_(reinterpret_cast<const unsigned char *>(list)),
+        left_(list != nullptr ? sqloNodeListCount(list) : 0),
+        entry_(list != nullptr ? sqloNodeListFirst(list) : nullptr),
+        size_(list != nullptr ? sqloNodeListSize(list) : 0) {}
+
+  const unsigned char *next() {
+    if (left_ <= 0 || entry_ == nullptr || !wellFormed(entry_)) {
+      left_ = 0;
+      return nullptr;
+    }
+    const unsigned char *current = entry_;
+    --left_;
+    entry_ = sqloNodeNext(entry_);
+    return current;
+  }
+
+private:
+  bool wellFormed(const unsigned char *entry) const {
+    size_t offset = static_cast<size_t>(entry - base_);
+    if (offset >= size_ || size_ - offset < SQLO_NODE_NAMES)
+      return false;
+    size_t length = sqloNodeLength(entry);
+    size_t names = 25u + entry[SQLO_NODE_HOSTLEN] + entry[SQLO_NODE_NAME2LEN] + entry[SQLO_NODE_NAME3LEN];
+    size_t machineEnd = names + entry[SQLO_NODE_MACHLEN];
+    return length <= size_ - offset && machineEnd < length &&
+           entry[SQLO_NODE_NAMES + entry[SQLO_NODE_HOSTLEN]] == 0 && entry[machineEnd] == 0;
+  }
+
+  const unsigned char *base_;
+  int32_t left_;
+  const unsigned char *entry_;
+  size_t size_;
+};
+
+uint8_t forceFor(const UpgradeOptions &options, const char *localHost, const unsigned char *entry) {
+  bool forced = (options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) != 0 &&
+                !sameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
+  return forced ? 1 : 0;
+}
+
+int32_t localFullHostName(MachineWalk &walk, char (&host)[SQLO_HOSTNAME_SZ]) {
+  if (sqloPdbTcpIpGetFullHostName(host, kFullHostNameKind) == 0) {
+    host[sizeof host - 1] = '\0';
+    return 0;
+  }
+  host[0] = '\0';
+  walk.options.status.sqlcode = KXL_RC_NO_LOCAL_HOST_NAME;
+  return traced(walk.function, kProbeLocalHost, UPGRADE_RC_SQLCA);
+}
+
+using EntryHook = void (*)(MachineWalk &, const unsigned char *entry, uint8_t force, const char *localHost);
+
+// Each machine once (the entries of logical port 0), then the hook for every entry.
+int32_t walkPartitions(MachineWalk &walk, const char *localHost, EntryHook hook) {
+  NodeCursor nodes(walk.context.nodeList);
+  for (const unsigned char *entry = nodes.next(); entry != nullptr; entry = nodes.next()) {
+    uint8_t force = forceFor(walk.options, localHost, entry);
+    if (sqloNodePort(entry) == 0) {
+      int32_t rc = onMachine(walk, sqloNodeMachine(entry), force, kProbePartitionOpen, kProbePartitionKey);
+      if (rc != 0)
+        return rc;
+    }
+    if (hook != nullptr)
+      hook(walk, entry, force, localHost);
+  }
+  return 0;
+}
+
+// ---------------------------------------------------------------------------
+// Cluster machines
+// ---------------------------------------------------------------------------
+
+int32_t lastSystemError() {
+  DWORD code = GetLastError();
+  return static_cast<int32_t>(code != 0 ? code : kUnknownSystemError);
+}
+
+// The machine names of the cluster profile's list; empty when the key or the
+// value is missing.
+void readClusterList(const char *instance, char (&list)[kRegValueBuffer]) {
+  char key[kKeyPathSize];
+  list[0] = '\0';
+  if (formatWhole(key, sizeof key, "Cluster\\ZAV\\KXL\\PROFILES\\%s", instance))
+    kxliReadRegString(HKEY_LOCAL_MACHINE, key, kAllAccess, kClusterListValue, list, sizeof list);
+}
+
+// Every machine of the cluster list: the local computer on its own root key
+// (or skipped), the others through the machine registry.
+int32_t walkCluster(MachineWalk &walk, bool includeLocal) {
+  char computer[SQLO_COMPUTERNAME_SZ] = {};
+  uint32_t size = sizeof computer;
+  if (sqloGetComputerNameA(computer, &size) == 0)
+    return traced(walk.function, kProbeComputerName, lastSystemError());
+  computer[sizeof computer - 1] = '\0';
+  char *clusterName = walk.options.partitionRecord.clusterName;
+  uint32_t nameRc = walk.context.instance->GetClusterName(clusterName, UPGRADE_CLUSTER_NAME_SZ);
+  if (nameRc != 0)
+    return traced(walk.function, kProbeClusterName, static_cast<int32_t>(nameRc));
+  char list[kRegValueBuffer];
+  readClusterList(walk.options.instanceName, list);
+  for (char *name = list; *name != '\0';) {
+    char *end = std::strchr(name, ' ');
+    char *rest = end != nullptr ? end + 1 : name + std::strlen(name);
+    if (end != nullptr)
+      *end = '\0';
+    int32_t rc = 0;
+    if (sameText(name, computer, SQLO_COMPUTERNAME_SZ))
+      rc = includeLocal ? onLocalMachine(walk, kProbeClusterLocalKey) : 0;
+    else if (name[0] != '\0')
+      rc = onMachine(walk, name, 0, kProbeClusterOpen, kProbeClusterKey);
+    if (rc != 0)
+      return rc;
+    name = rest;
+  }
+  return 0;
+}
+
+bool isClustered(const UpgradeContext &context) {
+  return context.instance != nullptr && context.instance->isClustered != 0;
+}
+
+// ---------------------------------------------------------------------------
+// The undo's services
+// ---------------------------------------------------------------------------
+
+// "KXL - <service>" for version-8 copies, else with the current copy's name.
+void serviceDisplayName(const ProfileKeys &keys, const char *service, char (&display)[kDisplayNameSize]) {
+  if (keys.ownerVersion < kFirstNamedCopyVersion)
+    std::snprintf(display, sizeof display, "KXL - %s", service);
+  else
+    std::snprintf(display, sizeof display, "KXL - %s - %s", keys.currentCopy, service);
+}
+
+// The owning copy's service program. A path that does not fit leaves the
+// buffer empty, so that the service keeps the program it has.
+void ownerProgramPath(const UpgradeContext &context, char (&path)[kProgramPathSize]) {
+  if (!formatWhole(path, sizeof path, "%s\\bin\\%s", context.copyPath, kServiceProgram))
+    path[0] = '\0';
+}
+
+// The machine's registry for reading: the walk's open one when it is that
+// machine's, else that machine opened anew; null when it cannot be reached.
+HKEY machineRoot(MachineWalk &walk, const char *machineName) {
+  if (walk.machine == nullptr || !sameText(walk.machine->machineName, machineName, SQLO_COMPUTERNAME_SZ)) {
+    if (sqloPRegMachineOpen(machineName, &walk.machine) != 0 || walk.machine == nullptr)
+      return nullptr;
+  }
+  return walk.machine->hklm;
+}
+
+// A partition on another host runs the program of the installation recorded
+// in that machine's legacy global profile, when it records one.
+void remoteProgramPath(MachineWalk &walk, const char *machineName, char (&path)[kProgramPathSize]) {
+  HKEY root = machineRoot(walk, machineName);
+  char key[kKeyPathSize];
+  char installPath[kRegValueBuffer];
+  if (root == nullptr || !formatWhole(key, sizeof key, "%s\\GLOBAL_PROFILE", kProductRoot) ||
+      kxliReadRegString(root, key, kReadAccess, kLegacyPathValue, installPath, sizeof installPath) !=
+          ERROR_SUCCESS ||
+      installPath[0] == '\0')
+    return;
+  char remote[kProgramPathSize];
+  if (formatWhole(remote, sizeof remote, "%s\\bin\\%s", installPath, kServiceProgram))
+    std::memcpy(path, remote, sizeof path);
+}
+
+const char *textOrNull(const char *text) {
+  return text[0] != '\0' ? text : nullptr;
+}
+
+void repointService(const UpgradeContext &context, const char *service, const char *machine,
+                    const char *program, const char *account, const char *password, const char *display) {
+  SQLO_SVC_OUT out{};
+  sqloChangeNTServiceConfig(service, machine, SQLO_SVC_NO_CHANGE,
+                            static_cast<uint32_t>(context.serviceStartType), SQLO_SVC_NO_CHANGE, program,
+                            nullptr, nullptr, nullptr, account, password, display, &out);
+}
+
+void repointPartitionService(MachineWalk &walk, const unsigned char *entry, uint8_t force,
+                             const char *localHost) {
+  char program[kProgramPathSize];
+  ownerProgramPath(walk.context, program);
+  const char *machine = sqloNodeMachine(entry);
+  if ((walk.options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) == 0 &&
+      !sameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ))
+    remoteProgramPath(walk, machine, program);
+  char service[kServiceNameSize];
+  char display[kDisplayNameSize];
+  std::snprintf(service, sizeof service, "%s-%d", walk.options.instanceName, sqloNodeNumber(entry));
+  serviceDisplayName(*walk.keys, service, display);
+  // Without a user name the service keeps its account.
+  const char *account = textOrNull(walk.options.userName);
+  repointService(walk.context, service, machine, force != 0 ? nullptr : textOrNull(program), account,
+                 account != nullptr ? walk.options.password : nullptr, display);
+}
+
+void repointLocalService(MachineWalk &walk) {
+  char program[kProgramPathSize];
+  char display[kDisplayNameSize];
+  ownerProgramPath(walk.context, program);
+  serviceDisplayName(*walk.keys, walk.options.instanceName, display);
+  repointService(walk.context, walk.options.instanceName, nullptr, textOrNull(program), nullptr, nullptr,
+                 display);
+}
+
+// ---------------------------------------------------------------------------
+// The two passes
+// ---------------------------------------------------------------------------
+
+int32_t moveMachines(MachineWalk &walk) {
+  if (walk.options.partitionedInstance != 1)
+    return onLocalMachine(walk, kProbeLocalKey);
+  char localHost[SQLO_HOSTNAME_SZ] = {};
+  if ((walk.options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) != 0) {
+    int32_t rc = localFullHostName(walk, localHost);
+    if (rc != 0)
+      return rc;
+  }
+  return walkPartitions(walk, localHost, nullptr);
+}
+
+int32_t revertMachines(MachineWalk &walk) {
+  if (walk.options.partitionedInstance != 1) {
+    int32_t rc = onLocalMachine(walk, kProbeLocalKey);
+    if (rc == 0)
+      repointLocalService(walk);
+    return rc;
+  }
+  char localHost[SQLO_HOSTNAME_SZ] = {};
+  int32_t rc = localFullHostName(walk, localHost);
+  return rc != 0 ? rc : walkPartitions(walk, localHost, repointPartitionService);
+}
+
+int32_t keysOrFailure(const UpgradeContext &context, const UpgradeOptions &options, ProfileKeys &keys,
+                      uint32_t function) {
+  return loadKeys(context, options, keys) ? 0 : traced(function, kProbeCreateKey, KXL_RC_PROFILE_KEY);
+}
+
+} // namespace
+
+int32_t moveProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptions &options, uint8_t force) {
+  pdtEntry(KXL_FN_MOVE_INSTANCE_PROFILE);
+  ProfileKeys keys;
+  int32_t rc = keysOrFailure(context, options, keys, KXL_FN_MOVE_INSTANCE_PROFILE);
+  if (rc == 0)
+    rc = moveKey(machineRoot, keys, force != 0);
+  pdtExit(KXL_FN_MOVE_INSTANCE_PROFILE, rc, 0);
+  return rc;
+}
+
+int32_t revertProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptions &options, uint8_t force) {
+  pdtEntry(KXL_FN_REVERT_INSTANCE_PROFILE);
+  ProfileKeys keys;
+  int32_t rc = keysOrFailure(context, options, keys, KXL_FN_REVERT_INSTANCE_PROFILE);
+  if (rc == 0)
+    rc = revertKey(machineRoot, keys, force != 0);
+  pdtExit(KXL_FN_REVERT_INSTANCE_PROFILE, rc, 0);
+  return rc;
+}
+
+int32_t moveInstanceProfile(UpgradeContext &context, UpgradeOptions &options) {
+  pdtEntry(KXL_FN_MOVE_INSTANCE_PROFILE);
+  MachineWalk walk(context, options, KXL_FN_MOVE_INSTANCE_PROFILE, moveProfileKey, nullptr);
+  int32_t rc = moveMachines(walk);
+  if (rc == 0 && isClustered(context))
+    rc = walkCluster(walk, false);
+  walk.release();
+  pdtExit(KXL_FN_MOVE_INSTANCE_PROFILE, rc, 0);
+  return rc;
+}
+
+int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options) {
+  pdtEntry(KXL_FN_REVERT_INSTANCE_PROFILE);
+  ProfileKeys keys;
+  MachineWalk walk(context, options, KXL_FN_REVERT_INSTANCE_PROFILE, revertProfileKey, &keys);
+  int32_t rc = keysOrFailure(context, options, keys, KXL_FN_REVERT_INSTANCE_PROFILE);
+  if (rc == 0)
+    rc = revertMachines(walk);
+  if (rc == 0 && isClustered(context))
+    rc = walkCluster(walk, true);
+  walk.release();
+  pdtExit(KXL_FN_REVERT_INSTANCE_PROFILE, rc, 0);
+  return rc;
+}
