@@ -1,20 +1,261 @@
+// The upgrade driver: a fixed sequence of steps, each of which either
+// succeeds or ends the upgrade through one undo sequence.
 #include "NT/kxliutil.h"
 
+#include "NT/backup.h"
+#include "NT/carryover.h"
+#include "NT/dbmcfg.h"
+#include "NT/driverstate.h"
+#include "NT/editioncheck.h"
+#include "NT/functiondir.h"
+#include "NT/instfiles.h"
+#include "NT/profilereg.h"
+#include "NT/services.h"
+#include "NT/tools_run.h"
+#include "cluster/clusterstep.h"
+#include "engn/sqo/run.h"
+#include "install/installcopy.h"
+#include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
 
-#include <cstdio>
+#include <cstring>
+#include <iterator>
 
 namespace {
 
-// Until the engine is built the driver refuses every instance without
-// touching it; the code has no catalog text, so the plain line is printed.
-constexpr int kEngineMissing = -1999;
+constexpr uint32_t kPartitionedNodeType = 4;
+constexpr int32_t kToCurrentServerType = 1;
+
+// Trace points.
+constexpr uint32_t kProbeActive = 10;
+constexpr uint32_t kProbeCurrentCopy = 5;
+constexpr uint32_t kProbeProfileMove = 80;
+constexpr uint32_t kProbeServices = 90;
+constexpr uint32_t kProbeReread = 100;
+constexpr uint32_t kProbeInstanceFound = 110;
+constexpr uint32_t kProbeEnvironment = 120;
+constexpr uint32_t kProbeDbmConfig = 130;
+constexpr uint32_t kProbeAuthType = 140;
+constexpr uint32_t kProbeFunctionDir = 190;
+constexpr uint32_t kProbeCluster = 200;
+
+bool isPartitioned(const DriverState &state) {
+  return state.options.partitionedInstance == 1 || state.context.nodeType == kPartitionedNodeType;
+}
+
+StepResult takeInstanceName(DriverState &state) {
+  state.context.instance->GetName(state.instanceName, sizeof state.instanceName);
+  if (isPartitioned(state))
+    sqloPdbCommFncInit();
+  return stepDone();
+}
+
+StepResult refuseActiveInstance(DriverState &state) {
+  if (isInstanceActive(state.context, state.options))
+    return stepFailed(kProbeActive, UPGRADE_RC_INSTANCE_ACTIVE);
+  return stepDone();
+}
+
+// The current copy in the context's list. The run has found it already; a
+// list without it ends the upgrade before anything is touched.
+StepResult findCurrentCopy(DriverState &state) {
+  if (sqloGetCurrentInstallationName(state.currentCopyName, sizeof state.currentCopyName) != 0 ||
+      state.context.copies == nullptr ||
+      state.context.copies->Find(state.currentCopyName, &state.currentCopy) != 0)
+    return stepFailed(kProbeCurrentCopy, UPGRADE_RC_COPY_NOT_FOUND);
+  return stepDone();
+}
+
+// The node type from the instance's own kxlsystm; when that cannot be read
+// the run's value stands.
+StepResult readInstanceNodeType(DriverState &state) {
+  state.context.instance->GetInstanceDir(state.instanceDir, sizeof state.instanceDir);
+  IKXLINSTANCE snapshot;
+  state.nodeType = state.context.nodeType;
+  if (snapshot.ReloadDbmCfg(state.instanceDir) == 0)
+    state.nodeType = snapshot.GetNodeType();
+  return stepDone();
+}
+
+StepResult checkCurrentEdition(DriverState &state) {
+  int32_t rc = checkEdition(state.currentCopy, state.nodeType, state.options);
+  if (rc == 0)
+    return stepDone();
+  uint32_t probe = editionCheckProbe(state.nodeType);
+  uint32_t lastError = GetLastError();
+  pdtData1(KXL_FN_UPGRADE_INSTANCE, probe, PD_TYPE_UINT32, sizeof lastError, &lastError);
+  return stepFailed(probe, rc);
+}
+
+StepResult moveProfile(DriverState &state) {
+  int32_t rc = moveInstanceProfile(state.context, state.options);
+  if (rc != 0)
+    return stepFailed(kProbeProfileMove, rc);
+  state.profileMoved = true;
+  return stepDone();
+}
+
+StepResult keepAudit(DriverState &state) {
+  keepAuditSettings(state);
+  return stepDone();
+}
+
+StepResult upgradeServices(DriverState &state) {
+  int32_t rc = upgradeInstanceServices(state.context, state.options);
+  return rc != 0 ? stepFailed(kProbeServices, rc) : stepDone();
+}
+
+// kxlauditcopy.cfg is left in place when the tool fails.
+StepResult upgradeAudit(DriverState &state) {
+  putBackAuditSettings(state);
+  int32_t rc = runAuditTool();
+  if (rc != 0)
+    return stepFailed(kProbeAuditTool, rc);
+  dropAuditCopy(state);
+  return stepDone();
+}
+
+StepResult upgradeSsl(DriverState &state) {
+  char copyPath[KXL_JOINED_PATH_SZ] = {};
+  state.currentCopy->GetPath(copyPath, sizeof copyPath);
+  int32_t rc = runSslTool(copyPath, state.instanceDir);
+  return rc != 0 ? stepFailed(kProbeSslTool, rc) : stepDone();
+}
+
+StepResult rereadCopies(DriverState &state) {
+  state.rereadCopies = new (std::nothrow) InstallCopyList(false, false);
+  if (state.rereadCopies == nullptr || state.rereadCopies->status != 0)
+    return stepFailed(kProbeReread, UPGRADE_RC_COPY_NOT_FOUND);
+  return stepDone();
+}
+
+// The instance as the current copy lists it now, and the paths of the steps
+// that follow: old files come from the backup from here on.
+StepResult findUpgradedInstance(DriverState &state) {
+  InstallCopy *copy = nullptr;
+  IKXLINSTANCELIST *instances = nullptr;
+  if (state.rereadCopies->Find(state.currentCopyName, &copy) != 0 || copy == nullptr ||
+      copy->GetInstanceList(&instances) != 0 || instances == nullptr ||
+      instances->Find(state.instanceName, &state.newInstance) != 0 || state.newInstance == nullptr)
+    return stepFailed(kProbeInstanceFound, UPGRADE_RC_COPY_NOT_FOUND);
+  state.newInstance->GetInstanceDir(state.newInstanceDir, sizeof state.newInstanceDir);
+  joinPath(state.backupConfigFile, state.backupDir, "\\kxlsystm");
+  joinPath(state.newConfigFile, state.newInstanceDir, "\\kxlsystm");
+  return stepDone();
+}
+
+StepResult prepareEnvironment(DriverState &state) {
+  sqloPutEnv(KXL_VAR_KXLINSTANCE, state.instanceName);
+  sqlo_force_refresh_env();
+  uint32_t partitioned = state.nodeType == kPartitionedNodeType ? 1 : 0;
+  int32_t rc = sqleInitApplicationEnvironment(0, 0, partitioned, nullptr);
+  return rc != 0 ? stepFailed(kProbeEnvironment, rc) : stepDone();
+}
+
+StepResult convertConfiguration(DriverState &state) {
+  int32_t rc = upgradeDbmConfig(state.newConfigFile, state.backupConfigFile);
+  if (rc == 0)
+    return stepDone();
+  pdtData1(KXL_FN_UPGRADE_INSTANCE, kProbeDbmConfig, PD_TYPE_INT32, sizeof rc, &rc);
+  return stepFailed(kProbeDbmConfig, UPGRADE_RC_DBM_CONFIG_FAILED);
+}
+
+StepResult applyAuthenticationType(DriverState &state) {
+  if ((state.options.flags & UPGRADE_FLAG_AUTH_TYPE) == 0)
+    return stepDone();
+  sqlfupd item = {SQLF_KTN_AUTHENTICATION, &state.options.authType};
+  int32_t rc = sqlfusys(1, &item, &state.options.status);
+  if (rc != 0 || sqlcaCode(state.options.status) != 0)
+    return stepFailed(kProbeAuthType, UPGRADE_RC_SQLCA);
+  return stepDone();
+}
+
+StepResult carryFiles(DriverState &state) {
+  return carryOverFiles(state);
+}
+
+StepResult copyFunctions(DriverState &state) {
+  char oldProfilePath[KXL_JOINED_PATH_SZ] = {};
+  char newProfilePath[KXL_JOINED_PATH_SZ] = {};
+  state.context.instance->GetInstanceParentDir(oldProfilePath, sizeof oldProfilePath);
+  state.newInstance->GetInstanceParentDir(newProfilePath, sizeof newProfilePath);
+  int32_t rc = copyFunctionDirectory(state.context, newProfilePath, oldProfilePath);
+  return rc != 0 ? stepFailed(kProbeFunctionDir, rc) : stepDone();
+}
+
+StepResult upgradeCluster(DriverState &state) {
+  if (!state.context.instance->isClustered)
+    return stepDone();
+  int32_t rc = upgradeClusterInstance(state.context, kToCurrentServerType, state.options);
+  return rc != 0 ? stepFailed(kProbeCluster, rc) : stepDone();
+}
+
+StepResult cleanProfileRegistry(DriverState &) {
+  runCleanupTool();
+  return stepDone();
+}
+
+using Step = StepResult (*)(DriverState &);
+
+// The upgrade, in order.
+constexpr Step kSteps[] = {
+    takeInstanceName,
+    refuseActiveInstance,
+    findCurrentCopy,
+    readInstanceNodeType,
+    checkCurrentEdition,
+    makeBackup,
+    copyToNewProfilePath,
+    moveProfile,
+    keepAudit,
+    upgradeServices,
+    upgradeAudit,
+    upgradeSsl,
+    rereadCopies,
+    findUpgradedInstance,
+    prepareEnvironment,
+    convertConfiguration,
+    applyAuthenticationType,
+    carryFiles,
+    copyFunctions,
+    upgradeCluster,
+    cleanProfileRegistry,
+};
+
+void releaseCopies(DriverState &state) {
+  delete state.rereadCopies;
+  state.rereadCopies = nullptr;
+  state.newInstance = nullptr;
+}
+
+int32_t undo(DriverState &state, const StepResult &failure) {
+  pdtError(KXL_FN_UPGRADE_INSTANCE, failure.probe, failure.rc);
+  if (state.profileMoved)
+    revertInstanceProfile(state.context, state.options);
+  if (failure.rc < 0 && state.backupComplete)
+    restoreBackup(state);
+  releaseCopies(state);
+  removeBackup(state);
+  return failure.rc;
+}
+
+int32_t runSteps(DriverState &state) {
+  for (Step step : kSteps) {
+    StepResult result = step(state);
+    if (failed(result))
+      return undo(state, result);
+  }
+  releaseCopies(state);
+  removeBackup(state);
+  return 0;
+}
 
 } // namespace
 
-int upgradeInstance(UpgradeContext &, UpgradeOptions &) {
+int upgradeInstance(UpgradeContext &context, UpgradeOptions &options) {
   pdtEntry(KXL_FN_UPGRADE_INSTANCE);
-  std::fputs("upgrade engine not available in this build\n", stderr);
-  pdtExit(KXL_FN_UPGRADE_INSTANCE, kEngineMissing, 1);
-  return kEngineMissing;
+  DriverState state(context, options);
+  int32_t rc = context.instance != nullptr ? runSteps(state) : UPGRADE_RC_COPY_NOT_FOUND;
+  pdtExit(KXL_FN_UPGRADE_INSTANCE, rc, 0);
+  return rc;
 }

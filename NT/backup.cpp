@@ -1,0 +1,104 @@
+#include "NT/backup.h"
+
+#include "NT/kxliutil.h"
+#include "platform/kxlsys.h"
+#include "platform/win32.h"
+
+#include <cstdlib>
+#include <cstring>
+
+namespace {
+
+constexpr char kBackupPrefix[] = "KXL";
+constexpr uint32_t kProbeRestoreFailed = 300;
+
+// Reports the system's last error at `probe` together with the failure.
+StepResult failedWithSystemError(uint32_t probe, int32_t rc) {
+  uint32_t lastError = GetLastError();
+  pdtData1(KXL_FN_UPGRADE_INSTANCE, probe, PD_TYPE_UINT32, sizeof lastError, &lastError);
+  return stepFailed(probe, rc);
+}
+
+// Copies `text` into a path buffer; false when it does not fit.
+bool copyPath(char *buffer, const char *text) {
+  std::size_t length = std::strlen(text);
+  if (length >= KXL_JOINED_PATH_SZ)
+    return false;
+  std::memcpy(buffer, text, length + 1);
+  return true;
+}
+
+// A unique name under the temporary directory, into state.backupDir.
+StepResult chooseBackupName(DriverState &state) {
+  char tempDir[KXL_JOINED_PATH_SZ] = {};
+  DWORD length = GetTempPathA(sizeof tempDir, tempDir);
+  if (length == 0 || length >= sizeof tempDir)
+    return failedWithSystemError(kProbeTempPath, UPGRADE_RC_BACKUP_FAILED);
+  char *name = _tempnam(tempDir, kBackupPrefix);
+  if (name == nullptr)
+    return failedWithSystemError(kProbeTempName, UPGRADE_RC_BACKUP_FAILED);
+  bool fits = copyPath(state.backupDir, name);
+  std::free(name);
+  if (!fits)
+    return failedWithSystemError(kProbeTempName, UPGRADE_RC_BACKUP_FAILED);
+  return stepDone();
+}
+
+bool pathExists(const char *path) {
+  OSSPathParam param = {OSS_PATH_PARAM_VERSION, path, 1, 0};
+  return ossPathTest(&param) != OSS_RC_PATH_NOT_FOUND;
+}
+
+bool createDirectory(const char *path) {
+  OSSPathParam param = {OSS_PATH_PARAM_VERSION, path, 0, 2};
+  return ossDirectoryCreate(&param) == 0;
+}
+
+} // namespace
+
+StepResult makeBackup(DriverState &state) {
+  std::memcpy(state.savedInstanceDir, state.instanceDir, sizeof state.savedInstanceDir);
+  StepResult named = chooseBackupName(state);
+  if (failed(named))
+    return named;
+  // Only a directory this call made is ever removed again.
+  if (!CreateDirectoryA(state.backupDir, nullptr))
+    return failedWithSystemError(kProbeBackupCreate, UPGRADE_RC_BACKUP_FAILED);
+  state.backupChosen = true;
+  if (sqlocopydir(state.backupDir, state.instanceDir, 0) != 0)
+    return failedWithSystemError(kProbeBackupCopy, UPGRADE_RC_BACKUP_FAILED);
+  state.backupComplete = true;
+  return stepDone();
+}
+
+StepResult copyToNewProfilePath(DriverState &state) {
+  if ((state.options.flags & UPGRADE_FLAG_PROFILE_PATH_MOVES) == 0)
+    return stepDone();
+  const char *profilePath = state.options.profilePath;
+  if (!pathExists(profilePath) && !createDirectory(profilePath))
+    return stepFailed(kProbeProfilePathCreate, UPGRADE_RC_PROFILE_PATH_FAILED);
+  char target[KXL_JOINED_PATH_SZ];
+  joinPath(target, profilePath, state.instanceName);
+  if (pathExists(target))
+    return stepFailed(kProbeInstanceDirExists, UPGRADE_RC_PROFILE_PATH_FAILED);
+  if (sqlocopydir(target, state.instanceDir, 0) != 0)
+    return stepFailed(kProbeProfileCopy, UPGRADE_RC_BACKUP_FAILED);
+  return stepDone();
+}
+
+bool restoreBackup(DriverState &state) {
+  int32_t rc = sqlocopydir(state.savedInstanceDir, state.backupDir, 0);
+  if (rc == 0)
+    return true;
+  state.backupChosen = false;
+  pdLog(PD_LEVEL_SEVERE, KXL_FN_UPGRADE_INSTANCE, kProbeRestoreFailed, rc,
+        "instance directory %s not restored; its backup is kept in %s", state.savedInstanceDir,
+        state.backupDir);
+  return false;
+}
+
+void removeBackup(DriverState &state) {
+  if (state.backupChosen)
+    sqlodeletedir(state.backupDir);
+  state.backupChosen = false;
+}
