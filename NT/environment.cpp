@@ -50,13 +50,6 @@ int32_t commFailure(uint32_t probe, sqlca *ca) {
   return traced(probe, UPGRADE_RC_SQLCA);
 }
 
-bool sameNameIgnoringCase(const char *a, const char *b) {
-  for (; *a != '\0' && *b != '\0'; ++a, ++b)
-    if (std::toupper(static_cast<unsigned char>(*a)) != std::toupper(static_cast<unsigned char>(*b)))
-      return false;
-  return *a == *b;
-}
-
 // What this call has created, so that a failure can take it away again.
 struct CreatedInstance {
   const char *name = nullptr;
@@ -144,7 +137,7 @@ void workstationSuffix(char *suffix, size_t size) {
   char profile[SQLO_PREG_PROFILE_SZ] = {};
   for (uint32_t action = SQLO_PREG_FIRST; sqloPRegProfile(action, profile) == 0; action = SQLO_PREG_NEXT) {
     profile[sizeof profile - 1] = '\0';
-    if (!known || !sameNameIgnoringCase(profile, globalName))
+    if (!known || sqlomcpi(profile, globalName, SQLO_PREG_VALUE_SZ) != 0)
       ++count;
   }
   suffix[0] = '\0';

@@ -1,0 +1,508 @@
+#include "NT/services.h"
+
+#include "NT/environment.h"
+#include "NT/nodetypechoice.h"
+#include "NT/pathjoin.h"
+#include "engn/sqo/run.h"
+#include "platform/kxlsys.h"
+#include "platform/win32.h"
+
+#include <cstring>
+
+namespace {
+
+constexpr uint32_t kServiceNameSize = 30;  // "%s-%d": 29 characters
+constexpr uint32_t kExtenderNameSize = 40; // "KXLEXT - " and a partition's service name
+constexpr uint32_t kDisplayNameSize = SQLO_COPY_NAME_SZ + 64;
+constexpr uint32_t kClusterValueSize = 257;
+constexpr uint32_t kKxlPathSize = 256;
+constexpr uint32_t kFullHostName = 5;
+constexpr int32_t kDisabled = 4; // start type of partitions left on another copy's machine
+constexpr const char kServerProgram[] = "kxlsyscs.exe";
+constexpr const char kExtenderProgram[] = "ctelock.exe";
+constexpr const char kMessageLibrary[] = "kxlwint64.dll";
+constexpr const char kClusterList[] = "KXLCLUSTERLIST";
+constexpr const char kClusterInstanceProfile[] = "KXLINSTPROF";
+
+enum Probe : uint32_t {
+  kProbeClusterName = 10,
+  kProbeSaveNodes = 20,
+  kProbeServiceConfig = 30,
+  kProbeEnvironment = 40,
+  kProbeRestoreNodes = 50,
+  kProbeHostName = 70,
+  kProbeClusterMachine = 80,
+  kProbePartitionMachine = 90,
+  kProbeSingleMachine = 210,
+};
+
+int32_t traced(uint32_t probe, int32_t rc) {
+  pdtError(KXL_FN_UPGRADE_INSTANCE_SERVICES, probe, rc);
+  return rc;
+}
+
+// The cluster profile values, read before the instance is re-created and
+// written to every machine of the cluster afterwards.
+struct ClusterProfile {
+  HKEY key = nullptr; // the local cluster profile key, open for the whole step
+  char list[kClusterValueSize + 1] = {};
+  char instanceProfile[kClusterValueSize + 1] = {};
+  bool hasList = false;
+  bool hasInstanceProfile = false;
+};
+
+struct ServicesStep {
+  ServicesStep(UpgradeContext &c, UpgradeOptions &o) : context(c), options(o) {}
+
+  UpgradeContext &context;
+  UpgradeOptions &options;
+  char instanceName[SQLO_INSTANCE_NAME_SZ] = {};
+  char copyName[SQLO_COPY_NAME_SZ] = {};
+  char localHost[SQLO_HOSTNAME_SZ] = {};
+  char referenceService[kServiceNameSize] = {};
+  char nodesFile[KXL_JOINED_PATH_SZ] = {};
+  char savedNodesFile[KXL_JOINED_PATH_SZ] = {};
+  ClusterProfile cluster;
+  SQLO_PREG_MACHINE *machine = nullptr;
+
+  bool flag(uint16_t bit) const { return (options.flags & bit) != 0; }
+  bool partitioned() const { return options.partitionedInstance != 0; }
+  bool clustered() const { return context.instance != nullptr && context.instance->isClustered != 0; }
+  const char *account() const { return options.userName[0] != '\0' ? options.userName : nullptr; }
+  const char *password() const { return options.password[0] != '\0' ? options.password : nullptr; }
+};
+
+// One call of the service configuration change; null members change nothing.
+struct ServiceChange {
+  const char *service = nullptr;
+  const char *machine = nullptr;
+  int32_t startType = UPGRADE_NO_SERVICE_STATE;
+  const char *program = nullptr;
+  const char *account = nullptr;
+  const char *password = nullptr;
+  const char *displayName = nullptr;
+};
+
+void changeService(const ServiceChange &change) {
+  SQLO_SVC_OUT out{};
+  sqloChangeNTServiceConfig(change.service, change.machine, SQLO_SVC_NO_CHANGE,
+                            static_cast<uint32_t>(change.startType), SQLO_SVC_NO_CHANGE, change.program,
+                            nullptr, nullptr, nullptr, change.account, change.password, change.displayName,
+                            &out);
+}
+
+void restoreStartType(const ServicesStep &step, const char *service) {
+  ServiceChange change;
+  change.service = service;
+  change.startType = step.context.serviceStartType;
+  changeService(change);
+}
+
+struct ProgramPaths {
+  char server[KXL_JOINED_PATH_SZ] = {};
+  char extender[KXL_JOINED_PATH_SZ] = {};
+};
+
+void programPaths(const char *installPath, ProgramPaths &paths) {
+  char bin[KXL_JOINED_PATH_SZ];
+  joinPath(bin, installPath, "bin");
+  joinPath(paths.server, bin, kServerProgram);
+  joinPath(paths.extender, bin, kExtenderProgram);
+}
+
+// The program paths from "KXLPATH" of the current copy's global profile in a
+// machine's registry; the paths stay as they are when it has none.
+void machineProgramPaths(HKEY hklm, const char *copyName, ProgramPaths &paths) {
+  char keyPath[64 + SQLO_COPY_NAME_SZ];
+  ossSnprintf(keyPath, sizeof keyPath, "%s\\InstalledCopies\\%s\\GLOBAL_PROFILE", "SOFTWARE\\ZAV\\KXL",
+              copyName);
+  HKEY key = nullptr;
+  if (RegOpenKeyExA(hklm, keyPath, 0, KEY_READ, &key) != ERROR_SUCCESS)
+    return;
+  char value[kKxlPathSize + 1] = {};
+  DWORD size = kKxlPathSize;
+  DWORD type = REG_NONE;
+  LONG rc = RegQueryValueExA(key, "KXLPATH", nullptr, &type, reinterpret_cast<BYTE *>(value), &size);
+  RegCloseKey(key);
+  if (rc == ERROR_SUCCESS && (type == REG_SZ || type == REG_EXPAND_SZ) && value[0] != '\0')
+    programPaths(value, paths);
+}
+
+int32_t openMachine(ServicesStep &step, const char *machineName, uint32_t probe) {
+  if (sqloPRegMachineOpen(machineName, &step.machine) != 0)
+    return traced(probe, SERVICES_RC_MACHINE_REGISTRY);
+  return 0;
+}
+
+// ---- cluster profile --------------------------------------------------------
+
+void clusterProfileKeyPath(const ServicesStep &step, char *path, size_t size) {
+  ossSnprintf(path, size, "Cluster\\ZAV\\KXL\\PROFILES\\%s", step.instanceName);
+}
+
+bool readClusterValue(HKEY key, const char *name, char *value) {
+  DWORD size = kClusterValueSize;
+  LONG rc = RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(value), &size);
+  value[size < kClusterValueSize ? size : kClusterValueSize] = '\0';
+  return rc == ERROR_SUCCESS;
+}
+
+void writeClusterValue(HKEY key, const char *name, const char *value) {
+  RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value),
+                 static_cast<DWORD>(std::strlen(value) + 1));
+}
+
+// Values that were missing before the re-creation are not invented afterwards.
+void writeClusterValues(HKEY key, const ClusterProfile &cluster) {
+  if (key == nullptr)
+    return;
+  if (cluster.hasList)
+    writeClusterValue(key, kClusterList, cluster.list);
+  if (cluster.hasInstanceProfile)
+    writeClusterValue(key, kClusterInstanceProfile, cluster.instanceProfile);
+}
+
+void writeMachineClusterValues(const ServicesStep &step) {
+  char path[64];
+  clusterProfileKeyPath(step, path, sizeof path);
+  HKEY key = nullptr;
+  if (RegOpenKeyExA(step.machine->hklm, path, 0, KEY_ALL_ACCESS, &key) != ERROR_SUCCESS)
+    return;
+  writeClusterValues(key, step.cluster);
+  RegCloseKey(key);
+}
+
+int32_t readClusterProfile(ServicesStep &step) {
+  uint32_t rc = step.context.instance->GetClusterName(step.options.partitionRecord.clusterName,
+                                                      sizeof step.options.partitionRecord.clusterName);
+  if (rc != 0)
+    return traced(kProbeClusterName, static_cast<int32_t>(rc));
+  char path[64];
+  clusterProfileKeyPath(step, path, sizeof path);
+  ClusterProfile &cluster = step.cluster;
+  if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_ALL_ACCESS, &cluster.key) != ERROR_SUCCESS) {
+    cluster.key = nullptr;
+    return 0;
+  }
+  cluster.hasList = readClusterValue(cluster.key, kClusterList, cluster.list);
+  cluster.hasInstanceProfile =
+      readClusterValue(cluster.key, kClusterInstanceProfile, cluster.instanceProfile);
+  return 0;
+}
+
+// Calls `visit` for every machine named in the saved cluster list (names
+// separated by single blanks) until it fails.
+template <class Visit> int32_t forEachClusterMachine(const ServicesStep &step, Visit visit) {
+  if (!step.cluster.hasList)
+    return 0;
+  char names[kClusterValueSize + 1];
+  ossSnprintf(names, sizeof names, "%s", step.cluster.list);
+  for (char *name = names; *name != '\0';) {
+    char *end = name + std::strcspn(name, " ");
+    bool last = *end == '\0';
+    *end = '\0';
+    if (*name != '\0') {
+      int32_t rc = visit(name);
+      if (rc != 0)
+        return rc;
+    }
+    name = last ? end : end + 1;
+  }
+  return 0;
+}
+
+// ---- before the re-creation -------------------------------------------------
+
+uint32_t workstationProfileFlag() {
+  char value[SQLO_PREG_VALUE_SZ] = {};
+  uint32_t variable = KXL_VAR_KXLWORKSTATION;
+  if (sqloPRegValuePE(SQLO_PREG_GET, &variable, 0, value, nullptr, SQLO_PREG_ANY_NODE, 0) != 0)
+    return 0;
+  return sqloStr2Flag(value) == 1 ? 1 : 0;
+}
+
+// The product libraries see the instance's port range and profile path.
+void prepareEnvironment(const ServicesStep &step) {
+  if (step.context.var159Head[0] != '\0') {
+    char ports[19];
+    ossSnprintf(ports, sizeof ports, "%s:%s", step.context.var159Head, step.context.var159Tail);
+    sqloPutEnv(KXL_VAR_KXLPORTRANGE, ports);
+    sqlo_force_refresh_env();
+  }
+  sqloPutEnv(KXL_VAR_KXLINSTPROF, step.options.profilePath);
+  sqlo_force_refresh_env();
+}
+
+bool isCopied(int32_t rc) {
+  return rc == 0 || rc == SQLO_RC_FILE_NOT_FOUND_W;
+}
+
+// "<path>.mig", inside the closing quote of a quoted path.
+void savedNodesFilePath(const char *path, char *saved) {
+  size_t length = std::strlen(path);
+  bool quoted = length > 0 && path[length - 1] == '"';
+  int keep = static_cast<int>(quoted ? length - 1 : length);
+  ossSnprintf(saved, KXL_JOINED_PATH_SZ, "%.*s.mig%s", keep, path, quoted ? "\"" : "");
+}
+
+int32_t saveNodesFile(ServicesStep &step) {
+  char directory[KXL_JOINED_PATH_SZ] = {};
+  if (step.flag(UPGRADE_FLAG_PROFILE_PATH_MOVES))
+    joinPath(directory, step.options.profilePath, step.instanceName);
+  else if (step.context.instance != nullptr)
+    step.context.instance->GetInstanceDir(directory, sizeof directory);
+  joinPath(step.nodesFile, directory, "\\kxlnodes.cfg");
+  savedNodesFilePath(step.nodesFile, step.savedNodesFile);
+  int32_t rc = sqlocopy(step.nodesFile, step.savedNodesFile, 0);
+  return isCopied(rc) ? 0 : traced(kProbeSaveNodes, rc);
+}
+
+const unsigned char *firstNode(const UpgradeContext &context) {
+  return context.nodeList != nullptr ? sqloNodeListFirst(context.nodeList) : nullptr;
+}
+
+void partitionServiceName(const ServicesStep &step, const unsigned char *entry, char *name) {
+  ossSnprintf(name, kServiceNameSize, "%s-%d", step.instanceName, sqloNodeNumber(entry));
+}
+
+// The service whose start type the re-created services get: the first
+// partition's, or the instance's own. A partitioned instance without a node
+// list has none.
+void chooseReferenceService(ServicesStep &step) {
+  if (!step.partitioned())
+    ossSnprintf(step.referenceService, sizeof step.referenceService, "%s", step.instanceName);
+  else if (const unsigned char *entry = firstNode(step.context))
+    partitionServiceName(step, entry, step.referenceService);
+}
+
+int32_t readStartType(ServicesStep &step) {
+  if (step.referenceService[0] == '\0')
+    return 0;
+  SQLO_SVC_CONFIG config{};
+  SQLO_SVC_OUT out{};
+  if (sqloQueryNTServiceConfig(step.referenceService, nullptr, &config, &out) != 0)
+    return traced(kProbeServiceConfig, SERVICES_RC_NO_SERVICE_CONFIG);
+  step.context.serviceStartType = config.startType;
+  return 0;
+}
+
+int32_t recreateInstance(ServicesStep &step, int32_t newNodeType, uint32_t workstationFlag) {
+  UpgradeOptions &options = step.options;
+  options.partitionRecord.serviceStepFlag = 1;
+  int32_t rc = upgradeInstanceEnvironment(step.instanceName, options.profilePath, options.currentInstallPath,
+                                          step.account(), step.password(), step.context.nodeType,
+                                          static_cast<uint32_t>(newNodeType), &options.partitionRecord,
+                                          &options.status, 1, workstationFlag);
+  return rc == 0 ? 0 : traced(kProbeEnvironment, rc);
+}
+
+// ---- partitioned instance -----------------------------------------------------
+
+int32_t restoreNodesFile(ServicesStep &step) {
+  int32_t rc = sqlocopy(step.savedNodesFile, step.nodesFile, 0);
+  if (!isCopied(rc))
+    return traced(kProbeRestoreNodes, rc);
+  sqlodelete(step.savedNodesFile, 0);
+  return 0;
+}
+
+int32_t findLocalHost(ServicesStep &step) {
+  char *host = step.localHost;
+  if (sqloPdbTcpIpGetFullHostName(host, kFullHostName) != 0) {
+    host[0] = '\0';
+    sqlcaSetCode(step.options.status, SERVICES_SQLCODE_HOST);
+    return traced(kProbeHostName, UPGRADE_RC_SQLCA);
+  }
+  host[SQLO_HOSTNAME_SZ - 1] = '\0';
+  return 0;
+}
+
+bool isLocalHost(const ServicesStep &step, const unsigned char *entry) {
+  return sqlomcpi(sqloNodeHost(entry), step.localHost, SQLO_HOSTNAME_SZ) == 0;
+}
+
+// The extender service of a partition; an existing one is changed instead.
+void registerExtender(const ServicesStep &step, const unsigned char *entry, const ServiceChange &partition,
+                      const char *program) {
+  char service[kExtenderNameSize], display[kDisplayNameSize];
+  ossSnprintf(service, sizeof service, "KXLEXT - %s", partition.service);
+  ossSnprintf(display, sizeof display, "KXLEXT - %s - %s-%d", step.copyName, step.instanceName,
+              sqloNodeNumber(entry));
+  SQLO_SVC_OUT out{};
+  int32_t rc = sqloRegisterNTService(partition.machine, service, display, 0, program, 0, partition.account,
+                                     partition.password, kMessageLibrary, &out);
+  if (rc != SQLO_RC_SVC_EXISTS)
+    return;
+  ServiceChange change = partition;
+  change.service = service;
+  change.program = partition.startType == kDisabled ? nullptr : program;
+  change.displayName = display;
+  changeService(change);
+}
+
+// Points one partition's services at the current copy's programs (the program
+// paths given), or leaves a forced partition disabled on its old program.
+void repointPartitionServices(const ServicesStep &step, const unsigned char *entry, const char *machine,
+                              const ProgramPaths &paths, bool forced) {
+  char service[kServiceNameSize], display[kDisplayNameSize];
+  partitionServiceName(step, entry, service);
+  ossSnprintf(display, sizeof display, "KXL - %s - %s-%d", step.copyName, step.instanceName,
+              sqloNodeNumber(entry));
+  ServiceChange change;
+  change.service = service;
+  change.machine = machine;
+  change.startType = forced ? kDisabled : step.context.serviceStartType;
+  change.program = forced ? nullptr : paths.server;
+  change.account = step.account();
+  change.password = step.password();
+  change.displayName = display;
+  changeService(change);
+  if (step.flag(UPGRADE_FLAG_CONTENT_EXTENDER))
+    registerExtender(step, entry, change, paths.extender);
+}
+
+int32_t repointPartition(ServicesStep &step, const unsigned char *entry) {
+  bool localHost = isLocalHost(step, entry);
+  if (localHost && sqloNodePort(entry) == 0) {
+    char service[kServiceNameSize];
+    partitionServiceName(step, entry, service);
+    restoreStartType(step, service);
+    return 0;
+  }
+  ProgramPaths paths;
+  programPaths(step.options.currentInstallPath, paths);
+  bool forceCopyName = step.flag(UPGRADE_FLAG_FORCE_COPY_NAME);
+  if (!forceCopyName && !localHost) {
+    int32_t rc = openMachine(step, sqloNodeMachine(entry), kProbePartitionMachine);
+    if (rc != 0)
+      return rc;
+    machineProgramPaths(step.machine->hklm, step.copyName, paths);
+  }
+  repointPartitionServices(step, entry, sqloNodeMachine(entry), paths, forceCopyName && !localHost);
+  return 0;
+}
+
+template <class Visit> int32_t forEachNode(const ServicesStep &step, Visit visit) {
+  const unsigned char *entry = firstNode(step.context);
+  int32_t count = entry != nullptr ? sqloNodeListCount(step.context.nodeList) : 0;
+  for (int32_t i = 0; i < count; ++i, entry = sqloNodeNext(entry)) {
+    int32_t rc = visit(entry);
+    if (rc != 0)
+      return rc;
+  }
+  return 0;
+}
+
+// Every partition's service on one machine of the cluster, then the cluster
+// profile there.
+int32_t repointClusterMachine(ServicesStep &step, const char *machine) {
+  int32_t rc = openMachine(step, machine, kProbeClusterMachine);
+  if (rc != 0)
+    return rc;
+  bool forceCopyName = step.flag(UPGRADE_FLAG_FORCE_COPY_NAME);
+  ProgramPaths paths;
+  programPaths(step.options.currentInstallPath, paths);
+  if (!forceCopyName)
+    machineProgramPaths(step.machine->hklm, step.copyName, paths);
+  forEachNode(step, [&](const unsigned char *entry) {
+    repointPartitionServices(step, entry, machine, paths, forceCopyName);
+    return 0;
+  });
+  writeMachineClusterValues(step);
+  return 0;
+}
+
+int32_t repointPartitions(ServicesStep &step) {
+  int32_t rc = restoreNodesFile(step);
+  if (rc == 0)
+    rc = findLocalHost(step);
+  if (rc != 0)
+    return rc;
+  if (step.clustered())
+    return forEachClusterMachine(step,
+                                 [&](const char *machine) { return repointClusterMachine(step, machine); });
+  return forEachNode(step, [&](const unsigned char *entry) { return repointPartition(step, entry); });
+}
+
+// ---- single service -------------------------------------------------------------
+
+// The instance's service on another machine of its cluster.
+int32_t repointClusterNode(ServicesStep &step, const char *machine) {
+  int32_t rc = openMachine(step, machine, kProbeSingleMachine);
+  if (rc != 0)
+    return rc;
+  writeMachineClusterValues(step);
+  ProgramPaths paths;
+  programPaths(step.options.currentInstallPath, paths);
+  machineProgramPaths(step.machine->hklm, step.copyName, paths);
+  char display[kDisplayNameSize];
+  ossSnprintf(display, sizeof display, "KXL - %s - %s", step.copyName, step.instanceName);
+  ServiceChange change;
+  change.service = step.instanceName;
+  change.machine = machine;
+  change.startType = step.context.serviceStartType;
+  change.program = paths.server;
+  change.displayName = display;
+  changeService(change);
+  return 0;
+}
+
+int32_t repointSingleService(ServicesStep &step) {
+  if (step.referenceService[0] != '\0')
+    restoreStartType(step, step.referenceService);
+  if (!step.clustered())
+    return 0;
+  char local[SQLO_COMPUTERNAME_SZ] = {};
+  uint32_t size = sizeof local;
+  if (sqloGetComputerNameA(local, &size) == 0) {
+    // Without the local name every machine is reached through its registry,
+    // this one included; the services are changed all the same.
+    local[0] = '\0';
+    pdLog(PD_LEVEL_WARNING, KXL_FN_UPGRADE_INSTANCE_SERVICES, 200, 0, "local computer name unknown");
+  }
+  local[sizeof local - 1] = '\0';
+  return forEachClusterMachine(step, [&](const char *machine) {
+    if (local[0] != '\0' && sqlomcpi(machine, local, SQLO_COMPUTERNAME_SZ) == 0) {
+      writeClusterValues(step.cluster.key, step.cluster);
+      return 0;
+    }
+    return repointClusterNode(step, machine);
+  });
+}
+
+int32_t runServicesStep(ServicesStep &step) {
+  UpgradeContext &context = step.context;
+  uint32_t workstationFlag = workstationProfileFlag();
+  int32_t newNodeType = chooseNodeType(context, step.options, context.nodeType);
+  prepareEnvironment(step);
+  ossSnprintf(step.instanceName, sizeof step.instanceName, "%s", step.options.instanceName);
+  int32_t rc = step.clustered() ? readClusterProfile(step) : 0;
+  if (rc == 0 && step.partitioned())
+    rc = saveNodesFile(step);
+  if (rc != 0)
+    return rc;
+  chooseReferenceService(step);
+  if (context.nodeType != 2 && (rc = readStartType(step)) != 0)
+    return rc;
+  if ((rc = recreateInstance(step, newNodeType, workstationFlag)) != 0)
+    return rc;
+  sqloGetCurrentInstallationName(step.copyName, sizeof step.copyName);
+  if (newNodeType == 4 && step.partitioned())
+    return repointPartitions(step);
+  if (newNodeType == 2)
+    return 0;
+  return repointSingleService(step);
+}
+
+} // namespace
+
+int32_t upgradeInstanceServices(UpgradeContext &context, UpgradeOptions &options) {
+  pdtEntry(KXL_FN_UPGRADE_INSTANCE_SERVICES);
+  ServicesStep step(context, options);
+  int32_t rc = runServicesStep(step);
+  if (step.cluster.key != nullptr)
+    RegCloseKey(step.cluster.key);
+  sqloPRegMachineClose(&step.machine);
+  pdtExit(KXL_FN_UPGRADE_INSTANCE_SERVICES, rc, 0);
+  return rc;
+}
