@@ -143,6 +143,15 @@ bool validPathParam(const OSSPathParam *param) {
 }
 
 } // namespace
+
+int32_t removeDirectoryTree(const std::string &path) {
+  if (isRootPath(path))
+    return SQLO_RC_INVALID_ARGUMENT;
+  if (!isDirectoryPath(path))
+    return SQLO_RC_PATH_NOT_FOUND;
+  return deleteTree(path, 0);
+}
+
 } // namespace kxlprod
 
 using namespace kxlprod;
@@ -277,13 +286,8 @@ int32_t sqlodeletedir(const char *path) {
     return SQLO_RC_IO_ERROR;
   if (path == nullptr)
     return SQLO_RC_INVALID_ARGUMENT;
-  std::string dir = unquotedPath(path);
   // A whole drive or share is never removed.
-  if (isRootPath(dir))
-    return SQLO_RC_INVALID_ARGUMENT;
-  if (!isDirectoryPath(dir))
-    return SQLO_RC_PATH_NOT_FOUND;
-  return deleteTree(dir, 0);
+  return removeDirectoryTree(unquotedPath(path));
 }
 
 uint32_t ossPathTest(OSSPathParam *param) {

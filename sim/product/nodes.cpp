@@ -3,6 +3,7 @@
 //   <node number> <host name> <machine name> <logical port> [<network name>]
 // separated by blanks or tabs; the network name becomes the entry's second
 // name, the third name stays empty.
+#include "sim/product/nodes.h"
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
 #include "sim/product/simstate.h"
@@ -20,11 +21,7 @@ constexpr size_t kMaxNodesFileBytes = 1 << 20;
 constexpr size_t kMaxNameBytes = 255; // a name length must fit its byte
 constexpr uint32_t kLargestPort = 999;
 
-struct NodeLine {
-  int32_t number = 0;
-  uint32_t port = 0;
-  std::string host, netName, machine;
-};
+using kxlprod::NodeLine;
 
 bool parseNumber(const std::string &text, uint32_t largest, uint32_t &value) {
   if (text.empty() || text.size() > 9)
@@ -100,8 +97,10 @@ void writeEntry(unsigned char *entry, const NodeLine &node) {
   std::memcpy(names, node.machine.data(), node.machine.size());
 }
 
+} // namespace
+
 // Builds the block (std::malloc'ed, zero-filled); null when out of memory.
-SQLO_NODELIST *buildList(const std::vector<NodeLine> &nodes, uint32_t &maxNode) {
+SQLO_NODELIST *kxlprod::buildNodeList(const std::vector<NodeLine> &nodes, uint32_t &maxNode) {
   maxNode = 0;
   for (const NodeLine &node : nodes)
     maxNode = node.number > static_cast<int32_t>(maxNode) ? static_cast<uint32_t>(node.number) : maxNode;
@@ -127,7 +126,15 @@ SQLO_NODELIST *buildList(const std::vector<NodeLine> &nodes, uint32_t &maxNode) 
   return reinterpret_cast<SQLO_NODELIST *>(block);
 }
 
-} // namespace
+int32_t kxlprod::readNodesFile(const std::string &path, std::vector<NodeLine> &nodes) {
+  std::string text;
+  LONG rc = kxlprod::readSmallTextFile(path, kMaxNodesFileBytes, text);
+  if (rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND)
+    return SQLO_RC_FILE_NOT_FOUND_W;
+  if (rc != ERROR_SUCCESS)
+    return SQLO_RC_IO_ERROR;
+  return parseNodes(text, nodes) ? 0 : SQLO_RC_INVALID_ARGUMENT;
+}
 
 extern "C" {
 
@@ -141,17 +148,12 @@ int32_t sqloReadKxlnodes(const char *path, uint32_t, SQLO_NODELIST **list, uint3
     return SQLO_RC_IO_ERROR;
   if (path == nullptr || path[0] == '\0')
     return SQLO_RC_INVALID_ARGUMENT;
-  std::string text;
-  LONG rc = kxlprod::readSmallTextFile(path, kMaxNodesFileBytes, text);
-  if (rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND)
-    return SQLO_RC_FILE_NOT_FOUND_W;
-  if (rc != ERROR_SUCCESS)
-    return SQLO_RC_IO_ERROR;
   std::vector<NodeLine> nodes;
-  if (!parseNodes(text, nodes))
-    return SQLO_RC_INVALID_ARGUMENT;
+  int32_t rc = kxlprod::readNodesFile(path, nodes);
+  if (rc != 0)
+    return rc;
   uint32_t highest = 0;
-  *list = buildList(nodes, highest);
+  *list = kxlprod::buildNodeList(nodes, highest);
   if (*list == nullptr)
     return SQLO_RC_NO_MEMORY;
   if (entryCount != nullptr)

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <string>
 #include <string_view>
 
@@ -31,6 +32,9 @@ bool isDirectoryPath(const std::string &path);
 // Creates the directory and, when `parents` is set, every missing directory
 // above it. True when it exists as a directory afterwards.
 bool createDirectoryTree(const std::string &path, bool parents);
+
+// Removes a directory with everything in it (never a root); 0 or a library code.
+int32_t removeDirectoryTree(const std::string &path);
 
 // Installation path of the current installation, without a trailing
 // backslash. False when it cannot be found.

@@ -1,0 +1,167 @@
+#include "sim/product/simstore.h"
+
+#include "sim/product/installation.h"
+#include "sim/product/regutil.h"
+#include "sim/product/simstate.h"
+
+#include <cstring>
+
+namespace kxlprod {
+
+namespace {
+
+constexpr size_t kMaxSnapshotValueBytes = 64 * 1024;
+
+class KeyHandle {
+public:
+  KeyHandle() = default;
+  KeyHandle(const KeyHandle &) = delete;
+  KeyHandle &operator=(const KeyHandle &) = delete;
+  ~KeyHandle() {
+    if (key_ != nullptr)
+      RegCloseKey(key_);
+  }
+  HKEY *out() { return &key_; }
+  HKEY get() const { return key_; }
+
+private:
+  HKEY key_ = nullptr;
+};
+
+// The value at `index`; false at the end of the key or on an error.
+bool enumValue(HKEY key, DWORD index, KeySnapshot::Value &value) {
+  char name[16384];
+  DWORD nameSize = sizeof name;
+  std::vector<uint8_t> data(kMaxSnapshotValueBytes);
+  DWORD dataSize = static_cast<DWORD>(data.size());
+  DWORD type = REG_NONE;
+  if (RegEnumValueA(key, index, name, &nameSize, nullptr, &type, data.data(), &dataSize) != ERROR_SUCCESS)
+    return false;
+  value.name.assign(name, nameSize < sizeof name ? nameSize : sizeof name - 1);
+  value.type = type;
+  data.resize(dataSize < data.size() ? dataSize : data.size());
+  value.data = std::move(data);
+  return true;
+}
+
+bool inSnapshot(const KeySnapshot &snapshot, const std::string &name) {
+  for (const KeySnapshot::Value &value : snapshot.values)
+    if (sameName(value.name, name))
+      return true;
+  return false;
+}
+
+} // namespace
+
+bool machineKeyPrefix(const char *machine, std::string &prefix) {
+  prefix.clear();
+  if (machine == nullptr || machine[0] == '\0' || sameName(machine, identityComputerName()))
+    return true;
+  if (std::strlen(machine) >= 16)
+    return false;
+  std::string key = std::string(kSimRoot) + "\\Machines\\" + machine;
+  if (!regKeyExists(HKEY_LOCAL_MACHINE, key))
+    return false;
+  prefix = key + "\\";
+  return true;
+}
+
+std::string serviceKeyPath(const std::string &machinePrefix, const std::string &service) {
+  return machinePrefix + kSimRoot + "\\Services\\" + service;
+}
+
+std::string instanceRegistryKey(const std::string &instance) {
+  return std::string(kSimRoot) + "\\Instances\\" + instance;
+}
+
+bool readInstanceEntry(const std::string &instance, std::string &directory, std::string &copy) {
+  if (instance.empty())
+    return false;
+  std::string key = instanceRegistryKey(instance);
+  if (readRegString(HKEY_LOCAL_MACHINE, key, "Directory", directory) != ERROR_SUCCESS)
+    return false;
+  copy.clear();
+  readRegString(HKEY_LOCAL_MACHINE, key, "Copy", copy);
+  return true;
+}
+
+std::string processInstance() {
+  char buffer[256];
+  DWORD length = GetEnvironmentVariableA("KXLINSTANCE", buffer, sizeof buffer);
+  if (length == 0 || length >= sizeof buffer)
+    return std::string();
+  return std::string(buffer, length);
+}
+
+bool identityString(const char *name, std::string &value) {
+  return readRegString(HKEY_LOCAL_MACHINE, kIdentityKey, name, value) == ERROR_SUCCESS;
+}
+
+std::string identityComputerName() {
+  std::string name;
+  identityString("ComputerName", name);
+  return name;
+}
+
+LONG writeRegDword(HKEY root, const std::string &path, const char *name, DWORD value) {
+  KeyHandle key;
+  LONG rc = RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_SET_VALUE, nullptr,
+                            key.out(), nullptr);
+  if (rc != ERROR_SUCCESS)
+    return rc;
+  return RegSetValueExA(key.get(), name, 0, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
+}
+
+LONG readWholeFile(const std::string &windowsPath, size_t maxBytes, std::vector<uint8_t> &data) {
+  std::string text;
+  LONG rc = readSmallTextFile(windowsPath, maxBytes, text);
+  if (rc == ERROR_SUCCESS)
+    data.assign(text.begin(), text.end());
+  return rc;
+}
+
+LONG writeWholeFile(const std::string &windowsPath, const std::vector<uint8_t> &data) {
+  HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS,
+                            FILE_ATTRIBUTE_NORMAL, nullptr);
+  if (file == INVALID_HANDLE_VALUE)
+    return static_cast<LONG>(GetLastError());
+  DWORD written = 0;
+  BOOL ok = data.empty() || WriteFile(file, data.data(), static_cast<DWORD>(data.size()), &written, nullptr);
+  LONG rc = ok && written == data.size() ? ERROR_SUCCESS : static_cast<LONG>(GetLastError());
+  if (rc == ERROR_SUCCESS && !ok)
+    rc = ERROR_WRITE_FAULT;
+  CloseHandle(file);
+  return rc;
+}
+
+KeySnapshot takeKeySnapshot(HKEY root, const std::string &path) {
+  KeySnapshot snapshot;
+  KeyHandle key;
+  if (RegOpenKeyExA(root, path.c_str(), 0, KEY_QUERY_VALUE, key.out()) != ERROR_SUCCESS)
+    return snapshot;
+  snapshot.existed = true;
+  KeySnapshot::Value value;
+  for (DWORD index = 0; enumValue(key.get(), index, value); ++index)
+    snapshot.values.push_back(value);
+  return snapshot;
+}
+
+void restoreKeySnapshot(HKEY root, const std::string &path, const KeySnapshot &snapshot) {
+  if (!snapshot.existed) {
+    SHDeleteKeyA(root, path.c_str());
+    return;
+  }
+  KeySnapshot now = takeKeySnapshot(root, path);
+  KeyHandle key;
+  if (RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_ALL_ACCESS, nullptr,
+                      key.out(), nullptr) != ERROR_SUCCESS)
+    return;
+  for (const KeySnapshot::Value &value : now.values)
+    if (!inSnapshot(snapshot, value.name))
+      RegDeleteValueA(key.get(), value.name.c_str());
+  for (const KeySnapshot::Value &value : snapshot.values)
+    RegSetValueExA(key.get(), value.name.c_str(), 0, value.type, value.data.data(),
+                   static_cast<DWORD>(value.data.size()));
+}
+
+} // namespace kxlprod
