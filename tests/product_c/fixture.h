@@ -31,6 +31,12 @@ protected:
     ASSERT_TRUE(ok);
   }
 
+  // The "State" of a service of this machine ("") or of another one.
+  static void setServiceState(const std::string &machine, const std::string &name, DWORD state) {
+    std::string prefix = machine.empty() ? "" : "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + machine + "\\";
+    setDword(prefix + "SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name, "State", state);
+  }
+
   static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
 };
 

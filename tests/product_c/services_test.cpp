@@ -11,10 +11,6 @@ protected:
     SimWorld::SetUp();
     setString(kIdentity, "ComputerName", "WINSRV1");
   }
-  static void service(const std::string &machine, const std::string &name, DWORD state) {
-    std::string prefix = machine.empty() ? "" : "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + machine + "\\";
-    setDword(prefix + "SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name, "State", state);
-  }
 };
 
 TEST_F(ServicesTest, StatesMapToTheirCodes) {
@@ -24,10 +20,10 @@ TEST_F(ServicesTest, StatesMapToTheirCodes) {
                                               {3, SQLO_RC_SVC_STOP_PENDING}, {4, SQLO_RC_SVC_RUNNING},
                                               {7, SQLO_RC_SVC_PAUSED},       {99, SQLO_RC_SYSTEM_ERROR}};
   for (const auto &[state, code] : states) {
-    service("", "INST1", state);
+    setServiceState("", "INST1", state);
     EXPECT_EQ(code, sqloQueryKXLService("INST1", &out, nullptr)) << state;
   }
-  service("", "INST1", 4);
+  setServiceState("", "INST1", 4);
   EXPECT_EQ(SQLO_RC_SVC_RUNNING, sqloQueryKXLService("inst1", &out, "winsrv1"))
       << "the local computer by name, any case";
   EXPECT_EQ(out.serviceState, 4u);
@@ -38,8 +34,8 @@ TEST_F(ServicesTest, StatesMapToTheirCodes) {
 TEST_F(ServicesTest, OtherMachinesAnswerFromTheirOwnRegistry) {
   SQLO_SVC_OUT out{};
   EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE, sqloQueryKXLService("INST2-1", &out, "WINSRV2"));
-  service("WINSRV2", "INST2-1", 4);
-  service("", "INST2-1", 1);
+  setServiceState("WINSRV2", "INST2-1", 4);
+  setServiceState("", "INST2-1", 1);
   EXPECT_EQ(SQLO_RC_SVC_RUNNING, sqloQueryKXLService("INST2-1", &out, "WINSRV2"));
   EXPECT_EQ(SQLO_RC_SVC_STOPPED, sqloQueryKXLService("INST2-1", &out, nullptr));
   EXPECT_EQ(SQLO_RC_SVC_NOT_FOUND, sqloQueryKXLService("INST2-9", &out, "WINSRV2"));

@@ -2,42 +2,21 @@
 #include "NT/instfiles.h"
 #include "engn/sqo/checks.h"
 #include "engn/sqo/run.h"
-#include "world_fixture.h"
+#include "fixture.h"
 
 #include <cstdio>
 #include <string>
 
 namespace {
 
-class InstanceChecksTest : public kxltest::ProductWorld {
+class InstanceChecksTest : public kxltest::SimWorld {
 protected:
   void SetUp() override {
-    ProductWorld::SetUp();
+    SimWorld::SetUp();
     setString(kIdentity, "ComputerName", "WINSRV1");
     std::memset(&options, 0, sizeof options);
     std::snprintf(options.instanceName, sizeof options.instanceName, "%s", "INST2");
     std::snprintf(options.currentInstallPath, sizeof options.currentInstallPath, "%s", "C:\\KXL101");
-  }
-
-  static void setDword(const std::string &path, const char *name, DWORD value) {
-    HKEY key = nullptr;
-    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS,
-                                             nullptr, &key, nullptr));
-    RegSetValueExA(key, name, 0, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
-    RegCloseKey(key);
-  }
-  static void service(const std::string &machine, const std::string &name, DWORD state) {
-    std::string prefix = machine.empty() ? "" : "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + machine + "\\";
-    setDword(prefix + "SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name, "State", state);
-  }
-  static void writeFile(const std::string &path, const std::string &text) {
-    makeDirectories(path.substr(0, path.find_last_of('\\')));
-    HANDLE file =
-        CreateFileA(path.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS, FILE_ATTRIBUTE_NORMAL, nullptr);
-    ASSERT_NE(file, INVALID_HANDLE_VALUE);
-    DWORD written = 0;
-    WriteFile(file, text.data(), static_cast<DWORD>(text.size()), &written, nullptr);
-    CloseHandle(file);
   }
 
   // A partitioned instance over three partitions: 0 here, 1 and 2 on WINSRV2.
@@ -45,13 +24,12 @@ protected:
     writeFile("C:\\P\\INST2\\kxlnodes.cfg",
               "0 winsrv1 WINSRV1 0\r\n1 winsrv2 WINSRV2 0\r\n2 winsrv2 WINSRV2 1\r\n");
     for (const char *name : {"INST2-1", "INST2-2"})
-      service("WINSRV2", name, 1);
-    service("", "INST2-0", 1);
+      setServiceState("WINSRV2", name, 1);
+    setServiceState("", "INST2-0", 1);
     options.partitionedInstance = 1;
     context.instance = &instance;
   }
 
-  static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
   UpgradeOptions options;
   UpgradeContext context;
   IKXLINSTANCE instance{"INST2", nullptr, "C:\\P\\INST2"};
@@ -59,13 +37,13 @@ protected:
 
 TEST_F(InstanceChecksTest, SinglePartitionInstanceIsActiveOnlyWhileItsServiceRuns) {
   EXPECT_FALSE(isInstanceActive(context, options)) << "no service at all";
-  service("", "INST2", 1);
+  setServiceState("", "INST2", 1);
   EXPECT_FALSE(isInstanceActive(context, options));
   for (DWORD state : {2u, 4u, 7u}) {
-    service("", "INST2", state);
+    setServiceState("", "INST2", state);
     EXPECT_TRUE(isInstanceActive(context, options)) << state;
   }
-  service("", "INST2", 3);
+  setServiceState("", "INST2", 3);
   EXPECT_FALSE(isInstanceActive(context, options)) << "stopping counts as not active";
 }
 
@@ -75,15 +53,15 @@ TEST_F(InstanceChecksTest, PartitionedInstanceAsksEveryPartitionOnItsMachine) {
   ASSERT_NE(context.nodeList, nullptr);
   EXPECT_EQ(sqloNodeListCount(context.nodeList), 3);
 
-  service("", "INST2-1", 4); // a service of that name on the wrong machine
+  setServiceState("", "INST2-1", 4); // a service of that name on the wrong machine
   EXPECT_FALSE(isInstanceActive(context, options));
-  service("WINSRV2", "INST2-1", 4);
+  setServiceState("WINSRV2", "INST2-1", 4);
   EXPECT_TRUE(isInstanceActive(context, options));
 }
 
 TEST_F(InstanceChecksTest, PartitionedInstanceWithoutNodesFileIsNotActive) {
   partitionedInstance();
-  service("WINSRV2", "INST2-1", 4);
+  setServiceState("WINSRV2", "INST2-1", 4);
   DeleteFileA("C:\\P\\INST2\\kxlnodes.cfg");
   EXPECT_FALSE(isInstanceActive(context, options));
   EXPECT_EQ(context.nodeList, nullptr);

@@ -29,13 +29,7 @@ TEST_F(CheckScenario, UnknownInstanceNamesItself) {
 // current copy is reported as such only by a current copy below 9.7.
 TEST_F(CheckScenario, InstanceOfTheCurrentCopyIsLeftAlone) {
   setCopyLevel("KXL101", 9, 6);
-  kxlsim::InstanceSpec inst;
-  inst.name = "NEWINST";
-  inst.copy = "KXL101";
-  inst.directory = std::string(kCurrentCopy) + "\\NEWINST";
-  inst.version = 10;
-  inst.release = 1;
-  kxlsim::addInstance(world, inst);
+  addInstance("NEWINST", "KXL101", std::string(kCurrentCopy) + "\\NEWINST", 10, 1);
   RunResult r = run({"NEWINST"});
   EXPECT_EQ(r.out, kxltest::alreadyUpgradedText("NEWINST"));
   EXPECT_EQ(r.result, 1950);

@@ -71,15 +71,8 @@ TEST_F(OutcomeScenario, ProfilePathRules) {
 }
 
 TEST_F(OutcomeScenario, InstanceOnANetworkShareKeepsItsPath) {
-  kxlsim::InstanceSpec inst;
   addShare("FILER", "KXLPROF");
-  inst.name = "SHARED";
-  inst.copy = "KXL95";
-  inst.directory = "\\\\FILER\\KXLPROF\\SHARED";
-  inst.version = 9;
-  inst.release = 5;
-  kxlsim::addInstance(world, inst);
-  ASSERT_TRUE(world.ok());
+  addInstance("SHARED", "KXL95", "\\\\FILER\\KXLPROF\\SHARED", 9, 5);
   RunResult r = run({"SHARED"});
   EXPECT_EQ(r.out, kxltest::kSuccessText);
   EXPECT_TRUE(has(handedOver(r), "profile", "\\\\\\\\FILER\\\\KXLPROF")) << handedOver(r);
@@ -99,13 +92,7 @@ TEST_F(OutcomeScenario, VersionsThatMayBeUpgraded) {
 }
 
 TEST_F(OutcomeScenario, InstallerModeGoesOnWithAnInstanceOfTheCurrentCopy) {
-  kxlsim::InstanceSpec inst;
-  inst.name = "NEWINST";
-  inst.copy = "KXL101";
-  inst.directory = std::string(kCurrentCopy) + "\\NEWINST";
-  inst.version = 10;
-  inst.release = 1;
-  kxlsim::addInstance(world, inst);
+  addInstance("NEWINST", "KXL101", std::string(kCurrentCopy) + "\\NEWINST", 10, 1);
   RunResult r = run({"-install", "NEWINST"});
   EXPECT_EQ(r.out, kxltest::kSuccessText);
   EXPECT_EQ(r.result, 0);

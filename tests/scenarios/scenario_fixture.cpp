@@ -137,6 +137,18 @@ void ScenarioTest::removeCatalogs() {
     fs::remove_all(hostPath(std::string(copy) + "\\msg"));
 }
 
+void ScenarioTest::addInstance(const std::string &name, const std::string &copy, const std::string &directory,
+                               int version, int release) {
+  kxlsim::InstanceSpec inst;
+  inst.name = name;
+  inst.copy = copy;
+  inst.directory = directory;
+  inst.version = version;
+  inst.release = release;
+  kxlsim::addInstance(world, inst);
+  ASSERT_TRUE(world.ok());
+}
+
 void ScenarioTest::addShare(const std::string &server, const std::string &share) {
   std::error_code ec;
   fs::create_directories(root_ + "/unc/" + server + "/" + share, ec);

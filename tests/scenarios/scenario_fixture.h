@@ -48,6 +48,9 @@ protected:
   void installCommandAs(const std::string &program);
   // Removes the message catalogs of every copy.
   void removeCatalogs();
+  // Registers an instance of `copy` (at version.release) in `directory`.
+  void addInstance(const std::string &name, const std::string &copy, const std::string &directory,
+                   int version, int release);
   // Makes \\server\share reachable.
   void addShare(const std::string &server, const std::string &share);
   // Host path of a Windows path on drive C:.
