@@ -1,6 +1,7 @@
 #include "engn/sqo/checks.h"
 
 #include "NT/instfiles.h"
+#include "NT/kxliutil.h"
 #include "engn/sqo/boundedtext.h"
 #include "engn/sqo/installswitch.h"
 #include "engn/sqo/messages.h"

@@ -12,7 +12,6 @@ inline constexpr uint32_t KXL_FN_CHECK_LOCAL_ADMIN = 0x187805C0u;
 inline constexpr uint32_t KXL_FN_RUN_DATABASE_CHECK = 0x187805C1u;
 inline constexpr uint32_t KXL_FN_FIND_ODBC_SOURCES = 0x187805C2u;
 
-inline constexpr int32_t UPGRADE_RC_INSTANCE_ACTIVE = -1953;
 inline constexpr int32_t UPGRADE_RC_CHECK_PROBLEMS = -1205;
 inline constexpr int32_t UPGRADE_RC_CHECK_FAILED = -1069;
 inline constexpr int32_t UPGRADE_ODBC_NOT_AVAILABLE = 1168;
