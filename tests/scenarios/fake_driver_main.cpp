@@ -14,12 +14,12 @@
 namespace {
 
 long driverSetting(const char *name) {
-  const char *spec = std::getenv("KXLTEST_DRIVER");
-  if (spec == nullptr)
+  const char *settings = std::getenv("KXLTEST_DRIVER");
+  if (settings == nullptr)
     return 0;
   std::string key = std::string(name) + "=";
-  for (const char *at = spec; (at = std::strstr(at, key.c_str())) != nullptr; ++at)
-    if (at == spec || at[-1] == ',')
+  for (const char *at = settings; (at = std::strstr(at, key.c_str())) != nullptr; ++at)
+    if (at == settings || at[-1] == ',')
       return std::strtol(at + key.size(), nullptr, 10);
   return 0;
 }

@@ -20,9 +20,9 @@ protected:
     ScenarioTest::SetUp();
     useStandInDriver();
   }
-  static RunSetup driverSays(const std::string &spec) {
+  static RunSetup driverSays(const std::string &settings) {
     RunSetup setup;
-    setup.driver = spec;
+    setup.driver = settings;
     return setup;
   }
   // The one "fake_driver" event of the run.
