@@ -1,0 +1,182 @@
+// Moving INST1's profile key to the current copy: single machine, partitions,
+// the force-copy-name mode and cluster machines, with the failures of each.
+#include "profile_world.h"
+
+namespace {
+
+using kxltest::ProfileWorld;
+
+class MoveProfile : public ProfileWorld {};
+
+TEST_F(MoveProfile, Version8SingleCopyKeyMovesAndIsDeleted) {
+  ownBy(KXLI_V8_COPY_NAME);
+  seedProfile(kLocal, kV8);
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  expectMoved(kLocal, kV8, kCurrent);
+}
+
+TEST_F(MoveProfile, NamedCopyKeyMovesWithValuesAndSubkeysOnly) {
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  setString(std::string(kRoot) + "\\InstalledCopies\\KXL95\\PROFILES\\INST2", "KXLMARK", "other");
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  expectMoved(kLocal, kOld, kCurrent);
+  EXPECT_EQ("other", getString(std::string(kRoot) + "\\InstalledCopies\\KXL95\\PROFILES\\INST2", "KXLMARK"));
+}
+
+TEST_F(MoveProfile, InstanceOfTheCurrentCopyStaysWhereItIs) {
+  ownBy(kCurrent);
+  seedProfile(kLocal, kCurrent);
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  expectProfileAt(kLocal, kCurrent);
+}
+
+TEST_F(MoveProfile, FailedCopyKeepsOldKeyAndLeavesNewKeyEmpty) {
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  startTrace();
+  failCalls("SHCopyKeyA:1");
+  EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+  expectProfileAt(kLocal, kOld);
+  EXPECT_TRUE(keyExists(profile(kCurrent)));
+  EXPECT_EQ("<missing>", getString(profile(kCurrent), "KXLMARK"));
+  EXPECT_FALSE(keyExists(profile(kCurrent) + "\\Node0"));
+  std::string trace = traceText();
+  EXPECT_NE(std::string::npos, trace.find("error 0x18780506 probe=110 rc=-1918"));
+  EXPECT_NE(std::string::npos, trace.find("error 0x18780506 probe=30 rc=-1918"));
+  EXPECT_NE(std::string::npos, trace.find("exit 0x18780506 rc=-1918"));
+}
+
+TEST_F(MoveProfile, NewKeyThatCannotBeCreatedChangesNothing) {
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  startTrace();
+  failCalls("RegCreateKeyExA:1");
+  EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+  expectUntouched(kLocal, kOld, kCurrent);
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=100 rc=-1918"));
+}
+
+// Without the owning copy's version the old key is unknown: nothing is moved.
+TEST_F(MoveProfile, OwnerWithoutVersionIsRefused) {
+  registerCopy("KXLNOVER", "C:\\KXLNOVER");
+  ownBy("KXLNOVER");
+  seedProfile(kLocal, kV8);
+  EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+  expectUntouched(kLocal, kV8, kCurrent);
+}
+
+TEST_F(MoveProfile, PartitionsSharingAMachineMoveItsKeyOnce) {
+  ownBy(kOld);
+  addMachine("M2");
+  seedProfile(kLocal, kOld);
+  seedProfile("M2", kOld);
+  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostb.zav.test M2 1\n");
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  expectMoved(kLocal, kOld, kCurrent);
+  expectMoved("M2", kOld, kCurrent);
+}
+
+TEST_F(MoveProfile, PartitionedWithoutNodeListHasNothingToMove) {
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  options_.partitionedInstance = 1;
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  expectUntouched(kLocal, kOld, kCurrent);
+}
+
+TEST_F(MoveProfile, ForceCopyNameGivesOtherHostsAnEmptyPlaceholder) {
+  ownBy(kOld);
+  addMachine("M2");
+  seedProfile(kLocal, kOld);
+  seedProfile("M2", kOld);
+  options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
+  loadNodes("0 HOSTA.ZAV.TEST HOSTA 0\n1 hostb.zav.test M2 0\n");
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  expectMoved(kLocal, kOld, kCurrent);
+  EXPECT_FALSE(keyExists(forceProfile()));
+  EXPECT_FALSE(keyExists(at("M2", profile(kOld))));
+  EXPECT_FALSE(keyExists(at("M2", profile(kCurrent))));
+  EXPECT_TRUE(keyExists(at("M2", forceProfile())));
+  EXPECT_EQ("<missing>", getString(at("M2", forceProfile()), "KXLMARK"));
+  EXPECT_FALSE(keyExists(at("M2", forceProfile() + "\\Node0")));
+}
+
+TEST_F(MoveProfile, ForceCopyNameNeedsTheLocalHostName) {
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
+  loadNodes("0 hosta.zav.test HOSTA 0\n");
+  failCalls("sqloPdbTcpIpGetFullHostName:1");
+  EXPECT_EQ(UPGRADE_RC_SQLCA, moveInstanceProfile(context_, options_));
+  EXPECT_EQ(KXL_RC_NO_LOCAL_HOST_NAME, options_.status.sqlcode);
+  expectUntouched(kLocal, kOld, kCurrent);
+}
+
+TEST_F(MoveProfile, UnreachablePartitionMachineStopsTheMove) {
+  ownBy(kOld);
+  addMachine("M2");
+  seedProfile(kLocal, kOld);
+  seedProfile("M2", kOld);
+  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostc.zav.test M3 0\n2 hostb.zav.test M2 0\n");
+  startTrace();
+  EXPECT_EQ(KXL_RC_MACHINE_REGISTRY, moveInstanceProfile(context_, options_));
+  expectMoved(kLocal, kOld, kCurrent);
+  expectUntouched("M2", kOld, kCurrent);
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=10 rc=-1913"));
+}
+
+TEST_F(MoveProfile, ClusteredInstanceMovesOnEveryListedMachine) {
+  clusterOn("CLUS1", "M2 hosta M3");
+  ownBy(kOld);
+  addMachine("M2");
+  addMachine("M3");
+  for (const char *machine : {kLocal, "M2", "M3"})
+    seedProfile(machine, kOld);
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  for (const char *machine : {kLocal, "M2", "M3"})
+    expectMoved(machine, kOld, kCurrent);
+  EXPECT_STREQ("CLUS1", options_.partitionRecord.clusterName);
+}
+
+TEST_F(MoveProfile, ClusterMachineUnreachableAfterTheLocalMove) {
+  clusterOn("CLUS1", "HOSTA M9 M2");
+  ownBy(kOld);
+  addMachine("M2");
+  seedProfile(kLocal, kOld);
+  seedProfile("M2", kOld);
+  startTrace();
+  EXPECT_EQ(KXL_RC_MACHINE_REGISTRY, moveInstanceProfile(context_, options_));
+  expectMoved(kLocal, kOld, kCurrent);
+  expectUntouched("M2", kOld, kCurrent);
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=60 rc=-1913"));
+}
+
+TEST_F(MoveProfile, ClusterWithoutMachineListMovesOnlyLocally) {
+  setString(profile(kOld), "KXLCLUSTER", "CLUS1");
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  expectMoved(kLocal, kOld, kCurrent);
+}
+
+TEST_F(MoveProfile, ClusterNameLongerThanItsField) {
+  clusterOn("CLUSTERNAME16CHR", "HOSTA");
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  startTrace();
+  EXPECT_EQ(static_cast<int32_t>(KXLI_RC_BUFFER_TOO_SMALL), moveInstanceProfile(context_, options_));
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=50"));
+}
+
+TEST_F(MoveProfile, ComputerNameFailureGivesTheSystemError) {
+  clusterOn("CLUS1", "HOSTA");
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  failCalls("sqloGetComputerNameA:1");
+  int32_t rc = moveInstanceProfile(context_, options_);
+  EXPECT_GT(rc, 0);
+  expectMoved(kLocal, kOld, kCurrent);
+}
+
+} // namespace

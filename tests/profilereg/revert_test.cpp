@@ -1,0 +1,160 @@
+// The undo of the profile move: keys back under the owning copy where the move
+// reached, machines it never reached left alone, and services pointed at the
+// owning copy's program again.
+#include "profile_world.h"
+
+namespace {
+
+using kxltest::ProfileWorld;
+
+class RevertProfile : public ProfileWorld {};
+
+TEST_F(RevertProfile, PartialMoveIsUndoneOnlyWhereItHappened) {
+  ownBy(kOld);
+  addMachine("M2");
+  addMachine("M3");
+  for (const char *machine : {kLocal, "M2", "M3"})
+    seedProfile(machine, kOld);
+  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostc.zav.test M3 0\n");
+  failCalls("SHCopyKeyA:2");
+  ASSERT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+  failCalls(nullptr);
+
+  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
+  expectMoved(kLocal, kCurrent, kOld);
+  // The machine whose copy failed still has its old key; the empty new one stays.
+  expectProfileAt("M2", kOld);
+  EXPECT_TRUE(keyExists(at("M2", profile(kCurrent))));
+  expectUntouched("M3", kOld, kCurrent);
+}
+
+TEST_F(RevertProfile, LocalServicePointsAtTheOwningCopyAgain) {
+  ownBy(kOld);
+  seedProfile(kLocal, kOld);
+  addService(kLocal, "INST1", "C:\\KXL101\\bin\\kxlsyscs.exe");
+  context_.serviceStartType = SQLO_SVC_AUTO_START;
+  ASSERT_EQ(0, moveInstanceProfile(context_, options_));
+
+  startTrace();
+  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
+  expectMoved(kLocal, kCurrent, kOld);
+  EXPECT_EQ("C:\\KXL95\\bin\\kxlsyscs.exe", service(kLocal, "INST1", "ImagePath"));
+  EXPECT_EQ("KXL - KXL101 - INST1", service(kLocal, "INST1", "DisplayName"));
+  EXPECT_EQ("LocalSystem", service(kLocal, "INST1", "ObjectName"));
+  EXPECT_EQ(DWORD(SQLO_SVC_AUTO_START), serviceStart(kLocal, "INST1"));
+  std::string trace = traceText();
+  EXPECT_NE(std::string::npos, trace.find("entry 0x18780507"));
+  EXPECT_NE(std::string::npos, trace.find("exit 0x18780507 rc=0"));
+}
+
+TEST_F(RevertProfile, Version8OwnerGetsItsSingleCopyKeyAndShortDisplayName) {
+  ownBy(KXLI_V8_COPY_NAME);
+  seedProfile(kLocal, kCurrent);
+  addService(kLocal, "INST1", "C:\\KXL101\\bin\\kxlsyscs.exe");
+  context_.serviceStartType = SQLO_SVC_DEMAND_START;
+  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
+  expectMoved(kLocal, kCurrent, kV8);
+  EXPECT_EQ("C:\\KXL8\\bin\\kxlsyscs.exe", service(kLocal, "INST1", "ImagePath"));
+  EXPECT_EQ("KXL - INST1", service(kLocal, "INST1", "DisplayName"));
+  EXPECT_EQ(DWORD(SQLO_SVC_DEMAND_START), serviceStart(kLocal, "INST1"));
+}
+
+TEST_F(RevertProfile, FailedCopyBackKeepsTheCurrentKeyAndTheService) {
+  ownBy(kOld);
+  seedProfile(kLocal, kCurrent);
+  addService(kLocal, "INST1", "C:\\KXL101\\bin\\kxlsyscs.exe");
+  startTrace();
+  failCalls("SHCopyKeyA:1");
+  EXPECT_EQ(KXL_RC_PROFILE_KEY, revertInstanceProfile(context_, options_));
+  expectProfileAt(kLocal, kCurrent);
+  EXPECT_EQ("C:\\KXL101\\bin\\kxlsyscs.exe", service(kLocal, "INST1", "ImagePath"));
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780507 probe=110 rc=-1918"));
+}
+
+TEST_F(RevertProfile, PartitionServicesOnEveryMachine) {
+  ownBy(kOld);
+  addMachine("M2");
+  addMachine("M3");
+  for (const char *machine : {kLocal, "M2", "M3"})
+    seedProfile(machine, kCurrent);
+  setString(at("M2", std::string(kRoot) + "\\GLOBAL_PROFILE"), "KXLPATH", "D:\\KXLOLD");
+  loadNodes(
+      "0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostb.zav.test M2 1\n3 hostc.zav.test M3 0\n");
+  addService(kLocal, "INST1-0", "C:\\KXL101\\bin\\kxlsyscs.exe");
+  addService("M2", "INST1-1", "C:\\KXL101\\bin\\kxlsyscs.exe");
+  addService("M2", "INST1-2", "C:\\KXL101\\bin\\kxlsyscs.exe");
+  addService("M3", "INST1-3", "C:\\KXL101\\bin\\kxlsyscs.exe");
+  std::snprintf(options_.userName, sizeof options_.userName, "svcuser");
+  std::snprintf(options_.password, sizeof options_.password, "secret");
+  context_.serviceStartType = SQLO_SVC_DEMAND_START;
+
+  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
+  for (const char *machine : {kLocal, "M2", "M3"})
+    expectMoved(machine, kCurrent, kOld);
+  EXPECT_EQ("C:\\KXL95\\bin\\kxlsyscs.exe", service(kLocal, "INST1-0", "ImagePath"));
+  EXPECT_EQ("D:\\KXLOLD\\bin\\kxlsyscs.exe", service("M2", "INST1-1", "ImagePath"));
+  EXPECT_EQ("D:\\KXLOLD\\bin\\kxlsyscs.exe", service("M2", "INST1-2", "ImagePath"));
+  // A host without a recorded installation runs the owning copy's program.
+  EXPECT_EQ("C:\\KXL95\\bin\\kxlsyscs.exe", service("M3", "INST1-3", "ImagePath"));
+  EXPECT_EQ("KXL - KXL101 - INST1-0", service(kLocal, "INST1-0", "DisplayName"));
+  EXPECT_EQ("KXL - KXL101 - INST1-2", service("M2", "INST1-2", "DisplayName"));
+  EXPECT_EQ("svcuser", service("M2", "INST1-1", "ObjectName"));
+  EXPECT_EQ(DWORD(SQLO_SVC_DEMAND_START), serviceStart("M3", "INST1-3"));
+}
+
+TEST_F(RevertProfile, ForceCopyNameRoundTripDropsThePlaceholder) {
+  ownBy(kOld);
+  addMachine("M2");
+  seedProfile(kLocal, kOld);
+  seedProfile("M2", kOld);
+  options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
+  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n");
+  addService("M2", "INST1-1", "C:\\KXL101\\bin\\kxlsyscs.exe");
+  ASSERT_EQ(0, moveInstanceProfile(context_, options_));
+
+  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
+  expectMoved(kLocal, kCurrent, kOld);
+  // The forced host's profile was never copied: it comes back as an empty key.
+  EXPECT_TRUE(keyExists(at("M2", profile(kOld))));
+  EXPECT_FALSE(keyExists(at("M2", forceProfile())));
+  EXPECT_EQ("C:\\KXL101\\bin\\kxlsyscs.exe", service("M2", "INST1-1", "ImagePath"));
+  EXPECT_EQ("KXL - KXL101 - INST1-1", service("M2", "INST1-1", "DisplayName"));
+}
+
+TEST_F(RevertProfile, UnknownLocalHostNameStopsThePartitionUndo) {
+  ownBy(kOld);
+  seedProfile(kLocal, kCurrent);
+  loadNodes("0 hosta.zav.test HOSTA 0\n");
+  failCalls("sqloPdbTcpIpGetFullHostName:1");
+  EXPECT_EQ(UPGRADE_RC_SQLCA, revertInstanceProfile(context_, options_));
+  EXPECT_EQ(KXL_RC_NO_LOCAL_HOST_NAME, options_.status.sqlcode);
+  expectProfileAt(kLocal, kCurrent);
+}
+
+TEST_F(RevertProfile, ClusterRoundTripRestoresEveryMachine) {
+  clusterOn("CLUS1", "HOSTA M2 M3");
+  ownBy(kOld);
+  addMachine("M2");
+  addMachine("M3");
+  for (const char *machine : {kLocal, "M2", "M3"})
+    seedProfile(machine, kOld);
+  ASSERT_EQ(0, moveInstanceProfile(context_, options_));
+
+  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
+  for (const char *machine : {kLocal, "M2", "M3"})
+    expectMoved(machine, kCurrent, kOld);
+}
+
+TEST_F(RevertProfile, UnreachableClusterMachine) {
+  clusterOn("CLUS1", "HOSTA M9");
+  ownBy(kOld);
+  // The cluster membership was read; the moved profile now lives under the current copy.
+  SHDeleteKeyA(HKEY_LOCAL_MACHINE, profile(kOld).c_str());
+  seedProfile(kLocal, kCurrent);
+  startTrace();
+  EXPECT_EQ(KXL_RC_MACHINE_REGISTRY, revertInstanceProfile(context_, options_));
+  expectMoved(kLocal, kCurrent, kOld);
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780507 probe=60 rc=-1913"));
+}
+
+} // namespace
