@@ -1,0 +1,73 @@
+// A fresh demo world per case with the command installed in the current copy,
+// run there with an optional fault, and the means to see what the upgrade
+// driver did: its trace, the registry, and the files of a directory tree.
+#pragma once
+
+#include "sim/kxlsim/scenario_parts.h"
+
+#include <gtest/gtest.h>
+
+#include <map>
+#include <string>
+#include <vector>
+
+namespace drivertest {
+
+inline constexpr const char *kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
+inline constexpr const char *kCurrentCopy = "C:\\Program Files\\ZAV\\KXL101";
+inline constexpr const char *kOldInstanceDir = "C:\\Program Files\\ZAV\\KXL95\\INST1";
+inline constexpr const char *kNewInstanceDir = "C:\\Program Files\\ZAV\\KXL101\\INST1";
+inline constexpr const char *kTempDir = "C:\\windows\\temp";
+
+struct DriverFailure {
+  long long probe;
+  long long rc;
+};
+
+struct Outcome {
+  int exitCode = -1;
+  long long driverResult = -999999; // from the driver's exit trace line
+  bool driverRan = false;
+  std::vector<DriverFailure> failures; // the driver's error trace lines
+  std::string out, err, trace;
+  std::vector<std::string> events; // lines appended to events.jsonl
+};
+
+// Relative path -> content of every file below a directory.
+using Tree = std::map<std::string, std::string>;
+
+class DriverTest : public ::testing::Test {
+protected:
+  static void SetUpTestSuite();
+  static void TearDownTestSuite();
+  void SetUp() override;
+  void TearDown() override;
+
+  // Runs the command with `args`; `faults` is the KXLSIM_FAIL value ("" none).
+  Outcome run(const std::vector<std::string> &args, const std::string &faults = "");
+
+  std::string hostPath(const std::string &windowsPath) const;
+  Tree tree(const std::string &windowsPath) const;
+  bool exists(const std::string &windowsPath) const;
+  void removeTree(const std::string &windowsPath) const;
+  // Entries of the world's temporary directory.
+  std::vector<std::string> tempEntries() const;
+
+  // Registry of the local machine.
+  bool keyExists(const std::string &key) const;
+  std::string stringValue(const std::string &key, const std::string &name) const;
+  DWORD dwordValue(const std::string &key, const std::string &name) const;
+
+  kxlsim::WorldWriter world;
+
+private:
+  static std::string templateDir_;
+  std::string temp_;
+  std::string root_;
+  int runs_ = 0;
+};
+
+// The profile key of an instance under a copy.
+std::string profileKey(const std::string &copyName, const std::string &instance);
+
+} // namespace drivertest
