@@ -15,15 +15,6 @@ TEST_F(MoveProfile, Version8SingleCopyKeyMovesAndIsDeleted) {
   expectMoved(kLocal, kV8, kCurrent);
 }
 
-TEST_F(MoveProfile, NamedCopyKeyMovesWithValuesAndSubkeysOnly) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  setString(std::string(kRoot) + "\\InstalledCopies\\KXL95\\PROFILES\\INST2", "KXLMARK", "other");
-  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
-  expectMoved(kLocal, kOld, kCurrent);
-  EXPECT_EQ("other", getString(std::string(kRoot) + "\\InstalledCopies\\KXL95\\PROFILES\\INST2", "KXLMARK"));
-}
-
 TEST_F(MoveProfile, InstanceOfTheCurrentCopyStaysWhereItIs) {
   ownBy(kCurrent);
   seedProfile(kLocal, kCurrent);
@@ -68,7 +59,6 @@ TEST_F(MoveProfile, OwnerWithoutVersionIsRefused) {
 
 TEST_F(MoveProfile, PartitionsSharingAMachineMoveItsKeyOnce) {
   ownBy(kOld);
-  addMachine("M2");
   seedProfile(kLocal, kOld);
   seedProfile("M2", kOld);
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostb.zav.test M2 1\n");
@@ -77,17 +67,8 @@ TEST_F(MoveProfile, PartitionsSharingAMachineMoveItsKeyOnce) {
   expectMoved("M2", kOld, kCurrent);
 }
 
-TEST_F(MoveProfile, PartitionedWithoutNodeListHasNothingToMove) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  options_.partitionedInstance = 1;
-  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
-  expectUntouched(kLocal, kOld, kCurrent);
-}
-
 TEST_F(MoveProfile, ForceCopyNameGivesOtherHostsAnEmptyPlaceholder) {
   ownBy(kOld);
-  addMachine("M2");
   seedProfile(kLocal, kOld);
   seedProfile("M2", kOld);
   options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
@@ -115,7 +96,6 @@ TEST_F(MoveProfile, ForceCopyNameNeedsTheLocalHostName) {
 
 TEST_F(MoveProfile, UnreachablePartitionMachineStopsTheMove) {
   ownBy(kOld);
-  addMachine("M2");
   seedProfile(kLocal, kOld);
   seedProfile("M2", kOld);
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostc.zav.test M3 0\n2 hostb.zav.test M2 0\n");
@@ -129,8 +109,6 @@ TEST_F(MoveProfile, UnreachablePartitionMachineStopsTheMove) {
 TEST_F(MoveProfile, ClusteredInstanceMovesOnEveryListedMachine) {
   clusterOn("CLUS1", "M2 hosta M3");
   ownBy(kOld);
-  addMachine("M2");
-  addMachine("M3");
   for (const char *machine : {kLocal, "M2", "M3"})
     seedProfile(machine, kOld);
   EXPECT_EQ(0, moveInstanceProfile(context_, options_));
@@ -142,7 +120,6 @@ TEST_F(MoveProfile, ClusteredInstanceMovesOnEveryListedMachine) {
 TEST_F(MoveProfile, ClusterMachineUnreachableAfterTheLocalMove) {
   clusterOn("CLUS1", "HOSTA M9 M2");
   ownBy(kOld);
-  addMachine("M2");
   seedProfile(kLocal, kOld);
   seedProfile("M2", kOld);
   startTrace();
@@ -150,33 +127,6 @@ TEST_F(MoveProfile, ClusterMachineUnreachableAfterTheLocalMove) {
   expectMoved(kLocal, kOld, kCurrent);
   expectUntouched("M2", kOld, kCurrent);
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=60 rc=-1913"));
-}
-
-TEST_F(MoveProfile, ClusterWithoutMachineListMovesOnlyLocally) {
-  setString(profile(kOld), "KXLCLUSTER", "CLUS1");
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
-  expectMoved(kLocal, kOld, kCurrent);
-}
-
-TEST_F(MoveProfile, ClusterNameLongerThanItsField) {
-  clusterOn("CLUSTERNAME16CHR", "HOSTA");
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  startTrace();
-  EXPECT_EQ(static_cast<int32_t>(KXLI_RC_BUFFER_TOO_SMALL), moveInstanceProfile(context_, options_));
-  EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=50"));
-}
-
-TEST_F(MoveProfile, ComputerNameFailureGivesTheSystemError) {
-  clusterOn("CLUS1", "HOSTA");
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  failCalls("sqloGetComputerNameA:1");
-  int32_t rc = moveInstanceProfile(context_, options_);
-  EXPECT_GT(rc, 0);
-  expectMoved(kLocal, kOld, kCurrent);
 }
 
 } // namespace

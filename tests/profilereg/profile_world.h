@@ -11,7 +11,6 @@
 #include "sim/product/diag.h"
 
 #include <cstdio>
-#include <cstring>
 #include <fstream>
 #include <memory>
 #include <sstream>
@@ -22,7 +21,6 @@ namespace kxltest {
 class ProfileWorld : public InstallWorld {
 protected:
   static constexpr const char *kRoot = "SOFTWARE\\ZAV\\KXL";
-  static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
   static constexpr const char *kLocal = "";
   static constexpr const char *kV8 = "";
   static constexpr const char *kCurrent = "KXL101";
@@ -32,8 +30,8 @@ protected:
     InstallWorld::SetUp();
     if (IsSkipped() || HasFatalFailure())
       return;
-    setString(kIdentity, "ComputerName", "HOSTA");
-    setString(kIdentity, "FullHostName", "hosta.zav.test");
+    setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "ComputerName", "HOSTA");
+    setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "FullHostName", "hosta.zav.test");
     registerCopy(kCurrent, "C:\\KXL101");
     setVersion(std::string(kCopies) + kCurrent, "10", "1", "0", "0", "s101");
     registerCopy(kOld, "C:\\KXL95");
@@ -41,7 +39,6 @@ protected:
     registerV8("C:\\KXL8");
     setVersion(kRoot, "8", "2", "0", "", "s8");
     ASSERT_EQ(0, sqloSwitchToInstallationName(kCurrent));
-    std::memset(&options_, 0, sizeof options_);
     std::snprintf(options_.instanceName, sizeof options_.instanceName, "INST1");
   }
 
@@ -79,11 +76,8 @@ protected:
     return std::string(kRoot) + "\\FORCE_COPY_NAME\\InstalledCopies\\" + kCurrent + "\\PROFILES\\INST1";
   }
 
-  static void addMachine(const std::string &machine) {
-    createKey(HKEY_LOCAL_MACHINE, at(machine, "SOFTWARE"));
-  }
-
-  // A profile key with a value naming the machine and a subkey with a value.
+  // A profile key with a value naming the machine and a subkey with a value;
+  // a machine other than the local one comes into being with it.
   static void seedProfile(const std::string &machine, const std::string &copy) {
     setString(at(machine, profile(copy)), "KXLMARK", "mark-" + machine);
     setString(at(machine, profile(copy) + "\\Node0"), "Port", "60000");
@@ -140,14 +134,14 @@ protected:
     return getString(at(machine, "SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name), value);
   }
 
-  static DWORD serviceStart(const std::string &machine, const std::string &name) {
+  static DWORD serviceStart(const std::string &name) {
     HKEY key = nullptr;
-    std::string path = at(machine, "SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name);
-    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_READ, &key) != ERROR_SUCCESS)
-      return 0;
     DWORD value = 0, size = sizeof value;
-    RegQueryValueExA(key, "Start", nullptr, nullptr, reinterpret_cast<BYTE *>(&value), &size);
-    RegCloseKey(key);
+    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, ("SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name).c_str(), 0, KEY_READ,
+                      &key) == ERROR_SUCCESS) {
+      RegQueryValueExA(key, "Start", nullptr, nullptr, reinterpret_cast<BYTE *>(&value), &size);
+      RegCloseKey(key);
+    }
     return value;
   }
 
