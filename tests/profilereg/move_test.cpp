@@ -4,7 +4,7 @@
 
 namespace {
 
-using kxltest::ProfileWorld;
+using namespace kxltest;
 
 class MoveProfile : public ProfileWorld {};
 

@@ -1,4 +1,4 @@
-// A machine with three copies (version 8, 9.5 and the current 10.1), instance
+// A machine with three copies (version 8, 9.1 and the current 10.1), instance
 // INST1 owned by one of them, other machines of the world for partitions and
 // cluster nodes, and helpers that seed and read profile keys and services.
 #pragma once
@@ -18,26 +18,27 @@
 
 namespace kxltest {
 
+inline constexpr char kRoot[] = "SOFTWARE\\ZAV\\KXL";
+inline constexpr char kLocal[] = ""; // the local machine
+inline constexpr char kV8[] = "";    // the single-copy layout
+inline constexpr char kCurrent[] = "KXL101";
+inline constexpr char kOld[] = "KXL95";
+
 class ProfileWorld : public InstallWorld {
 protected:
-  static constexpr const char *kRoot = "SOFTWARE\\ZAV\\KXL";
-  static constexpr const char *kLocal = "";
-  static constexpr const char *kV8 = "";
-  static constexpr const char *kCurrent = "KXL101";
-  static constexpr const char *kOld = "KXL95";
-
   void SetUp() override {
     InstallWorld::SetUp();
     if (IsSkipped() || HasFatalFailure())
       return;
-    setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "ComputerName", "HOSTA");
-    setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "FullHostName", "hosta.zav.test");
-    registerCopy(kCurrent, "C:\\KXL101");
-    setVersion(std::string(kCopies) + kCurrent, "10", "1", "0", "0", "s101");
-    registerCopy(kOld, "C:\\KXL95");
-    setVersion(std::string(kCopies) + kOld, "9", "5", "0", "2", "s95");
+    for (const char *copy : {kCurrent, kOld}) {
+      std::string path = std::string("C:\\") + copy;
+      registerCopy(copy, path);
+      setVersion(std::string(kCopies) + copy, copy == kOld ? "9" : "10", "1", "0", "0", "s");
+    }
     registerV8("C:\\KXL8");
     setVersion(kRoot, "8", "2", "0", "", "s8");
+    setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "ComputerName", "HOSTA");
+    setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "FullHostName", "hosta.zav.test");
     ASSERT_EQ(0, sqloSwitchToInstallationName(kCurrent));
     std::snprintf(options_.instanceName, sizeof options_.instanceName, "INST1");
   }

@@ -5,7 +5,7 @@
 
 namespace {
 
-using kxltest::ProfileWorld;
+using namespace kxltest;
 
 class RevertProfile : public ProfileWorld {};
 
