@@ -90,7 +90,6 @@ int32_t initEnvironment(uint32_t partitioned) {
   SQLO_NODELIST *table = kxlprod::buildNodeList(nodes, maxNode);
   if (table == nullptr)
     return SQLO_RC_NO_MEMORY;
-  releaseTable();
   partitionTable = table;
   sqlz_krcbp->partitionTable = table;
   sqlz_krcbp->currentPartition = currentPartition(nodes);
@@ -113,6 +112,8 @@ extern "C" {
 int32_t sqleInitApplicationEnvironment(uint32_t reserved1, uint32_t reserved2, uint32_t partitioned,
                                        sqlca *ca) {
   (void)reserved1, (void)reserved2;
+  // A failed set-up leaves no table of an earlier instance behind.
+  releaseTable();
   int32_t rc = kxlsim::shouldFail("sqleInitApplicationEnvironment") ? SQLO_RC_SYSTEM_ERROR
                                                                     : initEnvironment(partitioned);
   if (ca != nullptr)

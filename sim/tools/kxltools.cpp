@@ -3,8 +3,10 @@
 // kxlset or kxlsyscs (".exe" and letter case ignored). Each run records an
 // event in the world and ends with the exit code configured for the program
 // in HKLM\SOFTWARE\ZAV\KXLSIM\Tools\<program> "ExitCode" (0 when absent).
+// A program configured to fail does none of its work (tool_actions.h).
 #include "platform/win32.h"
 #include "sim/common/events.h"
+#include "sim/tools/tool_actions.h"
 #include "sim/tools/tool_names.h"
 
 #include <cstdio>
@@ -87,5 +89,11 @@ int main(int argc, char **argv) {
   DWORD exitCode = configuredExitCode(program);
   if (program == "kxlckupgrade")
     writeCheckLog(argc, argv, instance, exitCode);
-  return int(exitCode);
+  if (exitCode != 0)
+    return int(exitCode);
+  int usage = kxlsim::runToolWork(program, argc, argv);
+  if (usage != 0)
+    std::fprintf(stderr, "%s: usage: %s -c \"CLIENT FILE\" -s \"SERVER FILE\"\n", program.c_str(),
+                 program.c_str());
+  return usage;
 }
