@@ -1,0 +1,215 @@
+// A machine with an older copy (KXL95) and the current copy (KXL10) for the
+// re-creation cases: configuration templates, machine identity, an instance of
+// the older copy with its service, and readers for what the cases check.
+#pragma once
+
+#include "../install/install_world.h"
+#include "engn/sqo/options.h"
+#include "engn/sqo/run.h"
+#include "install/kxlinstance.h"
+#include "platform/kxlsys.h"
+#include "sim/product/diag.h"
+
+#include <cstdint>
+#include <cstdio>
+#include <cstring>
+#include <fstream>
+#include <memory>
+#include <sstream>
+#include <string>
+#include <vector>
+
+namespace kxltest {
+
+class ServicesWorld : public InstallWorld {
+protected:
+  static constexpr const char *kCurrentCopy = "KXL10";
+  static constexpr const char *kCurrentPath = "C:\\KXL10";
+  static constexpr const char *kOldCopy = "KXL95";
+  static constexpr const char *kOldPath = "C:\\KXL95";
+  static constexpr const char *kProfilePath = "C:\\PROFILES";
+  static constexpr const char *kInstance = "INST1";
+  static constexpr const char *kInstanceDir = "C:\\PROFILES\\INST1";
+  static constexpr const char *kSimRoot = "SOFTWARE\\ZAV\\KXLSIM\\";
+  static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
+
+  void SetUp() override {
+    InstallWorld::SetUp();
+    if (IsSkipped())
+      return;
+    registerCopy(kOldCopy, kOldPath);
+    registerCopy(kCurrentCopy, kCurrentPath);
+    setString(kIdentity, "ComputerName", "SERVER7");
+    setString(kIdentity, "FullHostName", "server7.zav.example");
+    setString(kIdentity, "AssistantName", "server7.zav.example");
+    setString(kIdentity, "CpuMeasure", "0.5");
+    setString(kIdentity, "CommBandwidth", "12.5");
+    makeDirectories(kProfilePath);
+    writeFile("C:\\windows\\system32\\drivers\\etc\\services", std::vector<unsigned char>{'#', '\n'});
+    ASSERT_EQ(0, sqloSwitchToInstallationName(kCurrentCopy));
+  }
+
+  void TearDown() override {
+    setProcessVariable("KXLTRACE", nullptr);
+    kxlprod::resetTrace();
+    InstallWorld::TearDown();
+  }
+
+  static void setDword(const std::string &path, const char *name, DWORD value) {
+    HKEY key = nullptr;
+    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS,
+                                             nullptr, &key, nullptr));
+    RegSetValueExA(key, name, 0, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
+    RegCloseKey(key);
+  }
+
+  static DWORD getDword(const std::string &path, const char *name) {
+    HKEY key = nullptr;
+    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
+      return 0xDEADu;
+    DWORD value = 0xDEADu, size = sizeof value;
+    RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(&value), &size);
+    RegCloseKey(key);
+    return value;
+  }
+
+  static bool keyExists(const std::string &path) {
+    HKEY key = nullptr;
+    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
+      return false;
+    RegCloseKey(key);
+    return true;
+  }
+
+  static std::string copyKey(const char *copy) {
+    return std::string("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\") + copy;
+  }
+  static std::string serviceKey(const std::string &service) {
+    return kSimRoot + std::string("Services\\") + service;
+  }
+  static std::string instanceKey(const std::string &name) {
+    return kSimRoot + std::string("Instances\\") + name;
+  }
+
+  // A configuration image with its node type, a marker byte and a valid checksum.
+  static std::vector<unsigned char> validImage(uint16_t nodeType, unsigned char marker = 0x11) {
+    std::vector<unsigned char> image = configImage(nodeType);
+    image[100] = marker;
+    setChecksum(image);
+    return image;
+  }
+
+  static void setChecksum(std::vector<unsigned char> &image) {
+    uint32_t sum = 0;
+    for (size_t i = 4; i < image.size(); ++i)
+      sum += image[i];
+    std::memcpy(image.data(), &sum, sizeof sum);
+  }
+
+  static bool checksumValid(const std::vector<unsigned char> &image) {
+    std::vector<unsigned char> copy = image;
+    setChecksum(copy);
+    return copy == image;
+  }
+
+  static void addTemplate(uint16_t nodeType) {
+    static const char *const names[] = {"kxlsyssv", "kxlsysrq", "kxlsyssr", "kxlsysmp", "kxlsysst"};
+    writeFile(std::string(kCurrentPath) + "\\CFG\\" + names[nodeType - 1], validImage(nodeType, 0x22));
+  }
+
+  // The whole content of a file at a Windows path; empty when it cannot be read.
+  static std::vector<unsigned char> readFile(const std::string &windowsPath) {
+    std::vector<unsigned char> bytes;
+    HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_READ, FILE_SHARE_READ, nullptr, OPEN_EXISTING,
+                              FILE_ATTRIBUTE_NORMAL, nullptr);
+    if (file == INVALID_HANDLE_VALUE)
+      return bytes;
+    unsigned char chunk[4096];
+    DWORD got = 0;
+    while (ReadFile(file, chunk, sizeof chunk, &got, nullptr) && got > 0)
+      bytes.insert(bytes.end(), chunk, chunk + got);
+    CloseHandle(file);
+    return bytes;
+  }
+
+  static std::string readText(const std::string &windowsPath) {
+    std::vector<unsigned char> bytes = readFile(windowsPath);
+    return std::string(bytes.begin(), bytes.end());
+  }
+
+  static bool pathExists(const std::string &windowsPath) {
+    return GetFileAttributesA(windowsPath.c_str()) != INVALID_FILE_ATTRIBUTES;
+  }
+
+  static uint32_t u32At(const std::vector<unsigned char> &image, size_t offset) {
+    return sqloLe32(image.data(), offset);
+  }
+  static float f32At(const std::vector<unsigned char> &image, size_t offset) {
+    uint32_t bits = u32At(image, offset);
+    float value = 0;
+    std::memcpy(&value, &bits, sizeof value);
+    return value;
+  }
+  static std::string textAt(const std::vector<unsigned char> &image, size_t offset, size_t size) {
+    const char *text = reinterpret_cast<const char *>(image.data() + offset);
+    return std::string(text, strnlen(text, size));
+  }
+
+  std::vector<unsigned char> newConfig() const { return readFile(std::string(kInstanceDir) + "\\kxlsystm"); }
+
+  // An instance profile key of the current copy (the creation adds its own).
+  static void addProfile(const char *copy, const std::string &instance) {
+    setString(copyKey(copy) + "\\PROFILES\\" + instance, "KXLINSTPROF", kProfilePath);
+  }
+
+  // INST1 of the older copy: directory, configuration, registration, service.
+  static void addOldInstance(uint16_t nodeType, DWORD start = 3, bool withService = true) {
+    writeFile(std::string(kInstanceDir) + "\\kxlsystm", validImage(nodeType, 0x33));
+    registerInstance(kInstance, kInstanceDir, kOldCopy);
+    addProfile(kCurrentCopy, kInstance);
+    if (!withService)
+      return;
+    std::string key = serviceKey(kInstance);
+    setString(key, "ImagePath", std::string(kOldPath) + "\\bin\\kxlsyscs.exe");
+    setString(key, "DisplayName", "KXL - KXL95 - INST1");
+    setString(key, "ObjectName", "OLDACCT");
+    setDword(key, "Start", start);
+    setDword(key, "State", 1);
+  }
+
+  // Trace lines written from now on, for the cases that look at trace points.
+  std::string startTrace() {
+#ifndef _WIN32
+    tracePath_ = worldRoot() + "/trace.txt";
+#else
+    tracePath_ = "kxl_services_trace.txt";
+#endif
+    std::remove(tracePath_.c_str());
+    setProcessVariable("KXLTRACE", tracePath_.c_str());
+    kxlprod::resetTrace();
+    return tracePath_;
+  }
+  std::string traceText() const {
+    std::ifstream in(tracePath_, std::ios::binary);
+    std::stringstream text;
+    text << in.rdbuf();
+    return text.str();
+  }
+
+  // The options record the run hands the engine for INST1.
+  static std::unique_ptr<UpgradeOptions> makeOptions() {
+    auto options = std::make_unique<UpgradeOptions>();
+    std::memset(options.get(), 0, sizeof *options);
+    std::snprintf(options->instanceName, sizeof options->instanceName, "%s", kInstance);
+    std::snprintf(options->profilePath, sizeof options->profilePath, "%s", kProfilePath);
+    std::snprintf(options->currentInstallPath, sizeof options->currentInstallPath, "%s", kCurrentPath);
+    options->flags = UPGRADE_FLAG_TOOL;
+    sqloinca(&options->status);
+    return options;
+  }
+
+private:
+  std::string tracePath_;
+};
+
+} // namespace kxltest
