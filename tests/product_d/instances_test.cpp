@@ -1,0 +1,161 @@
+// Creating instances under the current copy, partition entries, and removing
+// what a creation made.
+#include "demo_world.h"
+
+#include <fstream>
+#include <iterator>
+
+namespace kxltest {
+namespace {
+
+class Instances : public DemoWorld {
+protected:
+  // Creates NAME under C:\inst; the result of the call.
+  static int32_t create(const char *name, uint32_t nodeType, const char *user = nullptr,
+                        uint8_t textSearch = 0, const char *tsService = nullptr, uint16_t tsPort = 0,
+                        int32_t *reason = nullptr, const char *cluster = nullptr) {
+    int32_t ownReason = -7, extra = -7;
+    int32_t rc = sqlo_instance_create_extended(name, "C:\\inst", kCopy, 0, user, user ? "s3cret!pw" : nullptr,
+                                               0, 1, nodeType, cluster, 1, 1, textSearch, tsService, tsPort,
+                                               reason ? reason : &ownReason, &extra);
+    EXPECT_EQ(extra, 0);
+    return rc;
+  }
+};
+
+TEST_F(Instances, CreationTakesTheTemplateOfEachNodeTypeAndRegistersTheInstance) {
+  const char *templates[] = {"kxlsyssv", "kxlsysrq", "kxlsyssr", "kxlsysmp", "kxlsysst"};
+  for (uint32_t type = 1; type <= 5; ++type) {
+    std::string name = "NEW" + std::to_string(type);
+    SCOPED_TRACE(name);
+    ASSERT_EQ(0, create(name.c_str(), type, type == 3 ? ".\\kxluser" : nullptr));
+    std::vector<uint8_t> image = readFile("C:\\inst\\" + name + "\\kxlsystm");
+    ASSERT_EQ(image.size(), 16384u);
+    EXPECT_EQ(image, readFile(std::string(kCopy) + "\\CFG\\" + templates[type - 1]));
+    EXPECT_EQ(le16(image, 40), type);
+    EXPECT_EQ(regString(kInstances + name, "Directory"), "C:\\inst\\" + name);
+    EXPECT_EQ(regString(kInstances + name, "Copy"), "KXL101");
+    EXPECT_TRUE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\" + name));
+    bool hasService = type != 2 && type != 4;
+    EXPECT_EQ(keyExists(kServices + name), hasService);
+    if (!hasService)
+      continue;
+    EXPECT_EQ(regString(kServices + name, "ImagePath"), std::string(kCopy) + "\\bin\\kxlsyscs.exe");
+    EXPECT_EQ(regString(kServices + name, "DisplayName"), "KXL - KXL101 - " + name);
+    EXPECT_EQ(regString(kServices + name, "ObjectName"), type == 3 ? ".\\kxluser" : "LocalSystem");
+  }
+  std::ifstream hive(root() + "/system.reg");
+  std::string text((std::istreambuf_iterator<char>(hive)), std::istreambuf_iterator<char>());
+  EXPECT_EQ(text.find("s3cret"), std::string::npos) << "no password in the registry";
+}
+
+TEST_F(Instances, RefusesBadArgumentsAndMissingTemplates) {
+  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, create("TOOLONGNAME", 1));
+  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, create("BAD\\N", 1));
+  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, create("NEW", 6));
+  snapshot();
+  ASSERT_TRUE(DeleteFileA((std::string(kCopy) + "\\CFG\\kxlsyssr").c_str()));
+  EXPECT_EQ(SQLO_RC_FILE_NOT_FOUND, create("NEW", 3));
+  EXPECT_EQ(diff(), "file - C:\\Program Files\\ZAV\\KXL101\\CFG\\kxlsyssr\n")
+      << "nothing but the removed template";
+}
+
+TEST_F(Instances, DropUndoesACreationCompletely) {
+  snapshot();
+  int32_t reason = -1;
+  ASSERT_EQ(0, create("NEWI", 1, ".\\kxluser", 1, nullptr, 0, &reason, "KXLCLUS"));
+  EXPECT_EQ(reason, 0);
+  EXPECT_EQ(regString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\NEWI", "KXLCLUSTER"),
+            "KXLCLUS");
+  EXPECT_NE(readText("C:\\windows\\system32\\drivers\\etc\\services").find("KXLTS_NEWI"), std::string::npos);
+  ASSERT_EQ(0, sqlo_instance_drop("NEWI", "C:\\inst\\NEWI"));
+  EXPECT_EQ(diff(), "");
+}
+
+TEST_F(Instances, DropAfterReCreatingAnExistingInstancePutsItBack) {
+  std::string dir = std::string(kOldCopy) + "\\INST1";
+  snapshot();
+  int32_t extra = -1, reason = -1;
+  ASSERT_EQ(0, sqlo_instance_create_extended("INST1", kOldCopy, kCopy, 0, nullptr, nullptr, 0, 1, 1, nullptr,
+                                             1, 1, 0, nullptr, 0, &reason, &extra));
+  EXPECT_EQ(regString(kInstances + std::string("INST1"), "Copy"), "KXL101");
+  EXPECT_EQ(regString(kServices + std::string("INST1"), "ImagePath"),
+            std::string(kCopy) + "\\bin\\kxlsyscs.exe");
+  EXPECT_EQ(regDword(kServices + std::string("INST1"), "Start"), 2u) << "the start type stays";
+  EXPECT_NE(readText(dir + "\\security\\kxlaudit.cfg"), "") << "other files of the directory stay";
+  ASSERT_EQ(0, sqlo_instance_drop("INST1", dir.c_str()));
+  EXPECT_EQ(diff(), "");
+}
+
+TEST_F(Instances, DropOfAnInstanceNotCreatedHereRemovesEveryTrace) {
+  ASSERT_EQ(0, sqlo_instance_drop("INST2", nullptr));
+  EXPECT_FALSE(keyExists(kInstances + std::string("INST2")));
+  EXPECT_FALSE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST2"));
+  EXPECT_FALSE(keyExists(kServices + std::string("INST2-0")));
+  EXPECT_TRUE(keyExists(std::string(kRemote) + kServices + "INST2-1")) << "other machines are not touched";
+  EXPECT_EQ(GetFileAttributesA((std::string(kOldCopy) + "\\INST2").c_str()), INVALID_FILE_ATTRIBUTES);
+  EXPECT_EQ(SQLO_RC_NOT_FOUND, sqlo_instance_drop("INST2", nullptr));
+  EXPECT_TRUE(keyExists(kInstances + std::string("INST1")));
+}
+
+TEST_F(Instances, TextSearchReportsWhyItCouldNotBeConfigured) {
+  int32_t reason = -1;
+  ASSERT_EQ(0, create("TSA", 1, nullptr, 1, "kxltsa", 60002, &reason));
+  EXPECT_EQ(reason, 1) << "60002 lies in INST2's range";
+  ASSERT_EQ(0, create("TSB", 1, nullptr, 1, "KXL_INST1", 50001, &reason));
+  EXPECT_EQ(reason, 2) << "the name is taken with another port";
+  ASSERT_EQ(0, create("TSC", 2, nullptr, 1, nullptr, 0, &reason));
+  EXPECT_EQ(reason, 4) << "a client has no text search";
+  ASSERT_EQ(0, create("TSD", 1, nullptr, 1, nullptr, 0, &reason));
+  EXPECT_EQ(reason, 0);
+  EXPECT_NE(readText("C:\\windows\\system32\\drivers\\etc\\services").find("KXLTS_TSD          55000/tcp"),
+            std::string::npos);
+}
+
+TEST_F(Instances, PartitionEntriesAddAndRemoveTheirService) {
+  snapshot();
+  SQLO_INST_OUT out1{}, out2{};
+  ASSERT_EQ(0, create("PART", 4));
+  ASSERT_EQ(0, sqlo_instance_addnode("PART", 0, nullptr, 0, nullptr, nullptr, &out1, &out2));
+  EXPECT_EQ(regString(kServices + std::string("PART-0"), "DisplayName"), "KXL - KXL101 - PART-0");
+  ASSERT_EQ(0, sqlo_instance_addnode("PART", 1, "winsrv2", 0, nullptr, nullptr, &out1, &out2));
+  EXPECT_TRUE(keyExists(std::string(kRemote) + kServices + "PART-1"));
+  EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE,
+            sqlo_instance_addnode("PART", 2, "nohost", 0, nullptr, nullptr, &out1, &out2));
+  EXPECT_EQ(out2.code, SQLO_RC_MACHINE_UNREACHABLE);
+  ASSERT_EQ(0, sqlo_instance_delnode("PART", 1, "winsrv2", 0, &out1, &out2));
+  ASSERT_EQ(0, sqlo_instance_delnode("PART", 0, nullptr, 0, &out1, &out2));
+  EXPECT_EQ(SQLO_RC_SVC_NOT_FOUND, sqlo_instance_delnode("PART", 0, nullptr, 0, &out1, &out2));
+  ASSERT_EQ(0, sqlo_instance_drop("PART", nullptr));
+  EXPECT_EQ(diff(), "");
+}
+
+TEST_F(Instances, ReAddingAnExistingPartitionAndRemovingItRestoresTheService) {
+  ASSERT_EQ(0, sqlo_instance_create_extended("INST2", kOldCopy, kCopy, 0, nullptr, nullptr, 0, 4, 4, nullptr,
+                                             1, 1, 0, nullptr, 0, nullptr, nullptr));
+  snapshot();
+  SQLO_INST_OUT out1{}, out2{};
+  ASSERT_EQ(0, sqlo_instance_addnode("INST2", 0, nullptr, 0, nullptr, nullptr, &out1, &out2));
+  EXPECT_EQ(regString(kServices + std::string("INST2-0"), "ImagePath"),
+            std::string(kCopy) + "\\bin\\kxlsyscs.exe");
+  EXPECT_EQ(regString(kServices + std::string("INST2-0"), "ObjectName"), ".\\kxlsvc") << "the account stays";
+  ASSERT_EQ(0, sqlo_instance_delnode("INST2", 0, nullptr, 0, &out1, &out2));
+  EXPECT_EQ(diff(), "");
+}
+
+TEST_F(Instances, InjectedFailuresChangeNothing) {
+  snapshot();
+  failCalls("sqlo_instance_create_extended:1,sqlo_instance_addnode:1,sqlo_instance_drop:1");
+  EXPECT_NE(0, create("NEWF", 1));
+  SQLO_INST_OUT out1{}, out2{};
+  EXPECT_NE(0, sqlo_instance_addnode("INST1", 0, nullptr, 0, nullptr, nullptr, &out1, &out2));
+  EXPECT_NE(out2.code, 0);
+  EXPECT_NE(0, sqlo_instance_drop("INST1", nullptr));
+  EXPECT_EQ(diff(), "");
+  failCalls("RegSetValueExA:3");
+  EXPECT_NE(0, create("NEWF", 1)) << "a failed registry write part way";
+  EXPECT_EQ(diff(), "") << "what was written is taken back";
+}
+
+} // namespace
+} // namespace kxltest

@@ -1,0 +1,81 @@
+// The work of the audit and SSL configuration programs and of the profile
+// clean-up, and the programs run by name inside a world.
+#include "demo_world.h"
+
+#include "sim/posix/world.h"
+#include "sim/tools/tool_actions.h"
+
+#include <sys/wait.h>
+
+#include <fstream>
+
+namespace kxltest {
+namespace {
+
+class Tools : public DemoWorld {
+protected:
+  // Runs the copy's program from its bin folder; its exit code.
+  int run(const std::string &program, const std::string &args) {
+    std::string host;
+    EXPECT_TRUE(kxlsim::posix::hostPath(std::string(kCopy) + "\\bin\\" + program, host));
+    std::string command =
+        "KXLSIM_ROOT='" + root() + "' KXLINSTANCE=INST1 '" + host + "' " + args + " 2>/dev/null";
+    int status = std::system(command.c_str());
+    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  }
+  static constexpr const char *kAudit = "C:\\Program Files\\ZAV\\KXL95\\INST1\\security\\kxlaudit.cfg";
+};
+
+TEST_F(Tools, AuditConfigurationIsMarkedOnceForTheCopy) {
+  setInstance("INST1");
+  std::string before = readText(kAudit);
+  kxlsim::upgradeAuditConfig("KXL95");
+  kxlsim::upgradeAuditConfig("KXL101");
+  EXPECT_EQ(readText(kAudit), before + "# upgraded for copy KXL101\r\n") << "the earlier mark is replaced";
+  setInstance("INST2");
+  snapshot();
+  kxlsim::upgradeAuditConfig("KXL101");
+  EXPECT_EQ(diff(), "") << "no audit settings, nothing created";
+}
+
+TEST_F(Tools, SslConfigurationMarksOnlyFilesThatExist) {
+  ASSERT_TRUE(CreateDirectoryA("C:\\ssl", nullptr));
+  writeFile("C:\\ssl\\SSLconfig.ini", {'[', 's', ']', '\r', '\n'});
+  snapshot();
+  EXPECT_EQ(0, kxlsim::upgradeSslConfig(
+                   "KXL101", {"-c", "\"C:\\ssl\\SSLClientconfig.ini\"", "-s", "\"C:\\ssl\\SSLconfig.ini\""}));
+  EXPECT_EQ(diff(), "file ~ C:\\ssl\\SSLconfig.ini\n       + ; upgraded for copy KXL101\n");
+  EXPECT_EQ(2, kxlsim::upgradeSslConfig("KXL101", {"-c", "x"}));
+}
+
+TEST_F(Tools, CleanupRemovesProfilesOfUnknownInstancesOfItsCopyOnly) {
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\GONE", "KXLPORTRANGE", "1:2");
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\GONE2", "KXLPORTRANGE", "1:2");
+  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1", "KXLPORTRANGE", "1:2");
+  kxlsim::cleanProfiles("KXL101", {"-list"});
+  EXPECT_TRUE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\GONE"));
+  kxlsim::cleanProfiles("KXL101", {"-cleanup"});
+  EXPECT_FALSE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\GONE"));
+  EXPECT_TRUE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1"));
+  EXPECT_TRUE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\GONE2"));
+}
+
+TEST_F(Tools, ProgramsWorkForTheirOwnCopyUnlessConfiguredToFail) {
+  std::string before = readText(kAudit);
+  setDword("SOFTWARE\\ZAV\\KXLSIM\\Tools\\kxlimaudcfg", "ExitCode", 3);
+  EXPECT_EQ(3, run("kxlimaudcfg.exe", ""));
+  EXPECT_EQ(readText(kAudit), before) << "a failing run changes nothing";
+  setDword("SOFTWARE\\ZAV\\KXLSIM\\Tools\\kxlimaudcfg", "ExitCode", 0);
+  EXPECT_EQ(0, run("kxlimaudcfg.exe", ""));
+  EXPECT_EQ(readText(kAudit), before + "# upgraded for copy KXL101\r\n");
+  EXPECT_EQ(2, run("kxlimsslcfg.exe", "-c")) << "usage error";
+  std::ifstream events(root() + "/events.jsonl");
+  std::string line;
+  int runs = 0;
+  while (std::getline(events, line))
+    runs += line.find("\"event\":\"program\"") != std::string::npos ? 1 : 0;
+  EXPECT_EQ(runs, 3) << "every run is recorded, the failing and the misused one too";
+}
+
+} // namespace
+} // namespace kxltest
