@@ -28,8 +28,9 @@ protected:
     EXPECT_EQ(outcome.failures[0].probe, probe);
     EXPECT_EQ(outcome.driverResult, 1231);
     EXPECT_NE(outcome.out.find("\"" + oldWord + "\""), std::string::npos) << outcome.out;
-    if (!newWord.empty())
+    if (!newWord.empty()) {
       EXPECT_NE(outcome.out.find("\"" + newWord + "\""), std::string::npos) << outcome.out;
+    }
     EXPECT_FALSE(exists(kNewInstanceDir));
   }
 };

@@ -1,0 +1,170 @@
+// The single-partition instance of the 9.5 copy upgraded in a fresh demo
+// world, seen only through the programs a user has: kxlsim to build, snapshot
+// and compare the world, and the installed command itself.
+#include <gtest/gtest.h>
+
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <sstream>
+#include <string>
+#include <vector>
+
+namespace {
+
+namespace fs = std::filesystem;
+
+struct Command {
+  int exitCode = -1;
+  std::string out;
+};
+
+// Runs a shell command line, standard output captured (bounded reads).
+Command runShell(const std::string &line) {
+  Command result;
+  FILE *pipe = popen(line.c_str(), "r");
+  if (pipe == nullptr)
+    return result;
+  char chunk[4096];
+  std::size_t n = 0;
+  while ((n = std::fread(chunk, 1, sizeof chunk, pipe)) > 0)
+    result.out.append(chunk, n);
+  int status = pclose(pipe);
+  result.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  return result;
+}
+
+std::string shellWord(const std::string &text) {
+  return "'" + text + "'";
+}
+
+void writeHostFile(const fs::path &path, const std::string &text) {
+  fs::create_directories(path.parent_path());
+  std::ofstream(path, std::ios::binary) << text;
+}
+
+// Everything the upgrade changes, and nothing else: the profile key moved,
+// the instance registered under the current copy, its service re-pointed (its
+// start type unchanged), the converted kxlsystm, the carried files and the
+// function directory, the database check's own files, the audit settings the
+// audit tool rewrote, and the events of the programs run and the audit. No
+// backup directory is left under C:\windows\temp.
+const char kExpectedChanges[] = R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\INST1
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\INST1 "Copy": "KXL95" -> "KXL101"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\INST1 "Directory": "C:\Program Files\ZAV\KXL95\INST1" -> "C:\Program Files\ZAV\KXL101\INST1"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\INST1 "DisplayName": "KXL - KXL95 - INST1" -> "KXL - KXL101 - INST1"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\INST1 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry + HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\INST1
+file + C:\KXLDBMIG.TXT (440 bytes, fnv 99c1bf416a879d93)
+       + Database check before an instance upgrade
+       + ==========================================
+       + 
+       + The check program examines every database of the instance before the
+       + instance moves to a newer copy of the product. It writes its findings to
+       + the log file named with -l.
+       + 
+       + Exit codes
+       +   0  every database can be upgraded
+       +   1  warnings were found; the upgrade may go on
+       +   2  the instance has no databases
+       +   3  objects were found that must be corrected first
+file + C:\Program Files\ZAV\KXL101\INST1\bin\rsm.cfg (7 bytes, fnv 35aa26f9d43ca529)
+       + rsm=on
+file + C:\Program Files\ZAV\KXL101\INST1\cfg\djxclassic2.cfg (10 bytes, fnv 7e3507c182162ee6)
+       + classic=2
+file + C:\Program Files\ZAV\KXL101\INST1\cfg\kxldj.ini (13 bytes, fnv 68d4bfd894ea540c)
+       + [federation]
+file + C:\Program Files\ZAV\KXL101\INST1\kxlmd_config.xml (10 bytes, fnv 3ad5b3eae5479aea)
+       + <config/>
+file + C:\Program Files\ZAV\KXL101\INST1\kxlsystm (16384 bytes, fnv 3920934884e75c52)
+file + C:\Program Files\ZAV\KXL101\INST1\security\kxlaudit.cfg (120 bytes, fnv cbc80e32e98b4190)
+       + # audit settings of INST1
+       + active = yes
+       + errortype = normal
+       + admin = both
+       + instance = both
+       + # upgraded for copy KXL101
+file + C:\Program Files\ZAV\KXL101\function\kxludf.dll (42 bytes, fnv d5018ea7f0c59122)
+       + MZ user functions of the KXL95 instances
+file + C:\upgrade.log (62 bytes, fnv 9b1eb0d4870202bd)
+       + Database check of instance "INST1" finished.
+       + Result code: 0
+file + events.jsonl (805 bytes, fnv d398b08fdd4bb417)
+       + {"KXLINSTANCE":"INST1","argc":"7","args":"-h -m -not1 -l C:\\upgrade.log -t C:","cwd":"C:\\","event":"program","program":"kxlckupgrade.exe"}
+       + {"KXLINSTANCE":"INST1","argc":"0","args":"","cwd":"C:\\","event":"program","program":"kxlimaudcfg.exe"}
+       + {"KXLINSTANCE":"INST1","argc":"4","args":"-c C:\\Program Files\\ZAV\\KXL95\\INST1\\SSLClientconfig.ini -s C:\\Program Files\\ZAV\\KXL95\\INST1\\SSLconfig.ini","cwd":"C:\\","event":"program","program":"kxlimsslcfg.exe"}
+       + {"KXLINSTANCE":"INST1","argc":"1","args":"-cleanup","cwd":"C:\\","event":"program","program":"kxlset.exe"}
+       + {"audit_event":"53","category":"0x80000000","errortype":"0","event":"audit","instance":"INST1","sqlcode":"0"}
+       + {"audit_event":"1","category":"0x20000000","data":"INST1","errortype":"0","event":"audit","instance":"INST1","sqlcode":"0"}
+)";
+
+class UpgradeE2eTest : public ::testing::Test {
+protected:
+  void SetUp() override {
+    std::string pattern = (fs::temp_directory_path() / "kxle2e.XXXXXX").string();
+    ASSERT_NE(mkdtemp(pattern.data()), nullptr);
+    temp = pattern;
+    world = temp + "/world";
+    Command created = runShell(std::string(KXL_KXLSIM) + " create " + shellWord(world) + " --command " +
+                               shellWord(KXL_COMMAND) + " 2>&1");
+    ASSERT_EQ(created.exitCode, 0) << created.out;
+  }
+
+  void TearDown() override {
+    std::error_code ignored;
+    if (!HasFailure())
+      fs::remove_all(temp, ignored);
+    else
+      std::cerr << "world kept in " << temp << '\n';
+  }
+
+  fs::path drivePath(const std::string &relative) const { return fs::path(world) / "drive_c" / relative; }
+
+  std::string temp;
+  std::string world;
+};
+
+// The four optional files of an instance, as the demo instance does not have them.
+void addOptionalFiles(const fs::path &instanceDir) {
+  writeHostFile(instanceDir / "cfg" / "kxldj.ini", "[federation]\n");
+  writeHostFile(instanceDir / "cfg" / "djxclassic2.cfg", "classic=2\n");
+  writeHostFile(instanceDir / "bin" / "rsm.cfg", "rsm=on\n");
+  writeHostFile(instanceDir / "kxlmd_config.xml", "<config/>\n");
+}
+
+// The converted file has the current release's layout: release word 0x0D00
+// at byte 16, level 10100 at byte 20, and 16384 bytes.
+void expectCurrentLayout(const fs::path &path) {
+  std::ifstream in(path, std::ios::binary);
+  std::vector<unsigned char> image((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
+  ASSERT_EQ(image.size(), 16384u);
+  EXPECT_EQ(image[16] | image[17] << 8, 0x0D00);
+  EXPECT_EQ(image[20] | image[21] << 8 | image[22] << 16 | image[23] << 24, 10100);
+}
+
+TEST_F(UpgradeE2eTest, SinglePartitionInstanceMovesToTheCurrentCopy) {
+  addOptionalFiles(drivePath("Program Files/ZAV/KXL95/INST1"));
+  std::string before = temp + "/before";
+  ASSERT_EQ(
+      runShell(std::string(KXL_KXLSIM) + " snapshot " + shellWord(world) + " " + shellWord(before)).exitCode,
+      0);
+
+  std::string command = drivePath("Program Files/ZAV/KXL101/bin/kxliupgrade.exe").string();
+  Command upgrade =
+      runShell("cd " + shellWord(world) + " && env -u KXLINSTANCE -u KXLSIM_FAIL -u TMP -u TEMP " +
+               "KXLSIM_ROOT=" + shellWord(world) + " " + shellWord(command) + " INST1 2>&1");
+  EXPECT_EQ(upgrade.exitCode, 0) << upgrade.out;
+  EXPECT_NE(upgrade.out.find("KXLIUPGRADE"), std::string::npos) << upgrade.out;
+
+  Command diff = runShell(std::string(KXL_KXLSIM) + " diff " + shellWord(before) + " " + shellWord(world));
+  EXPECT_EQ(diff.exitCode, 1);
+  EXPECT_EQ(diff.out, kExpectedChanges);
+  expectCurrentLayout(drivePath("Program Files/ZAV/KXL101/INST1/kxlsystm"));
+}
+
+} // namespace
