@@ -1,5 +1,7 @@
 #include "sim/kxlsim/scenarios.h"
 
+#include "sim/posix/regfile.h"
+
 namespace kxlsim {
 
 namespace {
@@ -191,7 +193,13 @@ bool createWorld(const std::string &hostDir, const std::string &scenarioName, co
     return false;
   }
   WorldWriter w;
-  scenario->build(w, sources);
+  {
+    // Nothing else uses the new world yet: write each hive once, not once per value.
+    kxlsim::posix::hive::WriteBatch batch;
+    scenario->build(w, sources);
+    if (!batch.commit())
+      w.note("the registry of the new world could not be written");
+  }
   errors = w.errors();
   return w.ok();
 }

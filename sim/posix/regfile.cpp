@@ -1,6 +1,8 @@
 // REGEDIT4 hive files: text form, parsing, locking and atomic write-through.
 #include "sim/posix/regfile.h"
 
+#include <algorithm>
+
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
@@ -444,12 +446,23 @@ bool sameFile(int heldFd, const struct stat &now, long long size, long long mtim
          now.st_size == size && mtimeOf(now) == mtimeNs;
 }
 
+int batchDepth = 0;
+std::vector<HiveFile *> &liveHives() {
+  static std::vector<HiveFile *> hives;
+  return hives;
+}
+
 } // namespace
 
 HiveFile::HiveFile(std::string path, std::string rootName)
-    : path_(std::move(path)), rootName_(std::move(rootName)) {}
+    : path_(std::move(path)), rootName_(std::move(rootName)) {
+  liveHives().push_back(this);
+}
 
 HiveFile::~HiveFile() {
+  flush();
+  std::vector<HiveFile *> &hives = liveHives();
+  hives.erase(std::remove(hives.begin(), hives.end(), this), hives.end());
   forget();
 }
 
@@ -529,6 +542,8 @@ bool HiveFile::writeThrough() {
 }
 
 LONG HiveFile::read(const std::function<LONG(const Key &)> &reader) {
+  if (dirty_)
+    return reader(tree_); // the batch's own changes are the current content
   FolderLock lock(path_, LOCK_SH);
   if (!lock.held() || !refresh())
     return ERROR_CANTREAD;
@@ -536,6 +551,17 @@ LONG HiveFile::read(const std::function<LONG(const Key &)> &reader) {
 }
 
 LONG HiveFile::update(const std::function<LONG(Key &, bool &changed)> &writer) {
+  if (batchDepth > 0) {
+    if (!dirty_) {
+      FolderLock lock(path_, LOCK_SH);
+      if (!lock.held() || !refresh())
+        return ERROR_CANTREAD;
+    }
+    bool changed = false;
+    LONG rc = writer(tree_, changed);
+    dirty_ = dirty_ || changed;
+    return rc;
+  }
   FolderLock lock(path_, LOCK_EX);
   if (!lock.held() || !refresh())
     return ERROR_CANTREAD;
@@ -548,6 +574,37 @@ LONG HiveFile::update(const std::function<LONG(Key &, bool &changed)> &writer) {
     return rc != ERROR_SUCCESS ? rc : ERROR_CANTWRITE;
   }
   return ERROR_SUCCESS;
+}
+
+bool HiveFile::flush() {
+  if (!dirty_)
+    return true;
+  dirty_ = false;
+  FolderLock lock(path_, LOCK_EX);
+  if (lock.held() && writeThrough())
+    return true;
+  forget();
+  return false;
+}
+
+WriteBatch::WriteBatch() {
+  ++batchDepth;
+}
+
+WriteBatch::~WriteBatch() {
+  commit();
+}
+
+bool WriteBatch::commit() {
+  if (!open_)
+    return true;
+  open_ = false;
+  if (--batchDepth > 0)
+    return true;
+  bool ok = true;
+  for (HiveFile *hive : liveHives())
+    ok = hive->flush() && ok;
+  return ok;
 }
 
 } // namespace kxlsim::posix::hive

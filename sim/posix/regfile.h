@@ -79,6 +79,9 @@ public:
 
   const std::string &path() const { return path_; }
 
+  // Writes the tree through when a batch deferred changes to it.
+  bool flush();
+
 private:
   bool refresh();
   bool writeThrough();
@@ -91,6 +94,25 @@ private:
   int heldFd_ = -1; // keeps the loaded file's inode from being reused
   long long size_ = -1;
   long long mtimeNs_ = 0;
+  bool dirty_ = false; // changed during a batch, not written yet
+};
+
+// While a batch is alive in this process, changes are kept in memory and every
+// changed hive is written once when the outermost batch ends. Only for building
+// a world that no other process uses yet: a batch holds back what other
+// processes would see. Batches nest.
+class WriteBatch {
+public:
+  WriteBatch();
+  ~WriteBatch();
+  WriteBatch(const WriteBatch &) = delete;
+  WriteBatch &operator=(const WriteBatch &) = delete;
+
+  // Ends the batch early; false when a hive could not be written.
+  bool commit();
+
+private:
+  bool open_ = true;
 };
 
 } // namespace kxlsim::posix::hive

@@ -142,5 +142,37 @@ TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
+// A batch keeps its changes in this process until it ends, then writes each
+// changed hive once; the file (what other processes read) shows nothing of it
+// before that and all of it after.
+TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
+  auto fileHas = [this](const char *text) {
+    return readText(root + "/system.reg").find(text) != std::string::npos;
+  };
+  std::string before = readText(root + "/system.reg");
+  {
+    posix::hive::WriteBatch outer;
+    HKEY key = createKey("SOFTWARE\\Batch");
+    ASSERT_EQ(setDword(key, "First", 1), ERROR_SUCCESS);
+    {
+      posix::hive::WriteBatch inner; // nested: only the outermost one writes
+      ASSERT_EQ(setDword(key, "Second", 2), ERROR_SUCCESS);
+    }
+    DWORD seen = 0;
+    EXPECT_EQ(getDword(key, "Second", seen), ERROR_SUCCESS); // this process sees its own changes
+    EXPECT_EQ(seen, 2u);
+    EXPECT_EQ(readText(root + "/system.reg"), before);
+    EXPECT_TRUE(outer.commit());
+    EXPECT_TRUE(fileHas("\"First\"=dword:00000001"));
+    EXPECT_TRUE(fileHas("\"Second\"=dword:00000002"));
+    EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
+  }
+  // After the batch, changes are written through at once again.
+  HKEY key = createKey("SOFTWARE\\Batch");
+  ASSERT_EQ(setDword(key, "Third", 3), ERROR_SUCCESS);
+  EXPECT_TRUE(fileHas("\"Third\"=dword:00000003"));
+  EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
+}
+
 } // namespace
 } // namespace kxlsim::testing
