@@ -74,8 +74,8 @@ protected:
   }
 
   // KXLSIM_FAIL for the rest of the case ("name:n,...").
-  static void failCalls(const char *spec) {
-    setProcessVariable("KXLSIM_FAIL", spec);
+  static void failCalls(const char *faults) {
+    setProcessVariable("KXLSIM_FAIL", faults);
     kxlsim::resetFaults();
   }
 
