@@ -28,20 +28,21 @@ private:
   HKEY key_ = nullptr;
 };
 
-// The value at `index`; false at the end of the key or on an error.
-bool enumValue(HKEY key, DWORD index, KeySnapshot::Value &value) {
+// The value at `index`: ERROR_SUCCESS, ERROR_NO_MORE_ITEMS at the end, or the failure.
+LONG enumValue(HKEY key, DWORD index, KeySnapshot::Value &value) {
   char name[16384];
   DWORD nameSize = sizeof name;
   std::vector<uint8_t> data(kMaxSnapshotValueBytes);
   DWORD dataSize = static_cast<DWORD>(data.size());
   DWORD type = REG_NONE;
-  if (RegEnumValueA(key, index, name, &nameSize, nullptr, &type, data.data(), &dataSize) != ERROR_SUCCESS)
-    return false;
+  LONG rc = RegEnumValueA(key, index, name, &nameSize, nullptr, &type, data.data(), &dataSize);
+  if (rc != ERROR_SUCCESS)
+    return rc;
   value.name.assign(name, nameSize < sizeof name ? nameSize : sizeof name - 1);
   value.type = type;
   data.resize(dataSize < data.size() ? dataSize : data.size());
   value.data = std::move(data);
-  return true;
+  return ERROR_SUCCESS;
 }
 
 bool inSnapshot(const KeySnapshot &snapshot, const std::string &name) {
@@ -141,8 +142,10 @@ KeySnapshot takeKeySnapshot(HKEY root, const std::string &path) {
     return snapshot;
   snapshot.existed = true;
   KeySnapshot::Value value;
-  for (DWORD index = 0; enumValue(key.get(), index, value); ++index)
+  LONG rc = ERROR_SUCCESS;
+  for (DWORD index = 0; (rc = enumValue(key.get(), index, value)) == ERROR_SUCCESS; ++index)
     snapshot.values.push_back(value);
+  snapshot.complete = rc == ERROR_NO_MORE_ITEMS;
   return snapshot;
 }
 
@@ -156,8 +159,10 @@ void restoreKeySnapshot(HKEY root, const std::string &path, const KeySnapshot &s
   if (RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_ALL_ACCESS, nullptr,
                       key.out(), nullptr) != ERROR_SUCCESS)
     return;
+  // Values added since are removed only when the snapshot holds every value
+  // the key had: an incomplete one must never cost a value.
   for (const KeySnapshot::Value &value : now.values)
-    if (!inSnapshot(snapshot, value.name))
+    if (snapshot.complete && !inSnapshot(snapshot, value.name))
       RegDeleteValueA(key.get(), value.name.c_str());
   for (const KeySnapshot::Value &value : snapshot.values)
     RegSetValueExA(key.get(), value.name.c_str(), 0, value.type, value.data.data(),

@@ -53,6 +53,7 @@ struct KeySnapshot {
     std::vector<uint8_t> data;
   };
   bool existed = false;
+  bool complete = false; // every value could be read
   std::vector<Value> values;
 };
 
