@@ -11,7 +11,7 @@ namespace drivertest {
 namespace {
 
 // Codes of the product library that the driver passes on unchanged.
-constexpr long long kIoError = static_cast<int32_t>(0x870F0004u);
+constexpr long long kAccessDenied = static_cast<int32_t>(0x870F0003u);
 constexpr long long kExecFailed = static_cast<int32_t>(0x870F0140u);
 constexpr long long kPathNotFound = static_cast<int32_t>(0x870F0011u);
 
@@ -42,7 +42,7 @@ protected:
   void expectUndone() {
     EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
     EXPECT_FALSE(keyExists(profileKey("KXL101", "INST1")));
-    EXPECT_EQ(tree(kOldInstanceDir), before);
+    EXPECT_EQ(treeDifferences(before, tree(kOldInstanceDir)), "");
     EXPECT_FALSE(hasBackup(tempEntries()));
   }
 
@@ -80,7 +80,7 @@ TEST_F(DriverFailureTest, ProfilePathWithTheInstanceAlreadyThereChangesNothing) 
   Tree profileBefore = tree("C:\\Profiles");
   Outcome outcome = run({"-p", "C:\\Profiles", "INST1"});
   expectFailure(outcome, 70, -1959);
-  EXPECT_EQ(tree("C:\\Profiles"), profileBefore);
+  EXPECT_EQ(treeDifferences(profileBefore, tree("C:\\Profiles")), "");
   EXPECT_FALSE(exists(kNewInstanceDir));
   expectUndone();
 }
@@ -145,12 +145,13 @@ TEST_F(DriverFailureTest, AuthenticationTypeNotSetIsMinusOne) {
   expectUndone();
 }
 
-TEST_F(DriverFailureTest, CarriedFileCopyFailingEndsWithItsCode) {
+TEST_F(DriverFailureTest, CarriedFileThatCannotBeCopiedEndsWithItsCode) {
+  // A folder where the file should be cannot be copied as a file.
   world.writeText(std::string(kOldInstanceDir) + "\\cfg\\kxldj.ini", "[federation]\n");
+  world.makeDirectory(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
   before = tree(kOldInstanceDir);
-  // Copies of the run: the audit settings aside and back, then the carried files.
-  Outcome outcome = run({"INST1"}, "sqlocopy:3");
-  expectFailure(outcome, 150, kIoError);
+  Outcome outcome = run({"INST1"});
+  expectFailure(outcome, 170, kAccessDenied);
   expectUndone();
 }
 
@@ -162,6 +163,16 @@ TEST_F(DriverFailureTest, MissingFunctionDirectoryFailsTheCopy) {
   expectUndone();
 }
 
+TEST_F(DriverFailureTest, InstanceRecreatedInPlaceIsRestoredFromTheBackup) {
+  // With the profile path unchanged the instance is re-created in its own
+  // directory; a later failure puts the old files back.
+  Outcome outcome = run({"-p", kOldCopy, "INST1"}, "sqleInitApplicationEnvironment:1");
+  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+  EXPECT_EQ(outcome.failures[0].probe, 120);
+  EXPECT_LT(outcome.driverResult, 0);
+  expectUndone();
+}
+
 TEST_F(DriverFailureTest, ClusteredInstanceIsRefusedByTheClusterStep) {
   world.setString(kxlsim::localMachine(), profileKey("KXL95", "INST1"), "KXLCLUSTER", "KXLCL1");
   Outcome outcome = run({"INST1"});
@@ -170,7 +181,7 @@ TEST_F(DriverFailureTest, ClusteredInstanceIsRefusedByTheClusterStep) {
   EXPECT_EQ(outcome.failures.back().probe, 200);
   EXPECT_EQ(outcome.driverResult, -1);
   EXPECT_NE(outcome.err.find("clustered"), std::string::npos);
-  EXPECT_EQ(tree(kOldInstanceDir), before);
+  EXPECT_EQ(treeDifferences(before, tree(kOldInstanceDir)), "");
   EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
 }
 

@@ -71,6 +71,21 @@ std::string profileKey(const std::string &copyName, const std::string &instance)
   return kxlsim::copyRegistryKey(copyName) + "\\PROFILES\\" + instance;
 }
 
+std::string treeDifferences(const Tree &before, const Tree &after) {
+  std::string lines;
+  for (const auto &[name, content] : before) {
+    auto found = after.find(name);
+    if (found == after.end())
+      lines += "- " + name + "\n";
+    else if (found->second != content)
+      lines += "~ " + name + "\n";
+  }
+  for (const auto &entry : after)
+    if (before.find(entry.first) == before.end())
+      lines += "+ " + entry.first + "\n";
+  return lines;
+}
+
 std::string DriverTest::templateDir_;
 
 void DriverTest::SetUpTestSuite() {

@@ -67,6 +67,9 @@ private:
   int runs_ = 0;
 };
 
+// The files that differ between two trees, one name a line ("" when equal).
+std::string treeDifferences(const Tree &before, const Tree &after);
+
 // The profile key of an instance under a copy.
 std::string profileKey(const std::string &copyName, const std::string &instance);
 

@@ -3,6 +3,8 @@
 // quoted profile paths.
 #include "driver_fixture.h"
 
+#include <algorithm>
+
 namespace drivertest {
 namespace {
 
@@ -10,10 +12,13 @@ constexpr const char *kUninstall = "SOFTWARE\\Microsoft\\Windows\\CurrentVersion
 
 class DriverOutcomeTest : public DriverTest {
 protected:
-  // Replaces the current copy's server edition by the product `code`,
-  // registered with Windows Installer at the copy under `productCode`.
-  void replaceServerEdition(const std::string &code, const std::string &productCode) {
-    removeTree(std::string(kCurrentCopy) + "\\CFG\\kxlhpe.lvl");
+  // Leaves the current copy with `keep` (product codes) of its products, and
+  // adds the product `code` registered with Windows Installer at the copy.
+  void setProducts(const std::vector<std::string> &keep, const std::string &code = "",
+                   const std::string &productCode = "") {
+    for (const char *installed : {"hpe", "cli", "zqc"})
+      if (std::find(keep.begin(), keep.end(), installed) == keep.end())
+        removeTree(std::string(kCurrentCopy) + "\\CFG\\kxl" + installed + ".lvl");
     if (code.empty())
       return;
     world.writeText(std::string(kCurrentCopy) + "\\CFG\\kxl" + code + ".lvl", "level\n");
@@ -21,39 +26,47 @@ protected:
                     std::string(kCurrentCopy) + "\\");
   }
 
-  void expectEditionMismatch(const Outcome &outcome, long long probe, const std::string &oldWord,
-                             const std::string &newWord) {
+  // 1231 at `probe`, the message naming the instance's type and the type the
+  // copy's last-ranked product hosts; nothing copied.
+  void expectEditionMismatch(const Outcome &outcome, long long probe, const std::string &tokens) {
     ASSERT_TRUE(outcome.driverRan) << outcome.out << outcome.err;
     ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
     EXPECT_EQ(outcome.failures[0].probe, probe);
     EXPECT_EQ(outcome.driverResult, 1231);
-    EXPECT_NE(outcome.out.find("\"" + oldWord + "\""), std::string::npos) << outcome.out;
-    if (!newWord.empty()) {
-      EXPECT_NE(outcome.out.find("\"" + newWord + "\""), std::string::npos) << outcome.out;
-    }
+    EXPECT_NE(outcome.out.find(tokens), std::string::npos) << outcome.out;
     EXPECT_FALSE(exists(kNewInstanceDir));
   }
 };
 
 TEST_F(DriverOutcomeTest, CopyWithoutServerEditionCannotHostAStandaloneInstance) {
-  replaceServerEdition("", "");
+  // The client packages host no instance (-1): the second type has no word.
+  setProducts({"cli", "zqc"});
   Outcome outcome = run({"INST1"});
-  expectEditionMismatch(outcome, 17, "STANDALONE", "");
+  expectEditionMismatch(outcome, 17, "type STANDALONE cannot");
+  EXPECT_NE(outcome.out.find("type  only"), std::string::npos) << outcome.out;
   EXPECT_EQ(outcome.exitCode, 1231 & 0xFF);
   EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
 }
 
+TEST_F(DriverOutcomeTest, CopyWithoutProductsNamesTypeZero) {
+  setProducts({});
+  Outcome outcome = run({"INST1"});
+  expectEditionMismatch(outcome, 17, "type STANDALONE cannot");
+}
+
 TEST_F(DriverOutcomeTest, PartitionedInstanceNeedsAPartitionedEdition) {
-  replaceServerEdition("tlv", "{6E1C2A45-9F3B-4D21-8A10-5B2C7D0E9A01}");
+  setProducts({}, "tlv", "{6E1C2A45-9F3B-4D21-8A10-5B2C7D0E9A01}");
   Outcome outcome = run({"-install", "-u", "KXLADMIN,secret", "INST2"});
-  // The Talven edition hosts node type 3, the second token.
-  expectEditionMismatch(outcome, 12, "PARTITIONED", "SERVER");
+  // The Talven edition hosts node type 3.
+  expectEditionMismatch(outcome, 12, "type PARTITIONED cannot");
+  EXPECT_NE(outcome.out.find("type SERVER only"), std::string::npos) << outcome.out;
 }
 
 TEST_F(DriverOutcomeTest, SolentEditionHostsServerButNotStandaloneInstances) {
-  replaceServerEdition("sol", "{6E1C2A46-9F3B-4D21-8A10-5B2C7D0E9A01}");
+  setProducts({}, "sol", "{6E1C2A46-9F3B-4D21-8A10-5B2C7D0E9A01}");
   Outcome standalone = run({"INST1"});
-  expectEditionMismatch(standalone, 17, "STANDALONE", "SERVER");
+  expectEditionMismatch(standalone, 17, "type STANDALONE cannot");
+  EXPECT_NE(standalone.out.find("type SERVER only"), std::string::npos) << standalone.out;
   Outcome server = run({"V8INST"});
   ASSERT_TRUE(server.driverRan) << server.out << server.err;
   for (const DriverFailure &failure : server.failures)
@@ -89,11 +102,27 @@ TEST_F(DriverOutcomeTest, VersionEightProfileKeyMovesAndIsDeleted) {
 }
 
 TEST_F(DriverOutcomeTest, QuotedProfilePathKeepsItsQuotes) {
+  // Every path formed from the quoted profile path names a place inside the
+  // quoted folder: the copy of the instance directory and the audit settings
+  // kept aside both land there, whatever the later steps do.
   world.makeDirectory("C:\\Quoted Profiles");
   Outcome outcome = run({"-p", "\"C:\\Quoted Profiles\"", "INST1"});
-  EXPECT_EQ(outcome.driverResult, 0) << outcome.out << outcome.err << outcome.trace;
+  ASSERT_TRUE(outcome.driverRan) << outcome.out << outcome.err;
+  for (const DriverFailure &failure : outcome.failures)
+    EXPECT_GE(failure.probe, 90) << outcome.trace;
   EXPECT_TRUE(exists("C:\\Quoted Profiles\\INST1\\kxlsystm"));
-  EXPECT_TRUE(exists("C:\\Quoted Profiles\\function"));
+  bool auditKept = exists("C:\\Quoted Profiles\\INST1\\security\\kxlauditcopy.cfg");
+  EXPECT_EQ(auditKept, !outcome.failures.empty());
+  EXPECT_TRUE(exists("C:\\Quoted Profiles\\INST1\\security\\kxlaudit.cfg"));
+}
+
+TEST_F(DriverOutcomeTest, CopyToTheNewProfilePathStaysAfterALaterFailure) {
+  world.makeDirectory("C:\\Profiles");
+  Outcome outcome = run({"-p", "C:\\Profiles", "INST1"}, "sqleInitApplicationEnvironment:1");
+  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+  EXPECT_EQ(outcome.failures[0].probe, 120);
+  EXPECT_TRUE(exists("C:\\Profiles\\INST1\\kxlsystm"));
+  EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
 }
 
 } // namespace
