@@ -4,14 +4,18 @@
 #include "sim/kxlsim/world_reader.h"
 
 #include <fcntl.h>
+#include <spawn.h>
 #include <sys/wait.h>
-#include <unistd.h>
 
+#include <algorithm>
 #include <cstdlib>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <regex>
 #include <sstream>
+
+extern char **environ;
 
 namespace drivertest {
 
@@ -21,16 +25,85 @@ namespace {
 
 constexpr const char *kDriverId = "0x18780502";
 
-std::string readHostFile(const std::string &path) {
+// Variables of the test's own environment that the command must not inherit.
+constexpr const char *kScrubbed[] = {"KXLSIM_ROOT", "KXLTRACE", "KXLSIM_FAIL", "KXLINSTANCE", "TMP", "TEMP"};
+
+std::string contentOf(const fs::path &path) {
   std::ifstream in(path, std::ios::binary);
-  std::stringstream text;
-  text << in.rdbuf();
-  return text.str();
+  return std::string(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
 }
 
-std::string newTempDir(const char *prefix) {
-  std::string pattern = (fs::temp_directory_path() / prefix).string() + ".XXXXXX";
-  return mkdtemp(pattern.data()) != nullptr ? pattern : std::string();
+fs::path uniqueDirectory(const std::string &stem) {
+  std::string pattern = (fs::temp_directory_path() / (stem + ".XXXXXX")).string();
+  if (mkdtemp(pattern.data()) == nullptr)
+    return {};
+  return pattern;
+}
+
+// The demo world with the command installed, built once for the program and
+// copied for every case.
+class DemoWorld : public ::testing::Environment {
+public:
+  void SetUp() override {
+    fs::path dir = uniqueDirectory("kxldrv-demo");
+    kxlsim::InstallSources sources{KXL_TOOLS, KXL_COMMAND, KXL_MESSAGES};
+    std::vector<std::string> errors;
+    if (!dir.empty() && kxlsim::createWorld((dir / "world").string(), "demo", sources, errors))
+      built = dir;
+  }
+  void TearDown() override {
+    std::error_code ignored;
+    if (!built.empty())
+      fs::remove_all(built, ignored);
+  }
+  static inline fs::path built;
+};
+
+[[maybe_unused]] const ::testing::Environment *const kDemoWorld =
+    ::testing::AddGlobalTestEnvironment(new DemoWorld);
+
+bool scrubbed(const char *entry) {
+  return std::any_of(std::begin(kScrubbed), std::end(kScrubbed), [entry](const char *name) {
+    std::size_t length = std::strlen(name);
+    return std::strncmp(entry, name, length) == 0 && entry[length] == '=';
+  });
+}
+
+// The command's environment: the test's own, scrubbed, plus `settings`.
+std::vector<std::string> commandEnvironment(const std::vector<std::string> &settings) {
+  std::vector<std::string> entries;
+  for (char **entry = environ; *entry != nullptr; ++entry)
+    if (!scrubbed(*entry))
+      entries.emplace_back(*entry);
+  entries.insert(entries.end(), settings.begin(), settings.end());
+  return entries;
+}
+
+std::vector<char *> pointersTo(std::vector<std::string> &texts) {
+  std::vector<char *> pointers;
+  for (std::string &text : texts)
+    pointers.push_back(text.data());
+  pointers.push_back(nullptr);
+  return pointers;
+}
+
+// Runs `argv` with standard output and error into the two files; exit code.
+int spawnAndWait(std::vector<std::string> argv, std::vector<std::string> environment, const std::string &out,
+                 const std::string &err) {
+  posix_spawn_file_actions_t actions;
+  posix_spawn_file_actions_init(&actions);
+  posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+  posix_spawn_file_actions_addopen(&actions, 2, err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+  std::vector<char *> args = pointersTo(argv);
+  std::vector<char *> env = pointersTo(environment);
+  pid_t child = 0;
+  int started = posix_spawn(&child, args[0], &actions, nullptr, args.data(), env.data());
+  posix_spawn_file_actions_destroy(&actions);
+  if (started != 0)
+    return -1;
+  int status = 0;
+  waitpid(child, &status, 0);
+  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
 void readDriverTrace(const std::string &trace, Outcome &outcome) {
@@ -46,23 +119,6 @@ void readDriverTrace(const std::string &trace, Outcome &outcome) {
       outcome.driverResult = std::stoll(match[1]);
     }
   }
-}
-
-[[noreturn]] void startCommand(const std::string &program, const std::vector<std::string> &args,
-                               const std::string &outFile, const std::string &errFile) {
-  std::vector<char *> argv;
-  argv.push_back(const_cast<char *>(program.c_str()));
-  for (const std::string &arg : args)
-    argv.push_back(const_cast<char *>(arg.c_str()));
-  argv.push_back(nullptr);
-  int out = open(outFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-  int err = open(errFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-  if (out < 0 || err < 0)
-    _exit(126);
-  dup2(out, 1);
-  dup2(err, 2);
-  execv(program.c_str(), argv.data());
-  _exit(127);
 }
 
 } // namespace
@@ -86,93 +142,67 @@ std::string treeDifferences(const Tree &before, const Tree &after) {
   return lines;
 }
 
-std::string DriverTest::templateDir_;
-
-void DriverTest::SetUpTestSuite() {
-  templateDir_ = newTempDir("kxldrv-demo");
-  kxlsim::InstallSources sources{KXL_TOOLS, KXL_COMMAND, KXL_MESSAGES};
-  std::vector<std::string> errors;
-  if (templateDir_.empty() || !kxlsim::createWorld(templateDir_ + "/world", "demo", sources, errors))
-    templateDir_.clear();
-}
-
-void DriverTest::TearDownTestSuite() {
-  std::error_code ignored;
-  if (!templateDir_.empty())
-    fs::remove_all(templateDir_, ignored);
-}
-
 void DriverTest::SetUp() {
-  ASSERT_FALSE(templateDir_.empty()) << "the demo world could not be built";
-  temp_ = newTempDir("kxldrv");
-  ASSERT_FALSE(temp_.empty());
-  root_ = temp_ + "/world";
-  std::error_code ec;
-  fs::copy(templateDir_ + "/world", root_, fs::copy_options::recursive, ec);
-  ASSERT_FALSE(ec) << ec.message();
-  std::string error;
-  ASSERT_TRUE(kxlsim::selectWorld(root_, error)) << error;
+  ASSERT_FALSE(DemoWorld::built.empty()) << "the demo world could not be built";
+  fs::path dir = uniqueDirectory("kxldrv");
+  ASSERT_FALSE(dir.empty());
+  temp_ = dir.string();
+  root_ = (dir / "world").string();
+  std::error_code failure;
+  fs::copy(DemoWorld::built / "world", root_, fs::copy_options::recursive, failure);
+  ASSERT_FALSE(failure) << failure.message();
+  std::string reason;
+  ASSERT_TRUE(kxlsim::selectWorld(root_, reason)) << reason;
 }
 
 void DriverTest::TearDown() {
+  if (HasFailure()) {
+    std::cerr << "the world of this case stays in " << temp_ << '\n';
+    return;
+  }
   std::error_code ignored;
-  if (!HasFailure())
-    fs::remove_all(temp_, ignored);
-  else
-    std::cerr << "world kept in " << temp_ << '\n';
+  fs::remove_all(temp_, ignored);
 }
 
 Outcome DriverTest::run(const std::vector<std::string> &args, const std::string &faults) {
   Outcome outcome;
   std::string tag = temp_ + "/run" + std::to_string(++runs_);
-  std::string trace = tag + ".trace", out = tag + ".out", err = tag + ".err";
-  std::string events = readHostFile(root_ + "/events.jsonl");
-  std::string program = hostPath(std::string(kCurrentCopy) + "\\bin\\kxliupgrade.exe");
-  pid_t child = fork();
-  if (child == 0) {
-    setenv("KXLSIM_ROOT", root_.c_str(), 1);
-    setenv("KXLTRACE", trace.c_str(), 1);
-    if (faults.empty())
-      unsetenv("KXLSIM_FAIL");
-    else
-      setenv("KXLSIM_FAIL", faults.c_str(), 1);
-    unsetenv("KXLINSTANCE");
-    unsetenv("TMP");
-    unsetenv("TEMP");
-    startCommand(program, args, out, err);
-  }
-  int status = 0;
-  waitpid(child, &status, 0);
-  outcome.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  outcome.out = readHostFile(out);
-  outcome.err = readHostFile(err);
-  outcome.trace = readHostFile(trace);
+  std::string eventLog = root_ + "/events.jsonl";
+  std::size_t eventsBefore = contentOf(eventLog).size();
+  std::vector<std::string> argv = {hostPath(std::string(kCurrentCopy) + "\\bin\\kxliupgrade.exe")};
+  argv.insert(argv.end(), args.begin(), args.end());
+  std::vector<std::string> settings = {"KXLSIM_ROOT=" + root_, "KXLTRACE=" + tag + ".trace"};
+  if (!faults.empty())
+    settings.push_back("KXLSIM_FAIL=" + faults);
+  outcome.exitCode = spawnAndWait(argv, commandEnvironment(settings), tag + ".out", tag + ".err");
+  outcome.out = contentOf(tag + ".out");
+  outcome.err = contentOf(tag + ".err");
+  outcome.trace = contentOf(tag + ".trace");
   readDriverTrace(outcome.trace, outcome);
-  std::istringstream added(readHostFile(root_ + "/events.jsonl").substr(events.size()));
+  std::istringstream added(contentOf(eventLog).substr(eventsBefore));
   for (std::string line; std::getline(added, line);)
     outcome.events.push_back(line);
   return outcome;
 }
 
 std::string DriverTest::hostPath(const std::string &windowsPath) const {
-  std::string path = root_ + "/drive_c" + windowsPath.substr(2);
-  for (char &c : path)
-    if (c == '\\')
-      c = '/';
-  while (path.size() > 1 && path.back() == '/')
-    path.pop_back();
-  return path;
+  // "C:\a\b" -> "<world>/drive_c/a/b"
+  std::string relative = windowsPath.substr(std::min<std::size_t>(3, windowsPath.size()));
+  std::replace(relative.begin(), relative.end(), '\\', '/');
+  fs::path path = fs::path(root_) / "drive_c" / relative;
+  std::string text = path.string();
+  while (!text.empty() && text.back() == '/')
+    text.pop_back();
+  return text;
 }
 
 Tree DriverTest::tree(const std::string &windowsPath) const {
   Tree files;
-  std::string base = hostPath(windowsPath);
+  fs::path base = hostPath(windowsPath);
   std::error_code ec;
   for (auto it = fs::recursive_directory_iterator(base, ec); !ec && it != fs::recursive_directory_iterator();
-       it.increment(ec)) {
-    std::string relative = fs::relative(it->path(), base).string();
-    files[relative] = it->is_directory() ? std::string("<dir>") : readHostFile(it->path().string());
-  }
+       it.increment(ec))
+    files[fs::relative(it->path(), base).string()] = it->is_directory() ? "<dir>" : contentOf(it->path());
   return files;
 }
 

@@ -38,8 +38,6 @@ using Tree = std::map<std::string, std::string>;
 
 class DriverTest : public ::testing::Test {
 protected:
-  static void SetUpTestSuite();
-  static void TearDownTestSuite();
   void SetUp() override;
   void TearDown() override;
 
@@ -61,7 +59,6 @@ protected:
   kxlsim::WorldWriter world;
 
 private:
-  static std::string templateDir_;
   std::string temp_;
   std::string root_;
   int runs_ = 0;
