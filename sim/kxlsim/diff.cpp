@@ -1,4 +1,5 @@
 #include "sim/kxlsim/diff.h"
+#include "sim/kxlsim/hostfile.h"
 
 #include "sim/kxlsim/world_writer.h"
 #include "sim/posix/regfile.h"
@@ -6,6 +7,7 @@
 #include <algorithm>
 #include <cctype>
 #include <cstdio>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -35,12 +37,11 @@ void flatten(const reg::Key &key, const std::string &path, FlatHive &out) {
 }
 
 bool loadHive(const fs::path &file, const std::string &rootName, reg::Key &tree, std::string &error) {
-  std::ifstream in(file, std::ios::binary);
-  if (!in) {
+  std::string text;
+  if (!readHostFile(file, text)) {
     error = "cannot read " + file.string();
     return false;
   }
-  std::string text((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
   if (!reg::parseHive(text, rootName, tree, error)) {
     error = file.string() + ": " + error;
     return false;
@@ -204,8 +205,24 @@ std::string displayFilePath(const std::string &relative) {
 }
 
 std::string readAll(const fs::path &path) {
-  std::ifstream in(path, std::ios::binary);
-  return std::string((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
+  std::string bytes;
+  readHostFile(path, bytes);
+  return bytes;
+}
+
+// Compares two files of the same size block by block, without holding either.
+bool sameBytes(const fs::path &a, const fs::path &b) {
+  std::ifstream inA(a, std::ios::binary), inB(b, std::ios::binary);
+  if (!inA || !inB)
+    return false;
+  static char blockA[1 << 16], blockB[1 << 16];
+  while (inA && inB) {
+    inA.read(blockA, sizeof blockA);
+    inB.read(blockB, sizeof blockB);
+    if (inA.gcount() != inB.gcount() || std::memcmp(blockA, blockB, static_cast<size_t>(inA.gcount())) != 0)
+      return false;
+  }
+  return inA.eof() && inB.eof();
 }
 
 uint64_t fnv1a(const std::string &bytes) {
@@ -266,6 +283,10 @@ bool lineDiff(const std::vector<std::string> &a, const std::vector<std::string> 
 }
 
 void diffFile(const std::string &shown, const fs::path &a, const fs::path &b, Report &report) {
+  std::error_code sizeA, sizeB;
+  bool sameSize = fs::file_size(a, sizeA) == fs::file_size(b, sizeB) && !sizeA && !sizeB;
+  if (sameSize && sameBytes(a, b))
+    return;
   std::string bytesA = readAll(a), bytesB = readAll(b);
   if (bytesA == bytesB)
     return;

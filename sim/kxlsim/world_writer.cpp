@@ -1,4 +1,5 @@
 #include "sim/kxlsim/world_writer.h"
+#include "sim/kxlsim/hostfile.h"
 
 #include "sim/posix/world.h"
 
@@ -148,13 +149,12 @@ void WorldWriter::writeText(const std::string &windowsPath, const std::string &t
 
 void WorldWriter::installHostFile(const std::string &hostPath, const std::string &windowsPath,
                                   bool executable) {
-  std::ifstream in(hostPath, std::ios::binary);
-  if (!in) {
+  std::string bytes;
+  if (!readHostFile(hostPath, bytes)) {
     note("cannot read " + hostPath);
     return;
   }
-  std::vector<uint8_t> bytes((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
-  writeFile(windowsPath, bytes);
+  writeFile(windowsPath, std::vector<uint8_t>(bytes.begin(), bytes.end()));
   std::string inWorld;
   // Windows has no execute permission; the host needs it to start the program.
   if (executable && posix::hostPath(windowsPath, inWorld))

@@ -447,9 +447,11 @@ bool sameFile(int heldFd, const struct stat &now, long long size, long long mtim
 }
 
 int batchDepth = 0;
+// Never destroyed: hives held in other static objects unregister themselves
+// during exit, in whatever order those are destroyed.
 std::vector<HiveFile *> &liveHives() {
-  static std::vector<HiveFile *> hives;
-  return hives;
+  static auto *hives = new std::vector<HiveFile *>;
+  return *hives;
 }
 
 } // namespace
