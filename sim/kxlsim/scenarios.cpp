@@ -101,6 +101,12 @@ void addSinglePartitionInstance(WorldWriter &w, const CopySpec &copy) {
   w.writeText(inst.directory + "\\security\\kxlaudit.cfg",
               "# audit settings of INST1\r\nactive = yes\r\nerrortype = normal\r\nadmin = both\r\n"
               "instance = both\r\n");
+  // The federation, classic connection, resource manager and metadata files
+  // that an upgrade carries over when an instance has them.
+  w.writeText(inst.directory + "\\cfg\\kxldj.ini", "[federation]\r\nenabled = no\r\n");
+  w.writeText(inst.directory + "\\cfg\\djxclassic2.cfg", "classic = 2\r\n");
+  w.writeText(inst.directory + "\\bin\\rsm.cfg", "rsm = on\r\n");
+  w.writeText(inst.directory + "\\kxlmd_config.xml", "<config instance=\"INST1\"/>\r\n");
 }
 
 // Partitions 0 on this machine, 1 and 2 (logical port 1) on the other one.

@@ -147,7 +147,7 @@ TEST_F(DriverFailureTest, AuthenticationTypeNotSetIsMinusOne) {
 
 TEST_F(DriverFailureTest, CarriedFileThatCannotBeCopiedEndsWithItsCode) {
   // A folder where the file should be cannot be copied as a file.
-  world.writeText(std::string(kOldInstanceDir) + "\\cfg\\kxldj.ini", "[federation]\n");
+  removeTree(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
   world.makeDirectory(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
   before = tree(kOldInstanceDir);
   Outcome outcome = run({"INST1"});

@@ -74,8 +74,10 @@ TEST_F(DriverOutcomeTest, SolentEditionHostsServerButNotStandaloneInstances) {
 }
 
 TEST_F(DriverOutcomeTest, MissingOptionalFilesAndCleanupFailureDoNotFailTheUpgrade) {
-  // INST1 has none of the four carried files and no cfg or bin folder: the
+  // Without the four carried files, and without their cfg and bin folders, the
   // copies report a missing file or a missing folder, which both count as done.
+  for (const char *carried : {"\\cfg", "\\bin", "\\kxlmd_config.xml"})
+    removeTree(std::string(kOldInstanceDir) + carried);
   kxlsim::setToolExitCode(world, "kxlset", 9);
   Outcome outcome = run({"INST1"});
   EXPECT_TRUE(outcome.failures.empty()) << outcome.trace;

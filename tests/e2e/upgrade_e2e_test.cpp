@@ -43,11 +43,6 @@ std::string shellWord(const std::string &text) {
   return "'" + text + "'";
 }
 
-void writeHostFile(const fs::path &path, const std::string &text) {
-  fs::create_directories(path.parent_path());
-  std::ofstream(path, std::ios::binary) << text;
-}
-
 // Everything the upgrade changes, and nothing else: the profile key moved,
 // the instance registered under the current copy, its service re-pointed (its
 // start type unchanged), the converted kxlsystm, the carried files and the
@@ -73,14 +68,15 @@ file + C:\KXLDBMIG.TXT (440 bytes, fnv 99c1bf416a879d93)
        +   1  warnings were found; the upgrade may go on
        +   2  the instance has no databases
        +   3  objects were found that must be corrected first
-file + C:\Program Files\ZAV\KXL101\INST1\bin\rsm.cfg (7 bytes, fnv 35aa26f9d43ca529)
-       + rsm=on
-file + C:\Program Files\ZAV\KXL101\INST1\cfg\djxclassic2.cfg (10 bytes, fnv 7e3507c182162ee6)
-       + classic=2
-file + C:\Program Files\ZAV\KXL101\INST1\cfg\kxldj.ini (13 bytes, fnv 68d4bfd894ea540c)
+file + C:\Program Files\ZAV\KXL101\INST1\bin\rsm.cfg (10 bytes, fnv cf1a9f0cdf3562f0)
+       + rsm = on
+file + C:\Program Files\ZAV\KXL101\INST1\cfg\djxclassic2.cfg (13 bytes, fnv 44a60aba95ae67c5)
+       + classic = 2
+file + C:\Program Files\ZAV\KXL101\INST1\cfg\kxldj.ini (28 bytes, fnv 807da70b3e7841df)
        + [federation]
-file + C:\Program Files\ZAV\KXL101\INST1\kxlmd_config.xml (10 bytes, fnv 3ad5b3eae5479aea)
-       + <config/>
+       + enabled = no
+file + C:\Program Files\ZAV\KXL101\INST1\kxlmd_config.xml (28 bytes, fnv 7d5c60b04106967e)
+       + <config instance="INST1"/>
 file + C:\Program Files\ZAV\KXL101\INST1\kxlsystm (16384 bytes, fnv 3920934884e75c52)
 file + C:\Program Files\ZAV\KXL101\INST1\security\kxlaudit.cfg (120 bytes, fnv cbc80e32e98b4190)
        + # audit settings of INST1
@@ -129,14 +125,6 @@ protected:
   std::string world;
 };
 
-// The four optional files of an instance, as the demo instance does not have them.
-void addOptionalFiles(const fs::path &instanceDir) {
-  writeHostFile(instanceDir / "cfg" / "kxldj.ini", "[federation]\n");
-  writeHostFile(instanceDir / "cfg" / "djxclassic2.cfg", "classic=2\n");
-  writeHostFile(instanceDir / "bin" / "rsm.cfg", "rsm=on\n");
-  writeHostFile(instanceDir / "kxlmd_config.xml", "<config/>\n");
-}
-
 // The converted file has the current release's layout: release word 0x0D00
 // at byte 16, level 10100 at byte 20, and 16384 bytes.
 void expectCurrentLayout(const fs::path &path) {
@@ -148,7 +136,6 @@ void expectCurrentLayout(const fs::path &path) {
 }
 
 TEST_F(UpgradeE2eTest, SinglePartitionInstanceMovesToTheCurrentCopy) {
-  addOptionalFiles(drivePath("Program Files/ZAV/KXL95/INST1"));
   std::string before = temp + "/before";
   ASSERT_EQ(
       runShell(std::string(KXL_KXLSIM) + " snapshot " + shellWord(world) + " " + shellWord(before)).exitCode,
