@@ -1,8 +1,10 @@
 // Pieces of the configuration file conversion shared by its source files, its
 // tests and its fuzz target. Everything here works on images in memory; only
-// dbmcfg_image.cpp touches files and only dbmcfg_platform.cpp asks the platform.
+// dbmcfg_image.cpp touches files (through NT/cfgfile.h) and only
+// dbmcfg_platform.cpp asks the platform.
 #pragma once
 
+#include "NT/cfgfile.h"
 #include "platform/kxlsys.h"
 
 #include <cstddef>
@@ -11,12 +13,11 @@
 namespace kxldbm {
 
 // ---- layout ---------------------------------------------------------------
-inline constexpr uint32_t kImageSize = 16384;    // current layout
+using kxlcfg::kImageSize;                        // current layout
 inline constexpr uint32_t kSmallSize = 4096;     // legacy small layout
 inline constexpr uint32_t kFlagAreaSize = 512;   // one byte per parameter index
 inline constexpr uint32_t kFlagArea = 15872;     // flag area of the current layout
 inline constexpr uint32_t kSmallFlagArea = 3584; // flag area of the small layout
-inline constexpr uint32_t kChecksumStart = 4;    // the sum covers the bytes from here on
 inline constexpr uint32_t kReleaseOffset = 16;   // u16 release word
 inline constexpr uint32_t kLevelOffset = 20;     // u16 level word
 inline constexpr uint32_t kNodeTypeOffset = 40;  // u16 node type
@@ -38,8 +39,8 @@ inline uint32_t get32(const unsigned char *image, uint32_t offset) {
 inline uint64_t get64(const unsigned char *image, uint32_t offset) {
   return uint64_t(get32(image, offset)) | uint64_t(get32(image, offset + 4)) << 32;
 }
-void put16(unsigned char *image, uint32_t offset, uint16_t value);
-void put32(unsigned char *image, uint32_t offset, uint32_t value);
+using kxlcfg::put16;
+using kxlcfg::put32;
 
 inline uint16_t releaseCode(const unsigned char *image) {
   return get16(image, kReleaseOffset) & kReleaseMask;
@@ -49,10 +50,8 @@ inline uint16_t nodeType(const unsigned char *image) {
 }
 
 // ---- validation (dbmcfg_image.cpp) -------------------------------------------
-// Unsigned sum of the bytes from offset 4 up to `size`.
-uint32_t checksum(const unsigned char *bytes, uint32_t size);
-// Stores the checksum of a 16384-byte image at offset 0.
-void sealImage(unsigned char *image);
+using kxlcfg::checksum;
+using kxlcfg::sealImage;
 // 0, or -101 when the release code is not one this conversion knows.
 int32_t checkRelease(const unsigned char *image);
 // 0, or -102 when the stored checksum of the image does not match its bytes.
@@ -110,7 +109,5 @@ int32_t loadFile(const char *path, FileRole role, LoadedFile &loaded);
 // Rewrites the target with its 16384-byte image from the start; 0 or -100. A
 // write that fails part way puts the bytes that were read back.
 int32_t writeTarget(const char *path, const LoadedFile &target);
-// Reads until `size` bytes are in `buffer` or the file ends; *filled is the count.
-int32_t readUpTo(SQLO_FHANDLE file, unsigned char *buffer, uint32_t size, uint32_t *filled);
 
 } // namespace kxldbm

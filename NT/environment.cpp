@@ -1,5 +1,6 @@
 #include "NT/environment.h"
 
+#include "NT/cfgfile.h"
 #include "NT/pathjoin.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
@@ -67,21 +68,11 @@ void undoCreation(const CreatedInstance &created) {
 
 // ---- the configuration image ----------------------------------------------
 
-void putU16(unsigned char *image, uint32_t offset, uint16_t value) {
-  image[offset] = static_cast<unsigned char>(value & 0xFF);
-  image[offset + 1] = static_cast<unsigned char>(value >> 8);
-}
-
-void putU32(unsigned char *image, uint32_t offset, uint32_t value) {
-  for (uint32_t i = 0; i < 4; ++i)
-    image[offset + i] = static_cast<unsigned char>((value >> (8 * i)) & 0xFF);
-}
-
 void putF32(unsigned char *image, uint32_t offset, float value) {
   uint32_t bits = 0;
   static_assert(sizeof bits == sizeof value);
   std::memcpy(&bits, &value, sizeof bits);
-  putU32(image, offset, bits);
+  kxlcfg::put32(image, offset, bits);
 }
 
 // Writes `text` into a field of `size` bytes, zero-padded; false when it does not fit.
@@ -92,13 +83,6 @@ bool putText(unsigned char *image, uint32_t offset, uint32_t size, const char *t
   std::memset(image + offset, 0, size);
   std::memcpy(image + offset, text, length);
   return true;
-}
-
-uint32_t imageChecksum(const unsigned char *image) {
-  uint32_t sum = 0;
-  for (uint32_t i = 4; i < ENV_CFG_IMAGE_SZ; ++i)
-    sum += image[i];
-  return sum;
 }
 
 // The copy's components and its Java folder. True when a field was written.
@@ -113,7 +97,7 @@ bool tuneComponents(unsigned char *image, const char *installPath) {
     return false;
   bool changed = false;
   if (RegQueryValueExA(key, kClientComponent, nullptr, nullptr, nullptr, nullptr) == ERROR_SUCCESS) {
-    putU32(image, ENV_CFG_CLIENT_COMPONENT, ENV_CLIENT_COMPONENT_VALUE);
+    kxlcfg::put32(image, ENV_CFG_CLIENT_COMPONENT, ENV_CLIENT_COMPONENT_VALUE);
     changed = true;
   }
   if (installPath != nullptr) {
@@ -211,43 +195,49 @@ int32_t tuneMeasures(unsigned char *image, uint32_t workstationFlag, bool &chang
   if (workstationName(name))
     putText(image, ENV_CFG_WORKSTATION, ENV_CFG_WORKSTATION_SZ, name);
   if (workstationFlag != 0)
-    putU16(image, ENV_CFG_WORKSTATION_FLAG, 1);
+    kxlcfg::put16(image, ENV_CFG_WORKSTATION_FLAG, 1);
   return 0;
 }
 
-bool readWhole(HANDLE file, unsigned char *image) {
-  DWORD got = 0;
-  return ReadFile(file, image, ENV_CFG_IMAGE_SZ, &got, nullptr) && got == ENV_CFG_IMAGE_SZ;
+static_assert(ENV_CFG_IMAGE_SZ == kxlcfg::kImageSize);
+
+// Reads the whole image; the file is closed again before the tuning writes.
+int32_t readImage(const char *path, unsigned char *image) {
+  kxlcfg::File file(path, kxlcfg::Access::Update);
+  if (!file.isOpen())
+    return traced(kProbeOpen, ENVIRONMENT_RC_CONFIG_FILE);
+  uint32_t got = 0;
+  if (file.readUpTo(image, ENV_CFG_IMAGE_SZ, &got) != 0 || got != ENV_CFG_IMAGE_SZ)
+    return traced(kProbeRead, ENVIRONMENT_RC_CONFIG_FILE);
+  return 0;
 }
 
-int32_t rewriteImage(HANDLE file, unsigned char *image) {
-  putU32(image, 0, imageChecksum(image));
-  if (SetFilePointer(file, 0, nullptr, FILE_BEGIN) == INVALID_SET_FILE_POINTER)
+// Writes the sealed image over the file from its start: a file that cannot
+// be opened again counts as the failed rewind, a short write as the failed write.
+int32_t rewriteImage(const char *path, unsigned char *image) {
+  kxlcfg::sealImage(image);
+  switch (kxlcfg::writeWhole(path, kxlcfg::Access::Rewrite, image, ENV_CFG_IMAGE_SZ)) {
+  case kxlcfg::WriteResult::Written:
+    return 0;
+  case kxlcfg::WriteResult::NotOpened:
     return traced(kProbeSeek, ENVIRONMENT_RC_CONFIG_FILE);
-  DWORD written = 0;
-  if (!WriteFile(file, image, ENV_CFG_IMAGE_SZ, &written, nullptr) || written != ENV_CFG_IMAGE_SZ)
-    return traced(kProbeWrite, ENVIRONMENT_RC_CONFIG_FILE);
-  return 0;
+  case kxlcfg::WriteResult::Failed:
+    break;
+  }
+  return traced(kProbeWrite, ENVIRONMENT_RC_CONFIG_FILE);
 }
 
 int32_t tuneConfigFile(const char *instanceDir, const char *installPath, uint32_t workstationFlag) {
   char path[KXL_JOINED_PATH_SZ];
   joinPath(path, instanceDir, "kxlsystm");
-  HANDLE file = CreateFileA(path, GENERIC_READ | GENERIC_WRITE, 0, nullptr, OPEN_EXISTING,
-                            FILE_ATTRIBUTE_NORMAL, nullptr);
-  if (file == INVALID_HANDLE_VALUE)
-    return traced(kProbeOpen, ENVIRONMENT_RC_CONFIG_FILE);
   unsigned char image[ENV_CFG_IMAGE_SZ];
-  int32_t rc = 0;
-  if (!readWhole(file, image)) {
-    rc = traced(kProbeRead, ENVIRONMENT_RC_CONFIG_FILE);
-  } else {
-    bool changed = tuneComponents(image, installPath);
-    rc = tuneMeasures(image, workstationFlag, changed);
-    if (rc == 0 && changed)
-      rc = rewriteImage(file, image);
-  }
-  CloseHandle(file);
+  int32_t rc = readImage(path, image);
+  if (rc != 0)
+    return rc;
+  bool changed = tuneComponents(image, installPath);
+  rc = tuneMeasures(image, workstationFlag, changed);
+  if (rc == 0 && changed)
+    rc = rewriteImage(path, image);
   return rc;
 }
 

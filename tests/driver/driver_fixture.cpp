@@ -210,6 +210,10 @@ bool DriverTest::exists(const std::string &windowsPath) const {
   return fs::exists(hostPath(windowsPath));
 }
 
+std::string DriverTest::fileContent(const std::string &windowsPath) const {
+  return contentOf(hostPath(windowsPath));
+}
+
 void DriverTest::removeTree(const std::string &windowsPath) const {
   std::error_code ignored;
   fs::remove_all(hostPath(windowsPath), ignored);

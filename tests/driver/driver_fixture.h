@@ -47,6 +47,8 @@ protected:
   std::string hostPath(const std::string &windowsPath) const;
   Tree tree(const std::string &windowsPath) const;
   bool exists(const std::string &windowsPath) const;
+  // The whole content of a file ("" when it cannot be read).
+  std::string fileContent(const std::string &windowsPath) const;
   void removeTree(const std::string &windowsPath) const;
   // Entries of the world's temporary directory.
   std::vector<std::string> tempEntries() const;

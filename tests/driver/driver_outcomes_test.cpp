@@ -10,6 +10,13 @@ namespace {
 
 constexpr const char *kUninstall = "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\";
 
+uint32_t littleEndian(const std::string &bytes, std::size_t at, std::size_t count) {
+  uint32_t value = 0;
+  for (std::size_t i = count; i-- > 0;)
+    value = value << 8 | static_cast<unsigned char>(bytes[at + i]);
+  return value;
+}
+
 class DriverOutcomeTest : public DriverTest {
 protected:
   // Leaves the current copy with `keep` (product codes) of its products, and
@@ -105,17 +112,28 @@ TEST_F(DriverOutcomeTest, VersionEightProfileKeyMovesAndIsDeleted) {
 
 TEST_F(DriverOutcomeTest, QuotedProfilePathKeepsItsQuotes) {
   // Every path formed from the quoted profile path names a place inside the
-  // quoted folder: the copy of the instance directory and the audit settings
-  // kept aside both land there, whatever the later steps do.
+  // quoted folder, and every step opens those paths as they are: the upgrade
+  // completes and the instance lives on in the quoted folder.
   world.makeDirectory("C:\\Quoted Profiles");
   Outcome outcome = run({"-p", "\"C:\\Quoted Profiles\"", "INST1"});
   ASSERT_TRUE(outcome.driverRan) << outcome.out << outcome.err;
-  for (const DriverFailure &failure : outcome.failures)
-    EXPECT_GE(failure.probe, 90) << outcome.trace;
-  EXPECT_TRUE(exists("C:\\Quoted Profiles\\INST1\\kxlsystm"));
-  bool auditKept = exists("C:\\Quoted Profiles\\INST1\\security\\kxlauditcopy.cfg");
-  EXPECT_EQ(auditKept, !outcome.failures.empty());
+  EXPECT_TRUE(outcome.failures.empty()) << outcome.trace;
+  EXPECT_EQ(outcome.driverResult, 0) << outcome.out << outcome.err;
+
+  EXPECT_FALSE(keyExists(profileKey("KXL95", "INST1")));
+  EXPECT_TRUE(keyExists(profileKey("KXL101", "INST1")));
+  const std::string instanceKey = "SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1";
+  EXPECT_EQ(stringValue(instanceKey, "Copy"), "KXL101");
+  EXPECT_EQ(stringValue(instanceKey, "Directory"), "C:\\Quoted Profiles\\INST1");
+
+  // kxlsystm converted to the current layout: release word and level.
+  std::string image = fileContent("C:\\Quoted Profiles\\INST1\\kxlsystm");
+  ASSERT_EQ(image.size(), 16384u);
+  EXPECT_EQ(littleEndian(image, 16, 2), 0x0D00u);
+  EXPECT_EQ(littleEndian(image, 20, 4), 10100u);
+  EXPECT_FALSE(exists("C:\\Quoted Profiles\\INST1\\security\\kxlauditcopy.cfg"));
   EXPECT_TRUE(exists("C:\\Quoted Profiles\\INST1\\security\\kxlaudit.cfg"));
+  EXPECT_FALSE(exists(kNewInstanceDir));
 }
 
 TEST_F(DriverOutcomeTest, CopyToTheNewProfilePathStaysAfterALaterFailure) {

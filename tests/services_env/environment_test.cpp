@@ -128,12 +128,14 @@ TEST_F(EnvironmentTest, MeasureFailuresDropTheNewInstance) {
   }
 }
 
-// The creation itself uses the same file calls, so each one is failed in turn
-// until the configuration file's own call is hit: every failing run must
-// leave nothing behind, and the file's failure must come out as -5005.
+// The library's file calls and the Win32 calls beneath them, which the
+// creation itself uses too, are each failed call by call until the
+// configuration file's own call is hit: every failing run must leave nothing
+// behind, and the file's failure must come out as -5005.
 TEST_F(EnvironmentTest, ConfigurationFileFailuresGive5005AndDropTheNewInstance) {
   addTemplate(1);
-  for (const char *function : {"CreateFileA", "ReadFile", "SetFilePointer", "WriteFile"}) {
+  for (const char *function :
+       {"sqloopenp", "sqloread", "sqlowrite", "CreateFileA", "ReadFile", "WriteFile"}) {
     SCOPED_TRACE(function);
     bool hit = false;
     for (int call = 1; call <= 200 && !hit; ++call) {
@@ -267,9 +269,10 @@ TEST_F(PartitionZeroTest, EveryFailureRemovesPartitionAndInstance) {
       {"sqloPRegValuePE:1", ENVIRONMENT_RC_PROFILE_VALUE, 0},
       {"sqloPRegValuePE:2", ENVIRONMENT_RC_PROFILE_VALUE, 0},
       {"sqlo_instance_addnode:1", SQLO_RC_SYSTEM_ERROR, 0},
-      {"sqloopenp:1", UPGRADE_RC_SQLCA, -1042},
-      {"sqloopenp:2", UPGRADE_RC_SQLCA, -1042},
-      {"sqlowrite:2", UPGRADE_RC_SQLCA, -1042},
+      // kxlsystm takes the first two opens and the first write.
+      {"sqloopenp:3", UPGRADE_RC_SQLCA, -1042},
+      {"sqloopenp:4", UPGRADE_RC_SQLCA, -1042},
+      {"sqlowrite:3", UPGRADE_RC_SQLCA, -1042},
   };
   for (const Case &c : cases) {
     SCOPED_TRACE(c.fault);
