@@ -94,8 +94,8 @@ std::string DemoWorld::diff() {
   return out.str();
 }
 
-void DemoWorld::failCalls(const char *plan) {
-  setenv("KXLSIM_FAIL", plan, 1);
+void DemoWorld::failCalls(const char *faults) {
+  setenv("KXLSIM_FAIL", faults, 1);
   kxlsim::resetFaults();
 }
 

@@ -24,7 +24,7 @@ protected:
   std::string diff();
 
   // KXLSIM_FAIL for the rest of the case.
-  static void failCalls(const char *plan);
+  static void failCalls(const char *faults);
   static void setInstance(const char *name);
 
   static std::string regString(const std::string &path, const char *name);
