@@ -2,50 +2,28 @@
 
 #include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/world_reader.h"
+#include "tests/support/command_run.h"
 
-#include <fcntl.h>
-#include <spawn.h>
-#include <sys/wait.h>
-
-#include <algorithm>
-#include <cstdlib>
-#include <cstring>
 #include <filesystem>
-#include <fstream>
 #include <regex>
 #include <sstream>
-
-extern char **environ;
 
 namespace drivertest {
 
 namespace fs = std::filesystem;
 
+using kxltestsupport::readHostFile;
+
 namespace {
 
 constexpr const char *kDriverId = "0x18780502";
-
-// Variables of the test's own environment that the command must not inherit.
-constexpr const char *kScrubbed[] = {"KXLSIM_ROOT", "KXLTRACE", "KXLSIM_FAIL", "KXLINSTANCE", "TMP", "TEMP"};
-
-std::string contentOf(const fs::path &path) {
-  std::ifstream in(path, std::ios::binary);
-  return std::string(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-}
-
-fs::path uniqueDirectory(const std::string &stem) {
-  std::string pattern = (fs::temp_directory_path() / (stem + ".XXXXXX")).string();
-  if (mkdtemp(pattern.data()) == nullptr)
-    return {};
-  return pattern;
-}
 
 // The demo world with the command installed, built once for the program and
 // copied for every case.
 class DemoWorld : public ::testing::Environment {
 public:
   void SetUp() override {
-    fs::path dir = uniqueDirectory("kxldrv-demo");
+    fs::path dir = kxltestsupport::newTempDir("kxldrv-demo");
     kxlsim::InstallSources sources{KXL_TOOLS, KXL_COMMAND, KXL_MESSAGES};
     std::vector<std::string> errors;
     if (!dir.empty() && kxlsim::createWorld((dir / "world").string(), "demo", sources, errors))
@@ -61,50 +39,6 @@ public:
 
 [[maybe_unused]] const ::testing::Environment *const kDemoWorld =
     ::testing::AddGlobalTestEnvironment(new DemoWorld);
-
-bool scrubbed(const char *entry) {
-  return std::any_of(std::begin(kScrubbed), std::end(kScrubbed), [entry](const char *name) {
-    std::size_t length = std::strlen(name);
-    return std::strncmp(entry, name, length) == 0 && entry[length] == '=';
-  });
-}
-
-// The command's environment: the test's own, scrubbed, plus `settings`.
-std::vector<std::string> commandEnvironment(const std::vector<std::string> &settings) {
-  std::vector<std::string> entries;
-  for (char **entry = environ; *entry != nullptr; ++entry)
-    if (!scrubbed(*entry))
-      entries.emplace_back(*entry);
-  entries.insert(entries.end(), settings.begin(), settings.end());
-  return entries;
-}
-
-std::vector<char *> pointersTo(std::vector<std::string> &texts) {
-  std::vector<char *> pointers;
-  for (std::string &text : texts)
-    pointers.push_back(text.data());
-  pointers.push_back(nullptr);
-  return pointers;
-}
-
-// Runs `argv` with standard output and error into the two files; exit code.
-int spawnAndWait(std::vector<std::string> argv, std::vector<std::string> environment, const std::string &out,
-                 const std::string &err) {
-  posix_spawn_file_actions_t actions;
-  posix_spawn_file_actions_init(&actions);
-  posix_spawn_file_actions_addopen(&actions, 1, out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-  posix_spawn_file_actions_addopen(&actions, 2, err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-  std::vector<char *> args = pointersTo(argv);
-  std::vector<char *> env = pointersTo(environment);
-  pid_t child = 0;
-  int started = posix_spawn(&child, args[0], &actions, nullptr, args.data(), env.data());
-  posix_spawn_file_actions_destroy(&actions);
-  if (started != 0)
-    return -1;
-  int status = 0;
-  waitpid(child, &status, 0);
-  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-}
 
 void readDriverTrace(const std::string &trace, Outcome &outcome) {
   std::regex error(std::string("error ") + kDriverId + " probe=(-?[0-9]+) rc=(-?[0-9]+)");
@@ -144,7 +78,7 @@ std::string treeDifferences(const Tree &before, const Tree &after) {
 
 void DriverTest::SetUp() {
   ASSERT_FALSE(DemoWorld::built.empty()) << "the demo world could not be built";
-  fs::path dir = uniqueDirectory("kxldrv");
+  fs::path dir = kxltestsupport::newTempDir("kxldrv");
   ASSERT_FALSE(dir.empty());
   temp_ = dir.string();
   root_ = (dir / "world").string();
@@ -168,32 +102,28 @@ Outcome DriverTest::run(const std::vector<std::string> &args, const std::string 
   Outcome outcome;
   std::string tag = temp_ + "/run" + std::to_string(++runs_);
   std::string eventLog = root_ + "/events.jsonl";
-  std::size_t eventsBefore = contentOf(eventLog).size();
-  std::vector<std::string> argv = {hostPath(std::string(kCurrentCopy) + "\\bin\\kxliupgrade.exe")};
-  argv.insert(argv.end(), args.begin(), args.end());
-  std::vector<std::string> settings = {"KXLSIM_ROOT=" + root_, "KXLTRACE=" + tag + ".trace"};
+  std::size_t eventsBefore = readHostFile(eventLog).size();
+  kxltestsupport::CommandRun command;
+  command.program = hostPath(std::string(kCurrentCopy) + "\\bin\\kxliupgrade.exe");
+  command.args = args;
+  command.settings = {"KXLSIM_ROOT=" + root_, "KXLTRACE=" + tag + ".trace"};
   if (!faults.empty())
-    settings.push_back("KXLSIM_FAIL=" + faults);
-  outcome.exitCode = spawnAndWait(argv, commandEnvironment(settings), tag + ".out", tag + ".err");
-  outcome.out = contentOf(tag + ".out");
-  outcome.err = contentOf(tag + ".err");
-  outcome.trace = contentOf(tag + ".trace");
+    command.settings.push_back("KXLSIM_FAIL=" + faults);
+  command.outFile = tag + ".out";
+  command.errFile = tag + ".err";
+  outcome.exitCode = kxltestsupport::runCommand(command);
+  outcome.out = readHostFile(tag + ".out");
+  outcome.err = readHostFile(tag + ".err");
+  outcome.trace = readHostFile(tag + ".trace");
   readDriverTrace(outcome.trace, outcome);
-  std::istringstream added(contentOf(eventLog).substr(eventsBefore));
+  std::istringstream added(readHostFile(eventLog).substr(eventsBefore));
   for (std::string line; std::getline(added, line);)
     outcome.events.push_back(line);
   return outcome;
 }
 
 std::string DriverTest::hostPath(const std::string &windowsPath) const {
-  // "C:\a\b" -> "<world>/drive_c/a/b"
-  std::string relative = windowsPath.substr(std::min<std::size_t>(3, windowsPath.size()));
-  std::replace(relative.begin(), relative.end(), '\\', '/');
-  fs::path path = fs::path(root_) / "drive_c" / relative;
-  std::string text = path.string();
-  while (!text.empty() && text.back() == '/')
-    text.pop_back();
-  return text;
+  return kxltestsupport::drivePath(root_, windowsPath);
 }
 
 Tree DriverTest::tree(const std::string &windowsPath) const {
@@ -202,7 +132,8 @@ Tree DriverTest::tree(const std::string &windowsPath) const {
   std::error_code ec;
   for (auto it = fs::recursive_directory_iterator(base, ec); !ec && it != fs::recursive_directory_iterator();
        it.increment(ec))
-    files[fs::relative(it->path(), base).string()] = it->is_directory() ? "<dir>" : contentOf(it->path());
+    files[fs::relative(it->path(), base).string()] =
+        it->is_directory() ? "<dir>" : readHostFile(it->path().string());
   return files;
 }
 
@@ -211,7 +142,7 @@ bool DriverTest::exists(const std::string &windowsPath) const {
 }
 
 std::string DriverTest::fileContent(const std::string &windowsPath) const {
-  return contentOf(hostPath(windowsPath));
+  return readHostFile(hostPath(windowsPath));
 }
 
 void DriverTest::removeTree(const std::string &windowsPath) const {

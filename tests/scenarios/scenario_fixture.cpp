@@ -3,59 +3,26 @@
 #include "sim/kxlsim/diff.h"
 #include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/snapshot.h"
-
-#include <fcntl.h>
-#include <sys/wait.h>
-#include <unistd.h>
+#include "tests/support/command_run.h"
 
 #include <cstdlib>
 #include <filesystem>
-#include <fstream>
 #include <sstream>
 
 namespace kxltest {
 
 namespace fs = std::filesystem;
 
-namespace {
+using kxltestsupport::newTempDir;
+using kxltestsupport::readHostFile;
 
-std::string readHostFile(const std::string &path) {
-  std::ifstream in(path, std::ios::binary);
-  std::stringstream text;
-  text << in.rdbuf();
-  return text.str();
-}
+namespace {
 
 // The result the run's exit trace line reports ("exit <id> rc=<n>"), the last one.
 long long tracedResult(const std::string &trace, const char *runId) {
   std::string marker = std::string("exit ") + runId + " rc=";
   size_t at = trace.rfind(marker);
   return at == std::string::npos ? -999999 : std::atoll(trace.c_str() + at + marker.size());
-}
-
-void setOrUnset(const char *name, const char *value) {
-  if (value != nullptr)
-    setenv(name, value, 1);
-  else
-    unsetenv(name);
-}
-
-[[noreturn]] void startCommand(const std::string &program, const std::vector<std::string> &args,
-                               const std::string &cwd, const std::string &outFile,
-                               const std::string &errFile) {
-  std::vector<char *> argv;
-  argv.push_back(const_cast<char *>(program.c_str()));
-  for (const std::string &arg : args)
-    argv.push_back(const_cast<char *>(arg.c_str()));
-  argv.push_back(nullptr);
-  int out = open(outFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-  int err = open(errFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-  if (out < 0 || err < 0 || chdir(cwd.c_str()) != 0)
-    _exit(126);
-  dup2(out, 1);
-  dup2(err, 2);
-  execv(program.c_str(), argv.data());
-  _exit(127);
 }
 
 } // namespace
@@ -77,15 +44,6 @@ std::vector<std::string> eventsOf(const RunResult &result, const std::string &ki
 }
 
 std::string ScenarioTest::templateDir_;
-
-namespace {
-
-std::string newTempDir(const char *prefix) {
-  std::string pattern = (fs::temp_directory_path() / prefix).string() + ".XXXXXX";
-  return mkdtemp(pattern.data()) != nullptr ? pattern : std::string();
-}
-
-} // namespace
 
 void ScenarioTest::SetUpTestSuite() {
   templateDir_ = newTempDir("kxlscen-demo");
@@ -156,13 +114,7 @@ void ScenarioTest::addShare(const std::string &server, const std::string &share)
 }
 
 std::string ScenarioTest::hostPath(const std::string &windowsPath) const {
-  std::string path = root_ + "/drive_c" + windowsPath.substr(2);
-  for (char &c : path)
-    if (c == '\\')
-      c = '/';
-  while (path.size() > 1 && path.back() == '/')
-    path.pop_back();
-  return path;
+  return kxltestsupport::drivePath(root_, windowsPath);
 }
 
 RunResult ScenarioTest::run(const std::vector<std::string> &args, const RunSetup &setup) {
@@ -173,20 +125,18 @@ RunResult ScenarioTest::run(const std::vector<std::string> &args, const RunSetup
   std::string error;
   EXPECT_TRUE(kxlsim::snapshotWorld(root_, before, error)) << error;
   std::string events = readHostFile(root_ + "/events.jsonl");
-  std::string program = hostPath(std::string(kCurrentCopy) + "\\bin\\" + setup.program);
-
-  pid_t child = fork();
-  if (child == 0) {
-    setenv("KXLSIM_ROOT", root_.c_str(), 1);
-    setenv("KXLTRACE", trace.c_str(), 1);
-    unsetenv("KXLSIM_FAIL");
-    setOrUnset("KXLINSTANCE", setup.kxlinstance);
-    setOrUnset("KXLTEST_DRIVER", setup.driver.empty() ? nullptr : setup.driver.c_str());
-    startCommand(program, args, hostPath(setup.cwd), out, err);
-  }
-  int status = 0;
-  waitpid(child, &status, 0);
-  result.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  kxltestsupport::CommandRun command;
+  command.program = hostPath(std::string(kCurrentCopy) + "\\bin\\" + setup.program);
+  command.args = args;
+  command.settings = {"KXLSIM_ROOT=" + root_, "KXLTRACE=" + trace};
+  if (setup.kxlinstance != nullptr)
+    command.settings.push_back(std::string("KXLINSTANCE=") + setup.kxlinstance);
+  if (!setup.driver.empty())
+    command.settings.push_back("KXLTEST_DRIVER=" + setup.driver);
+  command.cwd = hostPath(setup.cwd);
+  command.outFile = out;
+  command.errFile = err;
+  result.exitCode = kxltestsupport::runCommand(command);
   result.out = readHostFile(out);
   result.err = readHostFile(err);
   result.result = tracedResult(readHostFile(trace), kRun);

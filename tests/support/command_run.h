@@ -1,0 +1,39 @@
+// Starting a program of the world the way a test needs it: its own
+// environment without the test's settings of the simulation, its output and
+// errors in files, its working directory set. And the small file helpers
+// such tests share.
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace kxltestsupport {
+
+struct CommandRun {
+  std::string program;               // host path of the executable
+  std::vector<std::string> args;     // arguments after the program name
+  std::vector<std::string> settings; // NAME=value added to the scrubbed environment
+  std::string cwd;                   // host directory to start in ("" keeps the test's)
+  std::string outFile, errFile;      // where standard output and error go
+};
+
+// Runs the program and waits for it: its exit code (the low 8 bits), -1 when
+// it could not be started or did not exit.
+int runCommand(const CommandRun &run);
+
+// The test's environment without the variables the simulation or the command
+// reads (KXLSIM_ROOT, KXLTRACE, KXLSIM_FAIL, KXLINSTANCE, KXLTEST_DRIVER, TMP,
+// TEMP), followed by `settings`.
+std::vector<std::string> scrubbedEnvironment(const std::vector<std::string> &settings);
+
+// The whole content of a host file ("" when it cannot be read).
+std::string readHostFile(const std::string &path);
+
+// A new directory "<stem>.XXXXXX" in the host's temporary folder; "" on failure.
+std::string newTempDir(const std::string &stem);
+
+// Host path below `worldRoot` of a Windows path on drive C: ("C:\a\b" ->
+// "<worldRoot>/drive_c/a/b"), without a trailing "/".
+std::string drivePath(const std::string &worldRoot, const std::string &windowsPath);
+
+} // namespace kxltestsupport
