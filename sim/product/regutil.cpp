@@ -9,22 +9,16 @@ namespace {
 
 constexpr DWORD kMaxValueBytes = 4096;
 
-// Closes the key on every way out.
-class OpenKey {
-public:
-  OpenKey() = default;
-  OpenKey(const OpenKey &) = delete;
-  OpenKey &operator=(const OpenKey &) = delete;
-  ~OpenKey() {
-    if (key_ != nullptr)
-      RegCloseKey(key_);
-  }
-  HKEY *out() { return &key_; }
-  HKEY get() const { return key_; }
-
-private:
-  HKEY key_ = nullptr;
-};
+// Sets a value of `root`\`path`, creating the key when it is missing.
+LONG setRegValue(HKEY root, const std::string &path, const char *name, DWORD type, const BYTE *data,
+                 DWORD size) {
+  RegKey key;
+  LONG rc = RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_SET_VALUE, nullptr,
+                            key.out(), nullptr);
+  if (rc != ERROR_SUCCESS)
+    return rc;
+  return RegSetValueExA(key.get(), name, 0, type, data, size);
+}
 
 } // namespace
 
@@ -38,7 +32,7 @@ bool sameName(const std::string &a, const std::string &b) {
 }
 
 LONG readRegString(HKEY root, const std::string &path, const char *name, std::string &value) {
-  OpenKey key;
+  RegKey key;
   LONG rc = RegOpenKeyExA(root, path.c_str(), 0, KEY_QUERY_VALUE, key.out());
   if (rc != ERROR_SUCCESS)
     return rc;
@@ -56,17 +50,16 @@ LONG readRegString(HKEY root, const std::string &path, const char *name, std::st
 }
 
 LONG writeRegString(HKEY root, const std::string &path, const char *name, const std::string &value) {
-  OpenKey key;
-  LONG rc = RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_SET_VALUE, nullptr,
-                            key.out(), nullptr);
-  if (rc != ERROR_SUCCESS)
-    return rc;
-  return RegSetValueExA(key.get(), name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
-                        static_cast<DWORD>(value.size() + 1));
+  return setRegValue(root, path, name, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
+                     static_cast<DWORD>(value.size() + 1));
+}
+
+LONG writeRegDword(HKEY root, const std::string &path, const char *name, DWORD value) {
+  return setRegValue(root, path, name, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
 }
 
 LONG deleteRegValue(HKEY root, const std::string &path, const char *name) {
-  OpenKey key;
+  RegKey key;
   LONG rc = RegOpenKeyExA(root, path.c_str(), 0, KEY_SET_VALUE, key.out());
   if (rc != ERROR_SUCCESS)
     return rc;
@@ -74,13 +67,13 @@ LONG deleteRegValue(HKEY root, const std::string &path, const char *name) {
 }
 
 bool regKeyExists(HKEY root, const std::string &path) {
-  OpenKey key;
+  RegKey key;
   return RegOpenKeyExA(root, path.c_str(), 0, KEY_QUERY_VALUE, key.out()) == ERROR_SUCCESS;
 }
 
 LONG listSubkeys(HKEY root, const std::string &path, std::vector<std::string> &names) {
   names.clear();
-  OpenKey key;
+  RegKey key;
   LONG rc = RegOpenKeyExA(root, path.c_str(), 0, KEY_ENUMERATE_SUB_KEYS | KEY_QUERY_VALUE, key.out());
   if (rc == ERROR_FILE_NOT_FOUND)
     return ERROR_SUCCESS;

@@ -9,6 +9,23 @@
 
 namespace kxlprod {
 
+// An open registry key, closed on every way out.
+class RegKey {
+public:
+  RegKey() = default;
+  RegKey(const RegKey &) = delete;
+  RegKey &operator=(const RegKey &) = delete;
+  ~RegKey() {
+    if (key_ != nullptr)
+      RegCloseKey(key_);
+  }
+  HKEY *out() { return &key_; }
+  HKEY get() const { return key_; }
+
+private:
+  HKEY key_ = nullptr;
+};
+
 // Byte-wise equality ignoring ASCII case.
 bool sameName(const std::string &a, const std::string &b);
 
@@ -18,6 +35,9 @@ LONG readRegString(HKEY root, const std::string &path, const char *name, std::st
 
 // Writes a REG_SZ value, creating the key when it is missing.
 LONG writeRegString(HKEY root, const std::string &path, const char *name, const std::string &value);
+
+// Writes a REG_DWORD value, creating the key when it is missing.
+LONG writeRegDword(HKEY root, const std::string &path, const char *name, DWORD value);
 
 // Removes a value; ERROR_FILE_NOT_FOUND when key or value is missing.
 LONG deleteRegValue(HKEY root, const std::string &path, const char *name);

@@ -12,22 +12,6 @@ namespace {
 
 constexpr size_t kMaxSnapshotValueBytes = 64 * 1024;
 
-class KeyHandle {
-public:
-  KeyHandle() = default;
-  KeyHandle(const KeyHandle &) = delete;
-  KeyHandle &operator=(const KeyHandle &) = delete;
-  ~KeyHandle() {
-    if (key_ != nullptr)
-      RegCloseKey(key_);
-  }
-  HKEY *out() { return &key_; }
-  HKEY get() const { return key_; }
-
-private:
-  HKEY key_ = nullptr;
-};
-
 // The value at `index`: ERROR_SUCCESS, ERROR_NO_MORE_ITEMS at the end, or the failure.
 LONG enumValue(HKEY key, DWORD index, KeySnapshot::Value &value) {
   char name[16384];
@@ -104,15 +88,6 @@ std::string identityComputerName() {
   return name;
 }
 
-LONG writeRegDword(HKEY root, const std::string &path, const char *name, DWORD value) {
-  KeyHandle key;
-  LONG rc = RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_SET_VALUE, nullptr,
-                            key.out(), nullptr);
-  if (rc != ERROR_SUCCESS)
-    return rc;
-  return RegSetValueExA(key.get(), name, 0, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
-}
-
 LONG readWholeFile(const std::string &windowsPath, size_t maxBytes, std::vector<uint8_t> &data) {
   std::string text;
   LONG rc = readSmallTextFile(windowsPath, maxBytes, text);
@@ -137,7 +112,7 @@ LONG writeWholeFile(const std::string &windowsPath, const std::vector<uint8_t> &
 
 KeySnapshot takeKeySnapshot(HKEY root, const std::string &path) {
   KeySnapshot snapshot;
-  KeyHandle key;
+  RegKey key;
   if (RegOpenKeyExA(root, path.c_str(), 0, KEY_QUERY_VALUE, key.out()) != ERROR_SUCCESS)
     return snapshot;
   snapshot.existed = true;
@@ -155,7 +130,7 @@ void restoreKeySnapshot(HKEY root, const std::string &path, const KeySnapshot &s
     return;
   }
   KeySnapshot now = takeKeySnapshot(root, path);
-  KeyHandle key;
+  RegKey key;
   if (RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_ALL_ACCESS, nullptr,
                       key.out(), nullptr) != ERROR_SUCCESS)
     return;

@@ -36,8 +36,6 @@ bool identityString(const char *name, std::string &value);
 // The local computer name from the machine identity ("" when missing).
 std::string identityComputerName();
 
-LONG writeRegDword(HKEY root, const std::string &path, const char *name, DWORD value);
-
 // Binary file content of at most `maxBytes` bytes (Windows path, no quotes).
 // Windows error codes; ERROR_MORE_DATA for a longer file.
 LONG readWholeFile(const std::string &windowsPath, size_t maxBytes, std::vector<uint8_t> &data);
