@@ -1,6 +1,8 @@
 #include "NT/environment.h"
 
 #include "NT/cfgfile.h"
+#include "NT/errortrace.h"
+#include "NT/localhost.h"
 #include "NT/pathjoin.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
@@ -39,10 +41,7 @@ enum Probe : uint32_t {
   kProbeProfileScript = 37,
 };
 
-int32_t traced(uint32_t probe, int32_t rc) {
-  pdtError(KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT, probe, rc);
-  return rc;
-}
+constexpr ErrorTrace traced{KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT};
 
 // The -1 result whose reason is SQLCODE -1042 in the caller's status block.
 int32_t commFailure(uint32_t probe, sqlca *ca) {
@@ -260,11 +259,8 @@ int32_t settleHostName(PartitionRecord &record, sqlca *ca) {
       return traced(kProbeHost, ENVIRONMENT_RC_HOST_UNKNOWN);
     return 0;
   }
-  if (sqloPdbTcpIpGetFullHostName(record.hostName, kFullHostName) != 0) {
-    record.hostName[0] = '\0';
+  if (!readLocalFullHostName(record.hostName))
     return commFailure(kProbeHost, ca);
-  }
-  record.hostName[sizeof record.hostName - 1] = '\0';
   record.hostName[std::strcspn(record.hostName, ".")] = '\0';
   return 0;
 }

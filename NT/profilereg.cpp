@@ -1,5 +1,7 @@
 #include "NT/profilereg.h"
 
+#include "NT/localhost.h"
+
 #include "engn/sqo/run.h"
 #include "install/installcopy.h"
 #include "install/iutil.h"
@@ -19,7 +21,6 @@ constexpr const char kClusterListValue[] = "KXLCLUSTERLIST";
 constexpr const char kLegacyPathValue[] = "KXLPATH";
 constexpr REGSAM kAllAccess = 0xF003F;
 constexpr REGSAM kReadAccess = 0x20019;
-constexpr uint32_t kFullHostNameKind = 5;
 constexpr int32_t kFirstNamedCopyVersion = 9; // copies from 9 on keep profiles under their name
 constexpr size_t kKeyPathSize = 512;
 constexpr size_t kCopyNameSize = 129;   // 128 characters
@@ -248,11 +249,8 @@ uint8_t forceFor(const UpgradeOptions &options, const char *localHost, const uns
 }
 
 int32_t localFullHostName(MachineWalk &walk, char (&host)[SQLO_HOSTNAME_SZ]) {
-  if (sqloPdbTcpIpGetFullHostName(host, kFullHostNameKind) == 0) {
-    host[sizeof host - 1] = '\0';
+  if (readLocalFullHostName(host))
     return 0;
-  }
-  host[0] = '\0';
   walk.options.status.sqlcode = KXL_RC_NO_LOCAL_HOST_NAME;
   return traced(walk.function, kProbeLocalHost, UPGRADE_RC_SQLCA);
 }

@@ -1,6 +1,8 @@
 #include "NT/services.h"
 
 #include "NT/environment.h"
+#include "NT/errortrace.h"
+#include "NT/localhost.h"
 #include "NT/nodetypechoice.h"
 #include "NT/pathjoin.h"
 #include "engn/sqo/run.h"
@@ -16,7 +18,6 @@ constexpr uint32_t kExtenderNameSize = 40; // "KXLEXT - " and a partition's serv
 constexpr uint32_t kDisplayNameSize = SQLO_COPY_NAME_SZ + 64;
 constexpr uint32_t kClusterValueSize = 257;
 constexpr uint32_t kKxlPathSize = 256;
-constexpr uint32_t kFullHostName = 5;
 constexpr int32_t kDisabled = 4; // start type of partitions left on another copy's machine
 constexpr const char kServerProgram[] = "kxlsyscs.exe";
 constexpr const char kExtenderProgram[] = "ctelock.exe";
@@ -36,10 +37,7 @@ enum Probe : uint32_t {
   kProbeSingleMachine = 210,
 };
 
-int32_t traced(uint32_t probe, int32_t rc) {
-  pdtError(KXL_FN_UPGRADE_INSTANCE_SERVICES, probe, rc);
-  return rc;
-}
+constexpr ErrorTrace traced{KXL_FN_UPGRADE_INSTANCE_SERVICES};
 
 // The cluster profile values, read before the instance is re-created and
 // written to every machine of the cluster afterwards.
@@ -307,13 +305,10 @@ int32_t restoreNodesFile(ServicesStep &step) {
 }
 
 int32_t findLocalHost(ServicesStep &step) {
-  char *host = step.localHost;
-  if (sqloPdbTcpIpGetFullHostName(host, kFullHostName) != 0) {
-    host[0] = '\0';
+  if (!readLocalFullHostName(step.localHost)) {
     sqlcaSetCode(step.options.status, SERVICES_SQLCODE_HOST);
     return traced(kProbeHostName, UPGRADE_RC_SQLCA);
   }
-  host[SQLO_HOSTNAME_SZ - 1] = '\0';
   return 0;
 }
 
