@@ -150,6 +150,20 @@ bool statWindowsPath(LPCSTR path, std::string &host, struct stat &info) {
   return true;
 }
 
+// How the calls on an existing path begin: the injected fault (access
+// denied), then the path mapped and looked at. False with the last error set.
+bool startOnExisting(const char *function, LPCSTR path, std::string &host, struct stat &info) {
+  if (kxlsim::shouldFail(function))
+    return failWith(ERROR_ACCESS_DENIED, false);
+  return statWindowsPath(path, host, info);
+}
+
+// The same for a copy or a move, whose target is mapped too.
+bool startTransfer(const char *function, LPCSTR from, LPCSTR to, std::string &source, struct stat &info,
+                   std::string &target) {
+  return startOnExisting(function, from, source, info) && mapPath(to, target);
+}
+
 bool copyFileContents(int from, int to) {
   char chunk[65536];
   for (;;) {
@@ -186,11 +200,9 @@ std::string renameTarget(const std::string &sourceHost, const std::string &targe
 extern "C" {
 
 DWORD GetFileAttributesA(LPCSTR lpFileName) {
-  if (kxlsim::shouldFail("GetFileAttributesA"))
-    return failWith(ERROR_ACCESS_DENIED, INVALID_FILE_ATTRIBUTES);
   std::string host;
   struct stat info {};
-  if (!statWindowsPath(lpFileName, host, info))
+  if (!startOnExisting("GetFileAttributesA", lpFileName, host, info))
     return INVALID_FILE_ATTRIBUTES;
   return attributesOf(info);
 }
@@ -254,11 +266,9 @@ BOOL CreateDirectoryA(LPCSTR lpPathName, LPSECURITY_ATTRIBUTES) {
 }
 
 BOOL RemoveDirectoryA(LPCSTR lpPathName) {
-  if (kxlsim::shouldFail("RemoveDirectoryA"))
-    return failWith(ERROR_ACCESS_DENIED, FALSE);
   std::string host;
   struct stat info {};
-  if (!statWindowsPath(lpPathName, host, info))
+  if (!startOnExisting("RemoveDirectoryA", lpPathName, host, info))
     return FALSE;
   if (!S_ISDIR(info.st_mode))
     return failWith(kErrorDirectory, FALSE);
@@ -268,11 +278,9 @@ BOOL RemoveDirectoryA(LPCSTR lpPathName) {
 }
 
 BOOL DeleteFileA(LPCSTR lpFileName) {
-  if (kxlsim::shouldFail("DeleteFileA"))
-    return failWith(ERROR_ACCESS_DENIED, FALSE);
   std::string host;
   struct stat info {};
-  if (!statWindowsPath(lpFileName, host, info))
+  if (!startOnExisting("DeleteFileA", lpFileName, host, info))
     return FALSE;
   if (S_ISDIR(info.st_mode) || isReadOnlyFile(info))
     return failWith(ERROR_ACCESS_DENIED, FALSE);
@@ -282,12 +290,10 @@ BOOL DeleteFileA(LPCSTR lpFileName) {
 }
 
 BOOL CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, BOOL bFailIfExists) {
-  if (kxlsim::shouldFail("CopyFileA"))
-    return failWith(ERROR_ACCESS_DENIED, FALSE);
   std::string source, target;
   struct stat info {
   }, existing{};
-  if (!statWindowsPath(lpExistingFileName, source, info) || !mapPath(lpNewFileName, target))
+  if (!startTransfer("CopyFileA", lpExistingFileName, lpNewFileName, source, info, target))
     return FALSE;
   if (S_ISDIR(info.st_mode))
     return failWith(ERROR_ACCESS_DENIED, FALSE);
@@ -318,12 +324,10 @@ BOOL CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, BOOL bFailIfExis
 }
 
 BOOL MoveFileExA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, DWORD dwFlags) {
-  if (kxlsim::shouldFail("MoveFileExA"))
-    return failWith(ERROR_ACCESS_DENIED, FALSE);
   std::string source, target;
   struct stat info {
   }, existing{};
-  if (!statWindowsPath(lpExistingFileName, source, info) || !mapPath(lpNewFileName, target))
+  if (!startTransfer("MoveFileExA", lpExistingFileName, lpNewFileName, source, info, target))
     return FALSE;
   target = renameTarget(source, target, lpNewFileName);
   if (target != source && stat(target.c_str(), &existing) == 0) {
