@@ -43,18 +43,6 @@ protected:
     setString(key, "Service Level", serviceLevel);
   }
 
-  // Writes a file at a Windows path, creating its folders.
-  static void writeFile(const std::string &windowsPath, const std::vector<unsigned char> &bytes) {
-    makeDirectories(windowsPath.substr(0, windowsPath.rfind('\\')));
-    HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS,
-                              FILE_ATTRIBUTE_NORMAL, nullptr);
-    ASSERT_NE(INVALID_HANDLE_VALUE, file) << windowsPath;
-    DWORD written = 0;
-    WriteFile(file, bytes.data(), static_cast<DWORD>(bytes.size()), &written, nullptr);
-    CloseHandle(file);
-    ASSERT_EQ(bytes.size(), written);
-  }
-
   // A configuration image of `size` bytes with the node type word at 40 and,
   // past the word, a recognisable byte at the end.
   static std::vector<unsigned char> configImage(uint16_t nodeType, size_t size = 16384) {

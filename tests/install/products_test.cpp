@@ -18,7 +18,7 @@ constexpr const char *kServerCodeNext = "{6E1C2A40-9F3B-4D21-8A11-5B2C7D0E9A01}"
 class Products : public InstallWorld {
 protected:
   static void marker(const std::string &installPath, const std::string &code) {
-    writeFile(installPath + "\\cfg\\kxl" + code + ".lvl", {'x'});
+    writeFile(installPath + "\\cfg\\kxl" + code + ".lvl", std::string("x"));
   }
 
   static std::vector<std::string> editions(InstalledProdList &list) {

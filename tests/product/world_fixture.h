@@ -8,6 +8,7 @@
 #include "platform/win32.h"
 #include "sim/common/simfail.h"
 #include "sim/product/state.h"
+#include "tests/support/world_access.h"
 
 #include <gtest/gtest.h>
 
@@ -36,7 +37,7 @@ inline void setProcessVariable(const char *name, const char *value) {
 #endif
 }
 
-class ProductWorld : public ::testing::Test {
+class ProductWorld : public ::testing::Test, public WorldAccess {
 protected:
   void SetUp() override {
 #ifdef _WIN32
@@ -79,29 +80,6 @@ protected:
     kxlsim::resetFaults();
   }
 
-  // Writes a string value under HKEY_LOCAL_MACHINE (the key is created).
-  static void setString(const std::string &path, const char *name, const std::string &value) {
-    HKEY key = nullptr;
-    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS,
-                                             nullptr, &key, nullptr));
-    LONG rc = RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
-                             static_cast<DWORD>(value.size() + 1));
-    RegCloseKey(key);
-    ASSERT_EQ(ERROR_SUCCESS, rc);
-  }
-
-  // A string value under HKEY_LOCAL_MACHINE, or "<missing>".
-  static std::string getString(const std::string &path, const char *name) {
-    HKEY key = nullptr;
-    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
-      return "<missing>";
-    char data[1024] = {};
-    DWORD size = sizeof data - 1;
-    LONG rc = RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(data), &size);
-    RegCloseKey(key);
-    return rc == ERROR_SUCCESS ? std::string(data) : "<missing>";
-  }
-
   // A copy registered under InstalledCopies with its installation path.
   static void registerCopy(const std::string &copy, const std::string &path) {
     setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\" + copy, "KXL Path Name", path);
@@ -119,15 +97,6 @@ protected:
     std::string key = "SOFTWARE\\ZAV\\KXLSIM\\Instances\\" + name;
     setString(key, "Directory", directory);
     setString(key, "Copy", copy);
-  }
-
-  // Creates every missing directory of a Windows path.
-  static void makeDirectories(const std::string &windowsPath) {
-    for (size_t at = windowsPath.find('\\', 3);; at = windowsPath.find('\\', at + 1)) {
-      CreateDirectoryA(windowsPath.substr(0, at).c_str(), nullptr);
-      if (at == std::string::npos)
-        return;
-    }
   }
 
 #ifndef _WIN32

@@ -35,36 +35,15 @@ protected:
     ASSERT_EQ(0, sqloSwitchToInstallationName(kCopy));
   }
 
-  // Writes a file of the world, creating its directories.
-  static void writeFile(const std::string &windowsPath, const std::string &bytes) {
-    makeDirectories(windowsPath.substr(0, windowsPath.find_last_of('\\')));
-    HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS,
-                              FILE_ATTRIBUTE_NORMAL, nullptr);
-    ASSERT_NE(INVALID_HANDLE_VALUE, file) << windowsPath;
-    DWORD written = 0;
-    WriteFile(file, bytes.data(), DWORD(bytes.size()), &written, nullptr);
-    CloseHandle(file);
-    ASSERT_EQ(bytes.size(), written);
-  }
-
   // A file of the world, or "<missing>".
   static std::string readFile(const std::string &windowsPath) {
-    HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_READ, FILE_SHARE_READ, nullptr, OPEN_EXISTING,
-                              FILE_ATTRIBUTE_NORMAL, nullptr);
-    if (file == INVALID_HANDLE_VALUE)
+    std::vector<unsigned char> bytes;
+    if (!readWholeFile(windowsPath, bytes))
       return "<missing>";
-    std::string text;
-    char chunk[512];
-    DWORD got = 0;
-    while (ReadFile(file, chunk, sizeof chunk, &got, nullptr) && got > 0)
-      text.append(chunk, got);
-    CloseHandle(file);
-    return text;
+    return std::string(bytes.begin(), bytes.end());
   }
 
-  static bool exists(const std::string &windowsPath) {
-    return GetFileAttributesA(windowsPath.c_str()) != INVALID_FILE_ATTRIBUTES;
-  }
+  static bool exists(const std::string &windowsPath) { return pathExists(windowsPath); }
 };
 
 } // namespace kxltest

@@ -107,72 +107,13 @@ void DemoWorld::setInstance(const char *name) {
 }
 
 std::string DemoWorld::regString(const std::string &path, const char *name) {
-  HKEY key = nullptr;
-  if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
-    return "<no key>";
-  char data[1024] = {};
-  DWORD size = sizeof data - 1;
-  LONG rc = RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(data), &size);
-  RegCloseKey(key);
-  return rc == ERROR_SUCCESS ? std::string(data) : "<no value>";
-}
-
-DWORD DemoWorld::regDword(const std::string &path, const char *name) {
-  HKEY key = nullptr;
-  if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
-    return 0xDEADu;
-  DWORD value = 0xDEADu, size = sizeof value;
-  RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(&value), &size);
-  RegCloseKey(key);
-  return value;
-}
-
-bool DemoWorld::keyExists(const std::string &path) {
-  HKEY key = nullptr;
-  if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
-    return false;
-  RegCloseKey(key);
-  return true;
-}
-
-void DemoWorld::setDword(const std::string &path, const char *name, DWORD value) {
-  HKEY key = nullptr;
-  ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS,
-                                           nullptr, &key, nullptr));
-  RegSetValueExA(key, name, 0, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
-  RegCloseKey(key);
-}
-
-void DemoWorld::setString(const std::string &path, const char *name, const std::string &value) {
-  HKEY key = nullptr;
-  ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS,
-                                           nullptr, &key, nullptr));
-  RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
-                 DWORD(value.size() + 1));
-  RegCloseKey(key);
+  return regStringOr(path, name, "<no key>", "<no value>");
 }
 
 std::vector<uint8_t> DemoWorld::readFile(const std::string &windowsPath) {
   std::vector<uint8_t> data;
-  HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_READ, FILE_SHARE_READ, nullptr, OPEN_EXISTING,
-                            FILE_ATTRIBUTE_NORMAL, nullptr);
-  if (file == INVALID_HANDLE_VALUE)
-    return data;
-  uint8_t chunk[4096];
-  DWORD got = 0;
-  while (ReadFile(file, chunk, sizeof chunk, &got, nullptr) && got > 0)
-    data.insert(data.end(), chunk, chunk + got);
-  CloseHandle(file);
+  readWholeFile(windowsPath, data);
   return data;
-}
-
-void DemoWorld::writeFile(const std::string &windowsPath, const std::vector<uint8_t> &data) {
-  HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS,
-                            FILE_ATTRIBUTE_NORMAL, nullptr);
-  ASSERT_NE(file, INVALID_HANDLE_VALUE) << windowsPath;
-  DWORD written = 0;
-  WriteFile(file, data.data(), DWORD(data.size()), &written, nullptr);
-  CloseHandle(file);
 }
 
 std::string DemoWorld::readText(const std::string &windowsPath) {

@@ -4,6 +4,7 @@
 #pragma once
 
 #include "platform/kxlsys.h"
+#include "tests/support/world_access.h"
 
 #include <gtest/gtest.h>
 
@@ -13,7 +14,7 @@
 
 namespace kxltest {
 
-class DemoWorld : public ::testing::Test {
+class DemoWorld : public ::testing::Test, public WorldAccess {
 protected:
   void SetUp() override;
   void TearDown() override;
@@ -27,13 +28,9 @@ protected:
   static void failCalls(const char *faults);
   static void setInstance(const char *name);
 
+  // A string value, "<no key>" or "<no value>".
   static std::string regString(const std::string &path, const char *name);
-  static DWORD regDword(const std::string &path, const char *name);
-  static bool keyExists(const std::string &path);
-  static void setDword(const std::string &path, const char *name, DWORD value);
-  static void setString(const std::string &path, const char *name, const std::string &value);
   static std::vector<uint8_t> readFile(const std::string &windowsPath);
-  static void writeFile(const std::string &windowsPath, const std::vector<uint8_t> &data);
   static std::string readText(const std::string &windowsPath);
 
   const std::string &root() const { return world_; }

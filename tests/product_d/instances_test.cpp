@@ -81,7 +81,7 @@ TEST_F(Instances, DropAfterReCreatingAnExistingInstancePutsItBack) {
   EXPECT_EQ(regString(kInstances + std::string("INST1"), "Copy"), "KXL101");
   EXPECT_EQ(regString(kServices + std::string("INST1"), "ImagePath"),
             std::string(kCopy) + "\\bin\\kxlsyscs.exe");
-  EXPECT_EQ(regDword(kServices + std::string("INST1"), "Start"), 2u) << "the start type stays";
+  EXPECT_EQ(getDword(kServices + std::string("INST1"), "Start"), 2u) << "the start type stays";
   EXPECT_NE(readText(dir + "\\security\\kxlaudit.cfg"), "") << "other files of the directory stay";
   ASSERT_EQ(0, sqlo_instance_drop("INST1", dir.c_str()));
   EXPECT_EQ(diff(), "");

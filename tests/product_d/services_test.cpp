@@ -49,10 +49,10 @@ TEST_F(Services, ChangeOnAnotherMachineGoesToItsSubtree) {
                                          "KXL - KXL101 - INST2-1", &out));
   std::string key = std::string(kRemote) + kServices + "INST2-1";
   EXPECT_EQ(regString(key, "ImagePath"), program);
-  EXPECT_EQ(regDword(key, "Start"), 4u);
+  EXPECT_EQ(getDword(key, "Start"), 4u);
   EXPECT_EQ(regString(key, "ObjectName"), ".\\newacct");
   EXPECT_EQ(regString(key, "DisplayName"), "KXL - KXL101 - INST2-1");
-  EXPECT_EQ(regDword(key, "State"), 1u);
+  EXPECT_EQ(getDword(key, "State"), 1u);
   EXPECT_FALSE(keyExists(std::string(kServices) + "INST2-1")) << "nothing on this machine";
   EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE,
             sqloChangeNTServiceConfig("INST2-1", "WINSRV9", SQLO_SVC_NO_CHANGE, 4, SQLO_SVC_NO_CHANGE,
@@ -60,7 +60,7 @@ TEST_F(Services, ChangeOnAnotherMachineGoesToItsSubtree) {
   failCalls("sqloChangeNTServiceConfig:1");
   EXPECT_NE(0, sqloChangeNTServiceConfig("INST1", nullptr, SQLO_SVC_NO_CHANGE, 4, SQLO_SVC_NO_CHANGE, nullptr,
                                          nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out));
-  EXPECT_EQ(regDword(std::string(kServices) + "INST1", "Start"), 2u);
+  EXPECT_EQ(getDword(std::string(kServices) + "INST1", "Start"), 2u);
 }
 
 TEST_F(Services, RegisterCreatesOnceAndReportsAnExistingService) {
@@ -70,7 +70,7 @@ TEST_F(Services, RegisterCreatesOnceAndReportsAnExistingService) {
                                      0, ".\\kxlsvc", "secret", "kxlwint64.dll", &out));
   std::string key = std::string(kRemote) + kServices + "KXLEXT - INST2-1";
   EXPECT_EQ(regString(key, "ImagePath"), program);
-  EXPECT_EQ(regDword(key, "Start"), 3u) << "start type 0 registers a demand-started service";
+  EXPECT_EQ(getDword(key, "Start"), 3u) << "start type 0 registers a demand-started service";
   EXPECT_EQ(regString(key, "Password"), "<no value>");
   EXPECT_EQ(SQLO_RC_SVC_EXISTS, sqloRegisterNTService("WINSRV2", "KXLEXT - INST2-1", "x", 0, program, 0,
                                                       nullptr, nullptr, "kxlwint64.dll", &out));

@@ -40,7 +40,7 @@ TEST_F(Tools, AuditConfigurationIsMarkedOnceForTheCopy) {
 
 TEST_F(Tools, SslConfigurationMarksOnlyFilesThatExist) {
   ASSERT_TRUE(CreateDirectoryA("C:\\ssl", nullptr));
-  writeFile("C:\\ssl\\SSLconfig.ini", {'[', 's', ']', '\r', '\n'});
+  writeFile("C:\\ssl\\SSLconfig.ini", std::string("[s]\r\n"));
   snapshot();
   EXPECT_EQ(0, kxlsim::upgradeSslConfig(
                    "KXL101", {"-c", "\"C:\\ssl\\SSLClientconfig.ini\"", "-s", "\"C:\\ssl\\SSLconfig.ini\""}));

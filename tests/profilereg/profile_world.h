@@ -84,14 +84,6 @@ protected:
     setString(at(machine, profile(copy) + "\\Node0"), "Port", "60000");
   }
 
-  static bool keyExists(const std::string &path) {
-    HKEY key = nullptr;
-    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_READ, &key) != ERROR_SUCCESS)
-      return false;
-    RegCloseKey(key);
-    return true;
-  }
-
   // The seeded profile sits under `copy` of `machine`, values and subkeys.
   static void expectProfileAt(const std::string &machine, const std::string &copy) {
     EXPECT_EQ("mark-" + machine, getString(at(machine, profile(copy)), "KXLMARK")) << machine << " " << copy;

@@ -55,32 +55,6 @@ protected:
     InstallWorld::TearDown();
   }
 
-  static void setDword(const std::string &path, const char *name, DWORD value) {
-    HKEY key = nullptr;
-    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS,
-                                             nullptr, &key, nullptr));
-    RegSetValueExA(key, name, 0, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
-    RegCloseKey(key);
-  }
-
-  static DWORD getDword(const std::string &path, const char *name) {
-    HKEY key = nullptr;
-    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
-      return 0xDEADu;
-    DWORD value = 0xDEADu, size = sizeof value;
-    RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(&value), &size);
-    RegCloseKey(key);
-    return value;
-  }
-
-  static bool keyExists(const std::string &path) {
-    HKEY key = nullptr;
-    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_QUERY_VALUE, &key) != ERROR_SUCCESS)
-      return false;
-    RegCloseKey(key);
-    return true;
-  }
-
   static std::string copyKey(const char *copy) {
     return std::string("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\") + copy;
   }
@@ -120,25 +94,13 @@ protected:
   // The whole content of a file at a Windows path; empty when it cannot be read.
   static std::vector<unsigned char> readFile(const std::string &windowsPath) {
     std::vector<unsigned char> bytes;
-    HANDLE file = CreateFileA(windowsPath.c_str(), GENERIC_READ, FILE_SHARE_READ, nullptr, OPEN_EXISTING,
-                              FILE_ATTRIBUTE_NORMAL, nullptr);
-    if (file == INVALID_HANDLE_VALUE)
-      return bytes;
-    unsigned char chunk[4096];
-    DWORD got = 0;
-    while (ReadFile(file, chunk, sizeof chunk, &got, nullptr) && got > 0)
-      bytes.insert(bytes.end(), chunk, chunk + got);
-    CloseHandle(file);
+    readWholeFile(windowsPath, bytes);
     return bytes;
   }
 
   static std::string readText(const std::string &windowsPath) {
     std::vector<unsigned char> bytes = readFile(windowsPath);
     return std::string(bytes.begin(), bytes.end());
-  }
-
-  static bool pathExists(const std::string &windowsPath) {
-    return GetFileAttributesA(windowsPath.c_str()) != INVALID_FILE_ATTRIBUTES;
   }
 
   static uint32_t u32At(const std::vector<unsigned char> &image, size_t offset) {
