@@ -1,0 +1,335 @@
+// MSCSUtil over a world whose registry holds a small cluster. A probe class
+// routes every handle-opening and handle-closing entry point through counters,
+// so each case can check that no operation leaves a cluster handle open.
+#include "cluster/mscsutil.h"
+
+#include "sim/common/simfail.h"
+#include "sim/posix/modules.h"
+#include "sim/posix/world.h"
+#include "tests/support/world_access.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <fstream>
+#include <ftw.h>
+#include <memory>
+#include <set>
+#include <string>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <vector>
+
+namespace {
+
+const std::string kCluster = "SOFTWARE\\ZAV\\KXLSIM\\Cluster";
+const std::string kResources = kCluster + "\\Resources\\";
+
+// Cluster handles that an operation opened and has not closed yet.
+std::multiset<const void *> &liveHandles() {
+  static std::multiset<const void *> live;
+  return live;
+}
+
+template <typename F> struct OpenCounter;
+template <typename H, typename... A> struct OpenCounter<H(WINAPI *)(A...)> {
+  static inline H(WINAPI *real)(A...) = nullptr;
+  static H WINAPI call(A... args) {
+    H handle = real(args...);
+    if (handle != nullptr)
+      liveHandles().insert(handle);
+    return handle;
+  }
+};
+
+template <typename F> struct CloseCounter;
+template <typename R, typename H> struct CloseCounter<R(WINAPI *)(H)> {
+  static inline R(WINAPI *real)(H) = nullptr;
+  static R WINAPI call(H handle) {
+    auto found = liveHandles().find(handle);
+    if (found != liveHandles().end())
+      liveHandles().erase(found);
+    return real(handle);
+  }
+};
+
+template <template <typename> class Counter, typename F> void route(F &slot) {
+  Counter<F>::real = slot;
+  slot = &Counter<F>::call;
+}
+
+class ProbedMSCSUtil : public MSCSUtil {
+public:
+  int32_t Bind() {
+    int32_t rc = LoadClusterApi();
+    if (rc == 0) {
+      route<OpenCounter>(openCluster);
+      route<CloseCounter>(closeCluster);
+      route<OpenCounter>(openClusterGroup);
+      route<CloseCounter>(closeClusterGroup);
+      route<OpenCounter>(clusterOpenEnum);
+      route<CloseCounter>(clusterCloseEnum);
+      route<OpenCounter>(openClusterResource);
+      route<OpenCounter>(createClusterResource);
+      route<CloseCounter>(closeClusterResource);
+      route<OpenCounter>(clusterResourceOpenEnum);
+      route<CloseCounter>(clusterResourceCloseEnum);
+    }
+    return rc;
+  }
+  // Which entry points a partial binding left set.
+  bool BoundThroughCloseClusterResource() const { return moveClusterGroup && closeClusterResource; }
+  bool AnyBoundAfterCloseClusterResource() const {
+    return onlineClusterResource || getNodeClusterState || resUtilStartResourceService ||
+           resUtilResourceTypesEqual;
+  }
+};
+
+int removeEntry(const char *path, const struct stat *, int, struct FTW *) {
+  return remove(path);
+}
+
+std::vector<std::string> names(const ClusterResourceList &list) {
+  std::vector<std::string> out;
+  for (const ClusterResourceEntry &entry : list)
+    out.push_back(std::string(entry.name) + "@" + entry.group);
+  return out;
+}
+
+class ClusterWorld : public ::testing::Test, public kxltest::WorldAccess {
+protected:
+  void SetUp() override {
+    char pattern[] = "/tmp/kxlcluster.XXXXXX";
+    ASSERT_NE(mkdtemp(pattern), nullptr);
+    root_ = pattern;
+    std::ofstream(root_ + "/system.reg") << "REGEDIT4\n";
+    mkdir((root_ + "/drive_c").c_str(), 0777);
+    setenv("KXLSIM_ROOT", root_.c_str(), 1);
+    unsetenv("KXLSIM_FAIL");
+    kxlsim::posix::resetWorldRoot();
+    kxlsim::resetFaults();
+    liveHandles().clear();
+  }
+  void TearDown() override {
+    EXPECT_TRUE(liveHandles().empty()) << liveHandles().size() << " cluster handles left open";
+    unsetenv("KXLSIM_FAIL");
+    kxlsim::resetFaults();
+    nftw(root_.c_str(), removeEntry, 16, FTW_DEPTH | FTW_PHYS);
+    unsetenv("KXLSIM_ROOT");
+    kxlsim::posix::resetWorldRoot();
+  }
+
+  void installModule(const char *name) {
+    writeFile(std::string("C:\\windows\\system32\\") + name, std::string("MZ"));
+  }
+  static void failCalls(const char *plan) {
+    setenv("KXLSIM_FAIL", plan, 1);
+    kxlsim::resetFaults();
+  }
+
+  std::string root_;
+};
+
+// A running node with one group, two resource types and three resources.
+class ClusterOps : public ClusterWorld {
+protected:
+  void SetUp() override {
+    ClusterWorld::SetUp();
+    installModule("clusapi.dll");
+    installModule("resutils.dll");
+    setDword(kCluster, "NodeState", 19);
+    setDword(kCluster + "\\Groups\\G1", "State", 0);
+    setDword(kCluster + "\\Groups\\G2", "State", 0);
+    addType("KXL Server");
+    addType("Physical Disk");
+    addResource("A-inst", "KXL Server", "G2");
+    addResource("B-disk", "Physical Disk", "G1");
+    addResource("C-inst", "KXL Server", "G1");
+    addResource("D-case", "kxl server", "G1");
+    ASSERT_EQ(util.Bind(), 0);
+  }
+  void addType(const std::string &type) {
+    setString(kCluster + "\\ResourceTypes\\" + type, "DllName", "x.dll");
+  }
+  void addResource(const std::string &name, const std::string &type, const std::string &group) {
+    setString(kResources + name, "Type", type);
+    setString(kResources + name, "Group", group);
+  }
+  void setDependsOn(const std::string &name, const std::string &multi) {
+    setRegValue(kResources + name, "DependsOn", REG_MULTI_SZ, multi.data(), DWORD(multi.size()));
+  }
+  ClusterResourceList entries(std::initializer_list<const char *> list) {
+    ClusterResourceList out;
+    for (const char *name : list) {
+      ClusterResourceEntry entry;
+      for (size_t i = 0; name[i] != 0; ++i)
+        entry.wideName[i] = static_cast<unsigned char>(name[i]);
+      out.push_back(entry);
+    }
+    return out;
+  }
+  void stopNode() { setDword(kCluster, "NodeState", 3); }
+
+  ProbedMSCSUtil util;
+};
+
+using Binding = ClusterWorld;
+
+TEST_F(Binding, BindsAllEntryPointsOnlyWhenBothModulesAndEveryNameArePresent) {
+  installModule("clusapi.dll");
+  installModule("resutils.dll");
+  {
+    ProbedMSCSUtil util;
+    EXPECT_EQ(util.Bind(), 0);
+    EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 1);
+    EXPECT_EQ(kxlsim::posix::moduleLoadCount("resutils.dll"), 1);
+  }
+  EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 0);
+  EXPECT_EQ(kxlsim::posix::moduleLoadCount("resutils.dll"), 0);
+
+  // The 20th lookup (OnlineClusterResource) is missing: the first 19 stay bound.
+  failCalls("GetProcAddress:20");
+  {
+    ProbedMSCSUtil util;
+    EXPECT_EQ(util.Bind(), -1);
+    EXPECT_TRUE(util.BoundThroughCloseClusterResource());
+    EXPECT_FALSE(util.AnyBoundAfterCloseClusterResource());
+  }
+  EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 0) << "released by the destructor";
+  EXPECT_EQ(kxlsim::posix::moduleLoadCount("resutils.dll"), 0);
+
+  // A missing resource utility entry point fails the binding as well.
+  failCalls("GetProcAddress:36");
+  ProbedMSCSUtil util;
+  EXPECT_EQ(util.Bind(), -1);
+}
+
+TEST_F(Binding, MissingModulesFailAndLeaveNothingLoadedAfterDestruction) {
+  installModule("resutils.dll");
+  {
+    ProbedMSCSUtil util;
+    EXPECT_EQ(util.Bind(), -1);
+    EXPECT_EQ(kxlsim::posix::moduleLoadCount("resutils.dll"), 1);
+  }
+  EXPECT_EQ(kxlsim::posix::moduleLoadCount("resutils.dll"), 0);
+
+  ASSERT_EQ(remove((root_ + "/drive_c/windows/system32/resutils.dll").c_str()), 0);
+  installModule("clusapi.dll");
+  ProbedMSCSUtil util;
+  EXPECT_EQ(util.Bind(), -1);
+  EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 0) << "not loaded without resutils.dll";
+}
+
+TEST_F(ClusterOps, RegistersATypeOnceAndOnlyOnARunningNode) {
+  EXPECT_EQ(util.CreateResourceType(u"New Type", u"New Display", u"new.dll", 5000, 60000), 0);
+  EXPECT_EQ(getString(kCluster + "\\ResourceTypes\\New Type", "DllName"), "new.dll");
+  EXPECT_EQ(getDword(kCluster + "\\ResourceTypes\\New Type", "IsAlivePollInterval"), 60000u);
+  EXPECT_EQ(util.CreateResourceType(u"New Type", u"New Display", u"new.dll", 5000, 60000), 0)
+      << "an existing type counts as registered";
+  stopNode();
+  EXPECT_EQ(util.CreateResourceType(u"Other", u"Other", u"o.dll", 5000, 60000), -1);
+  EXPECT_FALSE(keyExists(kCluster + "\\ResourceTypes\\Other"));
+}
+
+TEST_F(ClusterOps, ListsResourcesOfExactlyTheTypeInEnumerationOrder) {
+  ClusterResourceList found = util.GetResourcesOfType("KXL Server");
+  EXPECT_EQ(names(found), (std::vector<std::string>{"A-inst@G2", "C-inst@G1"}))
+      << "a type differing only in case is not listed";
+  ASSERT_EQ(found.size(), 2u);
+  EXPECT_EQ(std::u16string(found[1].wideName), u"C-inst");
+  EXPECT_EQ(std::u16string(found[1].wideGroup), u"G1");
+  EXPECT_TRUE(util.GetResourcesOfType("No Type").empty());
+  stopNode();
+  EXPECT_TRUE(util.GetResourcesOfType("KXL Server").empty());
+}
+
+TEST_F(ClusterOps, TestsTheTypeOfAResource) {
+  EXPECT_NE(util.IsResourceOfType("C-inst", "KXL Server"), 0);
+  EXPECT_EQ(util.IsResourceOfType("B-disk", "KXL Server"), 0);
+  EXPECT_EQ(util.IsResourceOfType("Missing", "KXL Server"), 0);
+  stopNode();
+  EXPECT_EQ(util.IsResourceOfType("C-inst", "KXL Server"), 0);
+}
+
+TEST_F(ClusterOps, ListsDependenciesWithEmptyGroupsAndLeavesOutOverlongNames) {
+  const std::string overlong(70, 'x');
+  setDependsOn("C-inst", std::string("B-disk\0", 7) + overlong + std::string("\0A-inst\0\0", 9));
+  EXPECT_EQ(names(util.GetResourceDependencies("C-inst")), (std::vector<std::string>{"B-disk@", "A-inst@"}));
+  ClusterResourceList dependencies = util.GetResourceDependencies("C-inst");
+  ASSERT_FALSE(dependencies.empty());
+  EXPECT_EQ(dependencies[0].wideGroup[0], 0);
+  EXPECT_TRUE(util.GetResourceDependencies("B-disk").empty());
+  EXPECT_TRUE(util.GetResourceDependencies("Missing").empty());
+  stopNode();
+  EXPECT_TRUE(util.GetResourceDependencies("C-inst").empty()) << "no cluster to open";
+}
+
+TEST_F(ClusterOps, DeletesResourcesAndCountsAMissingOneAsDeleted) {
+  EXPECT_EQ(util.DeleteResource("B-disk"), 0);
+  EXPECT_FALSE(keyExists(kResources + "B-disk"));
+  EXPECT_EQ(util.DeleteResource("B-disk"), 0);
+  EXPECT_EQ(util.DeleteResource(std::string(80, 'y').c_str()), 0);
+  stopNode();
+  EXPECT_EQ(util.DeleteResource("C-inst"), -1);
+  EXPECT_TRUE(keyExists(kResources + "C-inst"));
+}
+
+TEST_F(ClusterOps, CreatesResourcesInTheirOwnMonitor) {
+  HRESOURCE created = util.CreateResource("G1", "New-inst", "KXL Server");
+  ASSERT_NE(created, nullptr);
+  EXPECT_EQ(getString(kResources + "New-inst", "Type"), "KXL Server");
+  EXPECT_EQ(getString(kResources + "New-inst", "Group"), "G1");
+  EXPECT_EQ(getDword(kResources + "New-inst", "SeparateMonitor"), 1u);
+  util.CloseResource(created);
+
+  EXPECT_EQ(util.CreateResource("G1", "New-inst", "KXL Server"), nullptr) << "exists";
+  EXPECT_EQ(util.CreateResource("No Group", "Other", "KXL Server"), nullptr);
+  EXPECT_EQ(util.CreateResource("G1", "Other", "No Type"), nullptr);
+  EXPECT_EQ(util.CreateResource("G1", std::string(65, 'z').c_str(), "KXL Server"), nullptr)
+      << "a name that does not fit is refused, not cut";
+  EXPECT_FALSE(keyExists(kResources + std::string(64, 'z')));
+  stopNode();
+  EXPECT_EQ(util.CreateResource("G1", "Other", "KXL Server"), nullptr);
+  EXPECT_FALSE(keyExists(kResources + "Other"));
+}
+
+TEST_F(ClusterOps, AddsEachDependencyThatCanBeOpenedAndReportsFailedOnes) {
+  EXPECT_EQ(util.AddResourceDependencies("C-inst", {}), 0);
+  EXPECT_EQ(util.AddResourceDependencies("C-inst", entries({"B-disk", "Gone", "A-inst"})), 0);
+  EXPECT_EQ(names(util.GetResourceDependencies("C-inst")), (std::vector<std::string>{"B-disk@", "A-inst@"}));
+  // B-disk already there and C-inst would close a cycle; A-inst -> D-case still goes in.
+  EXPECT_EQ(util.AddResourceDependencies("A-inst", entries({"C-inst", "D-case"})), -1);
+  EXPECT_EQ(names(util.GetResourceDependencies("A-inst")), (std::vector<std::string>{"D-case@"}));
+  EXPECT_EQ(util.AddResourceDependencies("Missing", entries({"B-disk"})), -1);
+  EXPECT_EQ(util.AddResourceDependencies("C-inst", util.GetResourceDependencies("C-inst")), -1)
+      << "each already exists";
+}
+
+TEST_F(ClusterOps, FailedOpensLeaveNoHandleOpen) {
+  failCalls("OpenCluster:1,OpenCluster:2,OpenCluster:3,OpenCluster:4,OpenCluster:5,OpenCluster:6,"
+            "OpenCluster:7");
+  EXPECT_EQ(util.CreateResourceType(u"T", u"T", u"t.dll", 1, 1), -1);
+  EXPECT_TRUE(util.GetResourcesOfType("KXL Server").empty());
+  EXPECT_EQ(util.IsResourceOfType("C-inst", "KXL Server"), 0);
+  EXPECT_TRUE(util.GetResourceDependencies("C-inst").empty());
+  EXPECT_EQ(util.DeleteResource("C-inst"), -1);
+  EXPECT_EQ(util.CreateResource("G1", "X", "KXL Server"), nullptr);
+  EXPECT_EQ(util.AddResourceDependencies("C-inst", entries({"B-disk"})), -1);
+  EXPECT_TRUE(keyExists(kResources + "C-inst"));
+  EXPECT_TRUE(liveHandles().empty());
+
+  failCalls("ClusterOpenEnum:1,ClusterResourceOpenEnum:1,OpenClusterResource:2,OpenClusterGroup:1");
+  EXPECT_TRUE(util.GetResourcesOfType("KXL Server").empty());
+  setDependsOn("C-inst", std::string("B-disk\0\0", 8));
+  EXPECT_TRUE(util.GetResourceDependencies("C-inst").empty());
+  EXPECT_EQ(util.AddResourceDependencies("C-inst", entries({"A-inst"})), -1);
+  EXPECT_EQ(util.CreateResource("G1", "X", "KXL Server"), nullptr);
+  EXPECT_TRUE(liveHandles().empty());
+}
+
+TEST_F(ClusterOps, AResourceWhoseTypeCannotBeReadIsNotListed) {
+  failCalls("ClusterResourceControl:1");
+  EXPECT_EQ(names(util.GetResourcesOfType("KXL Server")), (std::vector<std::string>{"C-inst@G1"}));
+}
+
+} // namespace
