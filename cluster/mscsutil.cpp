@@ -64,7 +64,7 @@ bool copyName(WCHAR *field, const WCHAR *name, size_t nameCapacity) {
     field[0] = 0;
     return false;
   }
-  std::char_traits<char16_t>::copy(field, name, length);
+  std::char_traits<WCHAR>::copy(field, name, length);
   field[length] = 0;
   return true;
 }
@@ -79,7 +79,7 @@ ClusterResourceEntry makeEntry(const WCHAR *name, const WCHAR *group) {
 }
 
 bool sameText(const WCHAR *left, const WCHAR *right) {
-  return std::u16string_view(left) == std::u16string_view(right);
+  return std::basic_string_view<WCHAR>(left) == std::basic_string_view<WCHAR>(right);
 }
 
 } // namespace
