@@ -105,17 +105,27 @@ bool lessIgnoringCase(const std::string &a, const std::string &b) {
 
 // Names in `directory` matching `pattern`, sorted as a Windows volume lists
 // them; "." and ".." head the list outside a drive's root, as on Windows.
-std::vector<std::string> matchingNames(const std::string &directory, const std::string &pattern) {
-  std::vector<std::string> names;
+// False, with errno set, when the folder cannot be read to its end.
+bool matchingNames(const std::string &directory, const std::string &pattern,
+                   std::vector<std::string> &names) {
   DIR *stream = opendir(directory.c_str());
   if (stream == nullptr)
-    return names;
-  while (const dirent *entry = readdir(stream)) {
+    return false;
+  for (;;) {
+    errno = 0;
+    const dirent *entry = readdir(stream);
+    if (entry == nullptr)
+      break;
     std::string name = entry->d_name;
     if (name != "." && name != ".." && wildcardMatch(pattern.c_str(), name.c_str()))
       names.push_back(name);
   }
+  int readError = errno;
   closedir(stream);
+  if (readError != 0) {
+    errno = readError;
+    return false;
+  }
   std::sort(names.begin(), names.end(), lessIgnoringCase);
   std::string windowsDir = windowsPath(directory);
   bool driveRoot = windowsDir.size() <= 3;
@@ -124,7 +134,7 @@ std::vector<std::string> matchingNames(const std::string &directory, const std::
       if (wildcardMatch(pattern.c_str(), dots))
         names.insert(names.begin(), dots);
   }
-  return names;
+  return true;
 }
 
 // Splits "dir\pattern" at the last separator.
@@ -221,8 +231,11 @@ HANDLE FindFirstFileA(LPCSTR lpFileName, LPWIN32_FIND_DATAA lpFindFileData) {
     return failWith(ERROR_PATH_NOT_FOUND, INVALID_HANDLE_VALUE);
   if (!S_ISDIR(info.st_mode))
     return failWith(ERROR_PATH_NOT_FOUND, INVALID_HANDLE_VALUE);
+  std::vector<std::string> names;
+  if (!matchingNames(hostDir, pattern, names))
+    return failWith(win32ErrorFromErrno(errno, hostDir), INVALID_HANDLE_VALUE);
   auto search = std::make_unique<FindObject>();
-  for (const std::string &name : matchingNames(hostDir, pattern)) {
+  for (const std::string &name : names) {
     WIN32_FIND_DATAA data;
     if (fillFindData(hostDir, name, data))
       search->entries.push_back(data);
@@ -235,8 +248,9 @@ HANDLE FindFirstFileA(LPCSTR lpFileName, LPWIN32_FIND_DATAA lpFindFileData) {
 }
 
 BOOL FindNextFileA(HANDLE hFindFile, LPWIN32_FIND_DATAA lpFindFileData) {
+  // An injected failure is a failed read of the folder, never its end.
   if (kxlsim::shouldFail("FindNextFileA"))
-    return failWith(ERROR_NO_MORE_FILES, FALSE);
+    return failWith(ERROR_READ_FAULT, FALSE);
   auto *search = lookupHandleAs<FindObject>(hFindFile);
   if (search == nullptr || lpFindFileData == nullptr)
     return failWith(ERROR_INVALID_HANDLE, FALSE);

@@ -88,12 +88,16 @@ bool isWithin(const std::string &inner, const std::string &outer) {
 }
 
 // Calls visit(name, isDirectory) for each entry of a directory; stops at
-// the first non-zero result and returns it.
+// the first non-zero result and returns it. A listing that fails before its
+// end fails the walk: only ERROR_NO_MORE_FILES ends it. Outside a drive's
+// root a listing always holds "." and "..", so finding nothing there is a
+// failure too.
 template <typename Visit> int32_t forEachEntry(const std::string &dir, Visit visit) {
   WIN32_FIND_DATAA data;
   HANDLE search = FindFirstFileA(joinPath(dir, "*").c_str(), &data);
   if (search == INVALID_HANDLE_VALUE) {
-    return GetLastError() == ERROR_FILE_NOT_FOUND ? 0 : codeForLastError(SQLO_RC_PATH_NOT_FOUND);
+    bool emptyRoot = GetLastError() == ERROR_FILE_NOT_FOUND && isRootPath(dir);
+    return emptyRoot ? 0 : codeForLastError(SQLO_RC_PATH_NOT_FOUND);
   }
   int32_t rc = 0;
   do {
@@ -102,6 +106,8 @@ template <typename Visit> int32_t forEachEntry(const std::string &dir, Visit vis
       rc = visit(std::string(data.cFileName), (data.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY) != 0);
     }
   } while (rc == 0 && FindNextFileA(search, &data));
+  if (rc == 0 && GetLastError() != ERROR_NO_MORE_FILES)
+    rc = codeForLastError(SQLO_RC_IO_ERROR);
   FindClose(search);
   return rc;
 }

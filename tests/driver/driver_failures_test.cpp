@@ -65,7 +65,8 @@ TEST_F(DriverFailureTest, BackupFailuresEndWith1969AndLeaveNoDirectory) {
   struct Case {
     const char *fault;
     long long probe;
-  } cases[] = {{"GetTempPathA:1", 20}, {"_tempnam:1", 30}, {"CreateDirectoryA:1", 40}, {"sqlocopydir:1", 50}};
+  } cases[] = {{"GetTempPathA:1", 20}, {"_tempnam:1", 30},      {"CreateDirectoryA:1", 40},
+               {"sqlocopydir:1", 50},  {"FindNextFileA:1", 50}, {"FindNextFileA:6", 50}};
   for (const Case &c : cases) {
     SCOPED_TRACE(c.fault);
     Outcome outcome = run({"INST1"}, c.fault);
@@ -73,6 +74,17 @@ TEST_F(DriverFailureTest, BackupFailuresEndWith1969AndLeaveNoDirectory) {
     EXPECT_FALSE(exists(kNewInstanceDir));
     expectUndone();
   }
+  EXPECT_EQ(run({"INST1"}).driverResult, 0);
+}
+
+// An in-place upgrade re-creates the instance in its own directory: an
+// incomplete backup would lose the original files, so it stops the run first.
+TEST_F(DriverFailureTest, InPlaceUpgradeWithAFailedListingChangesNothing) {
+  Outcome outcome = run({"-p", kOldCopy, "INST1"}, "FindNextFileA:6");
+  expectFailure(outcome, 50, -1969);
+  expectUndone();
+  ASSERT_EQ(run({"-p", kOldCopy, "INST1"}).driverResult, 0);
+  EXPECT_NE(fileContent(std::string(kOldInstanceDir) + "\\kxlsystm"), before.at("kxlsystm"));
 }
 
 TEST_F(DriverFailureTest, ProfilePathWithTheInstanceAlreadyThereChangesNothing) {

@@ -232,6 +232,17 @@ TEST_F(FilesTest, InjectedFaultFailsOnlyTheNamedCall) {
   EXPECT_FALSE(CreateDirectoryA("C:\\D\\E", nullptr));
   EXPECT_FALSE(exists("drive_c/D/E")) << "a failed call changes nothing";
   EXPECT_TRUE(CreateDirectoryA("C:\\D\\E", nullptr));
+
+  // A failed listing is told from its end by its code.
+  setenv("KXLSIM_FAIL", "FindNextFileA:1", 1);
+  kxlsim::resetFaults();
+  WIN32_FIND_DATAA data;
+  HANDLE search = FindFirstFileA("C:\\D\\*", &data);
+  ASSERT_NE(search, INVALID_HANDLE_VALUE);
+  EXPECT_FALSE(FindNextFileA(search, &data));
+  EXPECT_NE(GetLastError(), static_cast<DWORD>(ERROR_NO_MORE_FILES));
+  EXPECT_TRUE(FindNextFileA(search, &data));
+  FindClose(search);
   unsetenv("KXLSIM_FAIL");
   kxlsim::resetFaults();
 }

@@ -99,6 +99,13 @@ TEST_F(Files, DirectoryTreesAreCopiedWholeAndDeletedWhole) {
       << "a tree is never copied into itself";
   EXPECT_FALSE(exists("C:\\inst\\INST1\\cfg\\inner"));
 
+  // A listing that fails part way fails the copy instead of ending it early.
+  kxltest::setProcessVariable("KXLSIM_FAIL", "FindNextFileA:4");
+  kxlsim::resetFaults();
+  EXPECT_NE(0, sqlocopydir("C:\\partial", "C:\\inst\\INST1", 0));
+  kxltest::setProcessVariable("KXLSIM_FAIL", nullptr);
+  kxlsim::resetFaults();
+
   ASSERT_EQ(0, sqlodeletedir("C:\\backup"));
   EXPECT_FALSE(exists("C:\\backup"));
   EXPECT_TRUE(exists("C:\\inst\\INST1\\kxlsystm"));
