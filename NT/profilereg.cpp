@@ -12,6 +12,8 @@
 #include <cstddef>
 #include <cstdio>
 #include <cstring>
+#include <string>
+#include <vector>
 
 namespace {
 
@@ -39,7 +41,6 @@ constexpr uint32_t kProbeComputerName = 40;
 constexpr uint32_t kProbeClusterName = 50;
 constexpr uint32_t kProbeClusterOpen = 60;
 constexpr uint32_t kProbeClusterKey = 70;
-constexpr uint32_t kProbeClusterLocalKey = 80;
 constexpr uint32_t kProbeCreateKey = 100;
 constexpr uint32_t kProbeCopyKey = 110;
 
@@ -161,7 +162,9 @@ int32_t revertKey(HKEY root, const ProfileKeys &keys, bool force) {
 using KeyOperation = int32_t (*)(UpgradeContext &, HKEY, UpgradeOptions &, uint8_t);
 
 // One pass over the instance's machines: the per-machine operation, the trace
-// identifier it reports under, and the one machine registry kept open.
+// identifier it reports under, the one machine registry kept open, and the
+// machines already handled by name, so that a machine named by both the node
+// list and the cluster list is handled once.
 struct MachineWalk {
   UpgradeContext &context;
   UpgradeOptions &options;
@@ -169,6 +172,7 @@ struct MachineWalk {
   KeyOperation operation;
   const ProfileKeys *keys; // the undo's service names; null for the move
   SQLO_PREG_MACHINE *machine = nullptr;
+  std::vector<std::string> handled;
 
   MachineWalk(UpgradeContext &c, UpgradeOptions &o, uint32_t f, KeyOperation op, const ProfileKeys *k)
       : context(c), options(o), function(f), operation(op), keys(k) {}
@@ -179,6 +183,13 @@ struct MachineWalk {
   void release() {
     if (machine != nullptr)
       sqloPRegMachineClose(&machine);
+  }
+
+  bool handledAlready(const char *machineName) const {
+    for (const std::string &name : handled)
+      if (sameText(name.c_str(), machineName, SQLO_COMPUTERNAME_SZ))
+        return true;
+    return false;
   }
 };
 
@@ -191,6 +202,7 @@ int32_t onLocalMachine(MachineWalk &walk, uint32_t probe) {
 
 int32_t onMachine(MachineWalk &walk, const char *machineName, uint8_t force, uint32_t openProbe,
                   uint32_t keyProbe) {
+  walk.handled.emplace_back(machineName);
   if (sqloPRegMachineOpen(machineName, &walk.machine) != 0 || walk.machine == nullptr)
     return traced(walk.function, openProbe, KXL_RC_MACHINE_REGISTRY);
   int32_t rc = walk.operation(walk.context, walk.machine->hklm, walk.options, force);
@@ -291,9 +303,11 @@ void readClusterList(const char *instance, char (&list)[kRegValueBuffer]) {
     kxliReadRegString(HKEY_LOCAL_MACHINE, key, kAllAccess, kClusterListValue, list, sizeof list);
 }
 
-// Every machine of the cluster list: the local computer on its own root key
-// (or skipped), the others through the machine registry.
-int32_t walkCluster(MachineWalk &walk, bool includeLocal) {
+// The machines of the cluster list that the first pass did not handle, through
+// the machine registry. The local computer is never among them: its key is the
+// first pass's (the local machine, or its partitions), and the undo handles
+// exactly the machines the move handled.
+int32_t walkCluster(MachineWalk &walk) {
   char computer[SQLO_COMPUTERNAME_SZ] = {};
   uint32_t size = sizeof computer;
   if (sqloGetComputerNameA(computer, &size) == 0)
@@ -311,9 +325,7 @@ int32_t walkCluster(MachineWalk &walk, bool includeLocal) {
     if (end != nullptr)
       *end = '\0';
     int32_t rc = 0;
-    if (sameText(name, computer, SQLO_COMPUTERNAME_SZ))
-      rc = includeLocal ? onLocalMachine(walk, kProbeClusterLocalKey) : 0;
-    else if (name[0] != '\0')
+    if (name[0] != '\0' && !sameText(name, computer, SQLO_COMPUTERNAME_SZ) && !walk.handledAlready(name))
       rc = onMachine(walk, name, 0, kProbeClusterOpen, kProbeClusterKey);
     if (rc != 0)
       return rc;
@@ -470,7 +482,7 @@ int32_t moveInstanceProfile(UpgradeContext &context, UpgradeOptions &options) {
   MachineWalk walk(context, options, KXL_FN_MOVE_INSTANCE_PROFILE, moveProfileKey, nullptr);
   int32_t rc = moveMachines(walk);
   if (rc == 0 && isClustered(context))
-    rc = walkCluster(walk, false);
+    rc = walkCluster(walk);
   walk.release();
   pdtExit(KXL_FN_MOVE_INSTANCE_PROFILE, rc, 0);
   return rc;
@@ -484,7 +496,7 @@ int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options) 
   if (rc == 0)
     rc = revertMachines(walk);
   if (rc == 0 && isClustered(context))
-    rc = walkCluster(walk, true);
+    rc = walkCluster(walk);
   walk.release();
   pdtExit(KXL_FN_REVERT_INSTANCE_PROFILE, rc, 0);
   return rc;

@@ -129,4 +129,15 @@ TEST_F(MoveProfile, ClusterMachineUnreachableAfterTheLocalMove) {
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=60 rc=-1913"));
 }
 
+TEST_F(MoveProfile, PartitionMachinesThatAreAlsoClusterMachinesMoveOnce) {
+  clusterOn("CLUS1", "hosta m2 M3 M2");
+  ownBy(kOld);
+  for (const char *machine : {kLocal, "M2", "M3"})
+    seedProfile(machine, kOld);
+  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n");
+  EXPECT_EQ(0, moveInstanceProfile(context_, options_));
+  for (const char *machine : {kLocal, "M2", "M3"})
+    expectMoved(machine, kOld, kCurrent);
+}
+
 } // namespace

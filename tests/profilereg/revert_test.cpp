@@ -128,4 +128,27 @@ TEST_F(RevertProfile, ClusterRoundTripRestoresEveryMachine) {
     expectMoved(machine, kCurrent, kOld);
 }
 
+// The undo handles the machines the move handled: the partitions' machine and
+// the cluster's other machines, each once, and not the local machine that
+// served no partition (whose profile already is the current copy's).
+TEST_F(RevertProfile, ClusteredPartitionsUndoTheMachinesTheMoveHandled) {
+  clusterOn("CLUS1", "HOSTA M2 m3 M3");
+  ownBy(kOld);
+  SHDeleteKeyA(HKEY_LOCAL_MACHINE, profile(kOld).c_str());
+  ASSERT_FALSE(keyExists(profile(kOld)));
+  seedProfile("M2", kOld);
+  seedProfile("M3", kOld);
+  seedProfile(kLocal, kCurrent);
+  loadNodes("0 hostb.zav.test M2 0\n1 hostb.zav.test M2 1\n");
+  ASSERT_EQ(0, moveInstanceProfile(context_, options_));
+  expectMoved("M2", kOld, kCurrent);
+  expectMoved("M3", kOld, kCurrent);
+  ASSERT_FALSE(keyExists(profile(kOld)));
+
+  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
+  expectMoved("M2", kCurrent, kOld);
+  expectMoved("M3", kCurrent, kOld);
+  expectUntouched(kLocal, kCurrent, kOld);
+}
+
 } // namespace
