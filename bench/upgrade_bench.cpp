@@ -69,7 +69,8 @@ double runTimed(const std::vector<std::string> &argv, const std::vector<std::str
     for (const std::string &arg : argv)
       args.push_back(const_cast<char *>(arg.c_str()));
     args.push_back(nullptr);
-    if (std::freopen("/dev/null", "w", stdout) == nullptr || std::freopen("/dev/null", "w", stderr) == nullptr)
+    if (std::freopen("/dev/null", "w", stdout) == nullptr ||
+        std::freopen("/dev/null", "w", stderr) == nullptr)
       _exit(126);
     execv(args[0], args.data());
     _exit(127);
@@ -185,7 +186,8 @@ void addPartitionedInstance(WorldWriter &w, int partitions, int machines) {
   for (int p = 0; p < partitions; ++p) {
     int m = p % machines;
     std::string host = m == 0 ? "winsrv1.zav.test" : kxlsim::posix::hive::fold(names[m]) + ".zav.test";
-    inst.nodesFile += std::to_string(p) + " " + host + " " + names[m] + " " + std::to_string(p / machines) + " \r\n";
+    inst.nodesFile +=
+        std::to_string(p) + " " + host + " " + names[m] + " " + std::to_string(p / machines) + " \r\n";
   }
   kxlsim::addInstance(w, inst);
   for (int p = 0; p < partitions; ++p) {
@@ -241,8 +243,8 @@ void report(const Measure &m, int rounds) {
     b.push_back(y);
     ratio.push_back(x / y);
   }
-  std::printf("| %-10s | %-22s | %-26s | %8.3f s | %-20s | %8.3f s | %7.2f |\n", m.row.c_str(), m.size.c_str(),
-              m.what.c_str(), median(a), m.baseline.c_str(), median(b), median(ratio));
+  std::printf("| %-10s | %-22s | %-26s | %8.3f s | %-20s | %8.3f s | %7.2f |\n", m.row.c_str(),
+              m.size.c_str(), m.what.c_str(), median(a), m.baseline.c_str(), median(b), median(ratio));
   std::fflush(stdout);
 }
 
@@ -251,7 +253,8 @@ public:
   Bench(const Options &options, fs::path scratch) : options_(options), scratch_(std::move(scratch)) {}
 
   bool wanted(const std::string &row) const {
-    return options_.only.empty() || std::find(options_.only.begin(), options_.only.end(), row) != options_.only.end();
+    return options_.only.empty() ||
+           std::find(options_.only.begin(), options_.only.end(), row) != options_.only.end();
   }
 
   // The pristine world is kept; each upgrade runs on a fresh copy of it.
@@ -311,7 +314,8 @@ public:
 void copiesRow(Bench &b, int copies, int instances) {
   fs::path world = b.world("copies", [&](WorldWriter &w) { addCopiesAndInstances(w, copies, instances); });
   std::string size = std::to_string(copies) + " copies x " + std::to_string(instances);
-  report({"copies", size, "unknown instance", "demo upgrade", [&] { return b.command(world, {"NOSUCH"}, 1); },
+  report({"copies", size, "unknown instance", "demo upgrade",
+          [&] { return b.command(world, {"NOSUCH"}, 159); },
           [&] { return b.upgrade(b.demo_, {"INST1"}, 0); }},
          b.options_.rounds);
   report({"copies", size, "upgrade INST1", "demo upgrade", [&] { return b.upgrade(world, {"INST1"}, 0); },
@@ -324,7 +328,10 @@ void partitionsRow(Bench &b, int partitions, int machines) {
   fs::path world =
       b.world("partitions", [&](WorldWriter &w) { addPartitionedInstance(w, partitions, machines); });
   std::string size = std::to_string(partitions) + " on " + std::to_string(machines) + " machines";
-  report({"partitions", size, "upgrade PINST", "demo upgrade", [&] { return b.upgrade(world, {"-u", "kxlsvc,secret", "PINST"}, 0); },
+  report({"partitions", size, "upgrade PINST", "demo upgrade",
+          [&] {
+            return b.upgrade(world, {"-u", "kxlsvc,secret", "PINST"}, 0);
+          },
           [&] { return b.upgrade(b.demo_, {"INST1"}, 0); }},
          b.options_.rounds);
   b.drop(world);
@@ -408,9 +415,10 @@ bool parse(int argc, char **argv, Options &options) {
 int main(int argc, char **argv) {
   Options options;
   if (!parse(argc, argv, options)) {
-    std::fprintf(stderr, "usage: kxl_upgrade_bench [--rounds N] [--only copies,partitions,files,large,failure] "
-                         "[--half-only]\n"
-                         "                         [--command PATH] [--tools PATH] [--messages DIR]\n");
+    std::fprintf(stderr,
+                 "usage: kxl_upgrade_bench [--rounds N] [--only copies,partitions,files,large,failure] "
+                 "[--half-only]\n"
+                 "                         [--command PATH] [--tools PATH] [--messages DIR]\n");
     return 2;
   }
   std::string pattern = (fs::temp_directory_path() / "kxlupbench.XXXXXX").string();
@@ -418,10 +426,12 @@ int main(int argc, char **argv) {
     return 1;
   Bench b(options, pattern);
   b.demo_ = b.world("demo", [](WorldWriter &) {});
-  std::printf("| row        | size                   | measured                   |   median | baseline             "
-              "|   median |   ratio |\n");
-  std::printf("|------------|------------------------|----------------------------|----------|--------------------"
-              "--|----------|---------|\n");
+  std::printf(
+      "| row        | size                   | measured                   |   median | baseline             "
+      "|   median |   ratio |\n");
+  std::printf(
+      "|------------|------------------------|----------------------------|----------|--------------------"
+      "--|----------|---------|\n");
   std::fflush(stdout);
   const int steps = options.halfOnly ? 1 : 2;
   for (int half = 1; half >= 2 - steps; --half) {

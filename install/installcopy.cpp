@@ -9,6 +9,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <new>
+#include <vector>
 
 namespace {
 
@@ -143,6 +144,8 @@ uint32_t InstallCopy::GetVersion(CopyVersion **out) {
 }
 
 uint32_t InstallCopy::GetInstanceList(IKXLINSTANCELIST **out) {
+  if (instances == nullptr && family != nullptr)
+    family->BuildInstanceLists();
   return subList(instances, out);
 }
 
@@ -201,7 +204,7 @@ bool InstallCopyList::addV8Copy() {
     delete copy;
     return false;
   }
-  if (Append(copy) != 0)
+  if (adopt(copy) != 0)
     return false;
   v8Copy = copy;
   return true;
@@ -231,12 +234,37 @@ void InstallCopyList::addInstalledCopies() {
       delete copy;
       continue;
     }
-    if (Append(copy) != 0)
+    if (adopt(copy) != 0)
       rc = ERROR_NOT_ENOUGH_MEMORY;
   }
   if (rc != ERROR_NO_MORE_ITEMS)
     status = 1;
   RegCloseKey(key);
+}
+
+uint32_t InstallCopyList::adopt(InstallCopy *copy) {
+  uint32_t rc = Append(copy); // destroys the copy when it fails
+  if (rc == 0)
+    copy->family = this;
+  return rc;
+}
+
+void InstallCopyList::BuildInstanceLists() {
+  // Walked by node, so that a caller's walk of this list keeps its place.
+  std::vector<InstallCopy *> owners;
+  for (INODE<InstallCopy> *node = head; node != nullptr; node = node->next)
+    if (node->data->instances == nullptr && node->data->name[0] != '\0')
+      owners.push_back(node->data);
+  std::vector<IKXLINSTANCELIST *> lists(owners.size(), nullptr);
+  if (owners.empty() || IKXLINSTANCELIST::BuildForCopies(owners.data(), static_cast<uint32_t>(owners.size()),
+                                                         lists.data()) != 0)
+    return;
+  for (size_t i = 0; i < owners.size(); ++i) {
+    if (lists[i]->status == 0)
+      owners[i]->instances = lists[i];
+    else
+      delete lists[i];
+  }
 }
 
 uint32_t InstallCopyList::Find(const char *copyName, InstallCopy **out) {

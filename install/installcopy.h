@@ -10,6 +10,7 @@
 
 class IKXLINSTANCELIST;
 class InstalledProdList;
+class InstallCopyList;
 
 // Name of the version-8 installation in the list of copies.
 inline constexpr const char KXLI_V8_COPY_NAME[] = "KXLV8";
@@ -73,6 +74,7 @@ public:
   IKXLINSTANCELIST *instances;          // owned, null until asked for
   uint32_t status;                      // 0 valid, 1 registration unreadable, 2 no "Components" (32-bit view)
   ILIST<char> components;
+  InstallCopyList *family = nullptr; // the list holding this copy, if any; not owned
 
 private:
   bool readRegistration();
@@ -97,6 +99,11 @@ public:
   // KXLI_RC_NAME_NOT_FOUND (*out untouched); KXLI_RC_NULL_ARGUMENT for null out.
   uint32_t Find(const char *name, InstallCopy **out);
 
+  // Gives every copy of the list without an instance list yet its list, from
+  // one walk of the instances. A copy whose list cannot be built is left
+  // without one.
+  void BuildInstanceLists();
+
   InstallCopy *v8Copy; // also the list's first element; not owned separately
   uint32_t view32;
   uint32_t view64;
@@ -105,4 +112,5 @@ public:
 private:
   bool addV8Copy();
   void addInstalledCopies();
+  uint32_t adopt(InstallCopy *copy);
 };

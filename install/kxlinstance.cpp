@@ -5,9 +5,11 @@
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
 
+#include <array>
 #include <cstdio>
 #include <cstring>
 #include <new>
+#include <vector>
 
 namespace {
 
@@ -115,19 +117,21 @@ uint32_t IKXLINSTANCE::ReloadDbmCfg(const char *dir) {
 // IKXLINSTANCELIST
 // ---------------------------------------------------------------------------
 
-IKXLINSTANCELIST::IKXLINSTANCELIST(InstallCopy *copy) : owner(copy), status(0) {
-  // Without an owner every instance of the version-8 installation would match
-  // the empty name.
-  char ownerName[KXLI_COPY_NAME_SZ] = {};
-  if (owner == nullptr || owner->GetName(ownerName, sizeof ownerName) != 0 || ownerName[0] == '\0') {
-    status = 1;
-    return;
-  }
+namespace {
+
+// The owner's name; false for an owner without one (every instance of the
+// version-8 installation would match the empty name).
+bool ownerName(InstallCopy *owner, char (&name)[KXLI_COPY_NAME_SZ]) {
+  name[0] = '\0';
+  return owner != nullptr && owner->GetName(name, sizeof name) == 0 && name[0] != '\0';
+}
+
+// Calls place(info) for each instance the platform lists; 0 when the walk
+// reached the end, else the first failure (of the walk or of place).
+template <class Place> uint32_t walkInstances(Place place) {
   OSSInstanceListHandle handle = nullptr;
-  if (ossOpenInstanceList("KXL", &handle, false, false) != 0) {
-    status = 1;
-    return;
-  }
+  if (ossOpenInstanceList("KXL", &handle, false, false) != 0)
+    return 1;
   // The record is large; it lives on the heap for the walk.
   OSSInstanceInfo_t *info = new (std::nothrow) OSSInstanceInfo_t;
   uint32_t rc = info != nullptr ? 0 : KXLI_RC_NO_MEMORY;
@@ -137,15 +141,62 @@ IKXLINSTANCELIST::IKXLINSTANCELIST(InstallCopy *copy) : owner(copy), status(0) {
     if (rc != 0)
       break;
     terminateFields(*info);
-    if (!belongsTo(*info, ownerName))
-      continue;
-    IKXLINSTANCE *instance = new (std::nothrow) IKXLINSTANCE(info->instanceName, owner, info->instanceDir);
-    rc = instance != nullptr ? Append(instance) : KXLI_RC_NO_MEMORY;
+    rc = place(*info);
   }
-  if (rc != OSS_RC_END_OF_LIST)
-    status = 1;
   delete info;
   ossCloseInstanceList(handle);
+  return rc == OSS_RC_END_OF_LIST ? 0 : rc;
+}
+
+uint32_t appendInstance(IKXLINSTANCELIST &list, const OSSInstanceInfo_t &info) {
+  IKXLINSTANCE *instance = new (std::nothrow) IKXLINSTANCE(info.instanceName, list.owner, info.instanceDir);
+  return instance != nullptr ? list.Append(instance) : KXLI_RC_NO_MEMORY;
+}
+
+} // namespace
+
+IKXLINSTANCELIST::IKXLINSTANCELIST(InstallCopy *copy, uint32_t initialStatus)
+    : owner(copy), status(initialStatus) {}
+
+IKXLINSTANCELIST::IKXLINSTANCELIST(InstallCopy *copy) : owner(copy), status(0) {
+  char name[KXLI_COPY_NAME_SZ];
+  if (!ownerName(owner, name)) {
+    status = 1;
+    return;
+  }
+  uint32_t rc = walkInstances([&](const OSSInstanceInfo_t &info) -> uint32_t {
+    return belongsTo(info, name) ? appendInstance(*this, info) : 0;
+  });
+  if (rc != 0)
+    status = 1;
+}
+
+uint32_t IKXLINSTANCELIST::BuildForCopies(InstallCopy *const *owners, uint32_t count,
+                                          IKXLINSTANCELIST **lists) {
+  std::vector<std::array<char, KXLI_COPY_NAME_SZ>> names(count);
+  uint32_t rc = 0;
+  for (uint32_t i = 0; i < count; ++i) {
+    char name[KXLI_COPY_NAME_SZ];
+    bool named = ownerName(owners[i], name);
+    std::memcpy(names[i].data(), name, sizeof name);
+    lists[i] = new (std::nothrow) IKXLINSTANCELIST(owners[i], named ? 0 : 1);
+    if (lists[i] == nullptr)
+      rc = KXLI_RC_NO_MEMORY;
+  }
+  if (rc == 0)
+    rc = walkInstances([&](const OSSInstanceInfo_t &info) -> uint32_t {
+      uint32_t placed = 0;
+      for (uint32_t i = 0; i < count && placed == 0; ++i)
+        if (lists[i]->status == 0 && belongsTo(info, names[i].data()))
+          placed = appendInstance(*lists[i], info);
+      return placed;
+    });
+  if (rc != 0)
+    for (uint32_t i = 0; i < count; ++i) {
+      delete lists[i];
+      lists[i] = nullptr;
+    }
+  return rc;
 }
 
 IKXLINSTANCELIST::~IKXLINSTANCELIST() = default;

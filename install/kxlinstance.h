@@ -63,9 +63,17 @@ public:
   explicit IKXLINSTANCELIST(InstallCopy *owner);
   virtual ~IKXLINSTANCELIST();
 
+  // The lists of `count` copies from one walk of the platform's instances
+  // (a walk per copy would read every instance once for each copy). 0 with
+  // lists[i] the new list of owners[i]; otherwise every lists[i] is null.
+  static uint32_t BuildForCopies(InstallCopy *const *owners, uint32_t count, IKXLINSTANCELIST **lists);
+
   // As InstallCopyList::Find, by instance name.
   uint32_t Find(const char *name, IKXLINSTANCE **out);
 
   InstallCopy *owner; // not owned
   uint32_t status;
+
+private:
+  IKXLINSTANCELIST(InstallCopy *owner, uint32_t initialStatus);
 };

@@ -12,6 +12,7 @@
 
 struct OSSInstanceList {
   std::vector<std::string> names;
+  std::vector<kxlprod::CopyInfo> copies; // read once for the whole walk
   size_t next = 0;
 };
 
@@ -24,7 +25,8 @@ std::string instancesKey() {
 }
 
 // Fills `info` from the instance's registry entry; false when it has none.
-bool readInstance(const std::string &name, OSSInstanceInfo_t &info) {
+// The copy's path comes from `copies`, read once by the caller.
+bool readInstance(const std::string &name, const std::vector<CopyInfo> &copies, OSSInstanceInfo_t &info) {
   std::string key = instancesKey() + "\\" + name;
   std::string directory;
   if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Directory", directory) != ERROR_SUCCESS)
@@ -38,10 +40,20 @@ bool readInstance(const std::string &name, OSSInstanceInfo_t &info) {
   kxlprod::copyBounded(name, info.instanceName, sizeof info.instanceName);
   kxlprod::copyBounded(directory, info.instanceDir, sizeof info.instanceDir);
   kxlprod::copyBounded(copyName, info.copyName, sizeof info.copyName);
-  CopyInfo copy;
-  if (kxlprod::findCopy(copyName.empty() ? kxlprod::kV8CopyName : copyName, copy))
-    kxlprod::copyBounded(copy.path, info.installPath, sizeof info.installPath);
+  const std::string owner = copyName.empty() ? kxlprod::kV8CopyName : copyName;
+  for (const CopyInfo &copy : copies) {
+    if (kxlprod::sameName(copy.name, owner)) {
+      kxlprod::copyBounded(copy.path, info.installPath, sizeof info.installPath);
+      break;
+    }
+  }
   return true;
+}
+
+bool readInstance(const std::string &name, OSSInstanceInfo_t &info) {
+  std::vector<CopyInfo> copies;
+  kxlprod::listCopies(copies);
+  return readInstance(name, copies, info);
 }
 
 // The instance's registry name as stored (case preserved), found ignoring case.
@@ -123,6 +135,7 @@ uint32_t ossOpenInstanceList(const char *product, OSSInstanceListHandle *handle,
     delete list;
     return OSS_RC_FAILED;
   }
+  kxlprod::listCopies(list->copies);
   *handle = list;
   return 0;
 }
@@ -134,7 +147,7 @@ uint32_t ossGetNextInstance(OSSInstanceListHandle handle, OSSInstanceInfo_t *inf
     return OSS_RC_NULL_ARGUMENT;
   // Entries removed since the list was opened are passed over.
   while (handle->next < handle->names.size()) {
-    if (readInstance(handle->names[handle->next++], *info))
+    if (readInstance(handle->names[handle->next++], handle->copies, *info))
       return 0;
   }
   std::memset(info, 0, sizeof *info);

@@ -77,6 +77,38 @@ TEST_F(Instances, ListFailsWhenTheInstanceRegistryFails) {
   EXPECT_EQ(1u, ownerless.status);
 }
 
+// The run walks the copies and asks each for its instance list: one walk of
+// the instance registry serves every copy (a second walk would fail here), and
+// the caller's walk of the copies goes on where it was.
+TEST_F(Instances, ListsOfEveryCopyComeFromOneWalkThatKeepsTheCallersPlace) {
+  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
+  registerInstance("NEW1", "C:\\Prog\\KXL101\\NEW1", "KXL101");
+  registerInstance("V8INST", "C:\\SQLLIB\\V8INST", "");
+  InstallCopyList copies(false, false);
+  failCalls("ossOpenInstanceList:2");
+  std::vector<Names> seen;
+  copies.Rewind();
+  for (InstallCopy *copy = copies.Next(); copy != nullptr; copy = copies.Next()) {
+    IKXLINSTANCELIST *list = nullptr;
+    ASSERT_EQ(0u, copy->GetInstanceList(&list));
+    seen.push_back(names(*list));
+  }
+  EXPECT_EQ(std::vector<Names>({{"V8INST"}, {"NEW1"}, {"INST1"}}), seen);
+}
+
+TEST_F(Instances, AFailedWalkKeepsNoListAndTheNextRequestWalksAgain) {
+  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
+  InstallCopyList copies(false, false);
+  InstallCopy *copy = nullptr;
+  ASSERT_EQ(0u, copies.Find("KXL95", &copy));
+  IKXLINSTANCELIST *list = nullptr;
+  failCalls("ossGetNextInstance:1,ossGetNextInstance:2");
+  EXPECT_EQ(KXLI_RC_NOT_USABLE, copy->GetInstanceList(&list));
+  failCalls("");
+  ASSERT_EQ(0u, copy->GetInstanceList(&list));
+  EXPECT_EQ(Names({"INST1"}), names(*list));
+}
+
 TEST_F(Instances, KnowTheirCopyAndParentDirectory) {
   registerInstance("INST1", "D:\\profiles\\INST1", "KXL95");
   IKXLINSTANCE *inst = instance("KXL95", "INST1");
