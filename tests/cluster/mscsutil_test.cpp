@@ -295,11 +295,13 @@ TEST_F(ClusterOps, CreatesResourcesInTheirOwnMonitor) {
 
 TEST_F(ClusterOps, AddsEachDependencyThatCanBeOpenedAndReportsFailedOnes) {
   EXPECT_EQ(util.AddResourceDependencies("C-inst", {}), 0);
-  EXPECT_EQ(util.AddResourceDependencies("C-inst", entries({"B-disk", "Gone", "A-inst"})), 0);
-  EXPECT_EQ(names(util.GetResourceDependencies("C-inst")), (std::vector<std::string>{"B-disk@", "A-inst@"}));
-  // B-disk already there and C-inst would close a cycle; A-inst -> D-case still goes in.
-  EXPECT_EQ(util.AddResourceDependencies("A-inst", entries({"C-inst", "D-case"})), -1);
-  EXPECT_EQ(names(util.GetResourceDependencies("A-inst")), (std::vector<std::string>{"D-case@"}));
+  EXPECT_EQ(util.AddResourceDependencies("C-inst", entries({"B-disk", "Gone", "D-case"})), 0);
+  EXPECT_EQ(names(util.GetResourceDependencies("C-inst")), (std::vector<std::string>{"B-disk@", "D-case@"}));
+  // C-inst would close a cycle; D-case -> B-disk still goes in.
+  EXPECT_EQ(util.AddResourceDependencies("D-case", entries({"C-inst", "B-disk"})), -1);
+  EXPECT_EQ(names(util.GetResourceDependencies("D-case")), (std::vector<std::string>{"B-disk@"}));
+  EXPECT_EQ(util.AddResourceDependencies("A-inst", entries({"B-disk"})), -1) << "B-disk is in another group";
+  EXPECT_TRUE(util.GetResourceDependencies("A-inst").empty());
   EXPECT_EQ(util.AddResourceDependencies("Missing", entries({"B-disk"})), -1);
   EXPECT_EQ(util.AddResourceDependencies("C-inst", util.GetResourceDependencies("C-inst")), -1)
       << "each already exists";

@@ -226,18 +226,57 @@ TEST_F(ClusterTest, ResourcesAreCreatedEnumeratedLinkedAndDeleted) {
   EXPECT_TRUE(api.typesEqual(u"kxl server", server));
   EXPECT_FALSE(api.typesEqual(u"KXL", server));
 
+  EXPECT_EQ(api.deleteResource(disk), static_cast<DWORD>(ERROR_DEPENDENT_RESOURCE_EXISTS));
+  EXPECT_EQ(api.dependencies(server), std::vector<std::u16string>{u"Disk1"});
+  EXPECT_EQ(api.deleteResource(server), 0u);
   EXPECT_EQ(api.deleteResource(disk), 0u);
-  EXPECT_TRUE(api.dependencies(server).empty()) << "a deleted resource leaves no dangling dependency";
   EXPECT_EQ(api.openResource(cluster, u"Disk1"), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_RESOURCE_NOT_FOUND));
-  HRESOURCE again = api.openResource(cluster, u"inst1");
-  ASSERT_NE(again, nullptr);
-  EXPECT_TRUE(api.closeResource(again));
+  EXPECT_EQ(api.openResource(cluster, u"inst1"), nullptr);
   EXPECT_TRUE(api.closeResource(disk));
   EXPECT_TRUE(api.closeResource(server));
   EXPECT_FALSE(api.closeResource(server));
   EXPECT_TRUE(api.closeGroup(group));
   EXPECT_TRUE(api.closeCluster(cluster));
+}
+
+// The rules by which the cluster refuses a change: an online resource cannot
+// be deleted, dependencies stay within a group, and a resource named like a
+// service of the node owning its group is online exactly while it runs.
+TEST_F(ClusterTest, OnlineResourcesStayAndDependenciesStayInTheirGroup) {
+  const std::string services = "SOFTWARE\\ZAV\\KXLSIM\\Services\\";
+  const std::string remoteServices = "SOFTWARE\\ZAV\\KXLSIM\\Machines\\NODE2\\" + services;
+  setMachineDword((services + "INST1").c_str(), "State", 4);
+  setMachineDword((remoteServices + "INST2").c_str(), "State", 1);
+  setMachineString("SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\G2", "OwnerNode", "NODE2");
+  HCLUSTER cluster = api.openCluster(nullptr);
+  ASSERT_NE(cluster, nullptr);
+  api.createType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
+  HGROUP g1 = api.openGroup(cluster, u"G1");
+  HGROUP g2 = api.openGroup(cluster, u"G2");
+  HRESOURCE inst1 = api.createResource(g1, u"INST1", u"KXL", 0);
+  HRESOURCE inst2 = api.createResource(g2, u"INST2", u"KXL", 0);
+  HRESOURCE disk = api.createResource(g1, u"Disk1", u"KXL", 0);
+  ASSERT_TRUE(inst1 != nullptr && inst2 != nullptr && disk != nullptr);
+  WCHAR group[65];
+  DWORD size = 65;
+  EXPECT_EQ(api.resourceState(inst1, nullptr, nullptr, group, &size), ClusterResourceOnline);
+  size = 65;
+  EXPECT_EQ(api.resourceState(inst2, nullptr, nullptr, group, &size), ClusterResourceOffline);
+
+  EXPECT_EQ(api.addDependency(inst2, disk), static_cast<DWORD>(ERROR_INVALID_PARAMETER));
+  EXPECT_TRUE(api.dependencies(inst2).empty());
+  EXPECT_EQ(api.deleteResource(inst1), static_cast<DWORD>(ERROR_RESOURCE_ONLINE));
+  setMachineDword((services + "INST1").c_str(), "State", 1);
+  EXPECT_EQ(api.deleteResource(inst1), 0u);
+  setMachineDword((remoteServices + "INST2").c_str(), "State", 4);
+  EXPECT_EQ(api.deleteResource(inst2), static_cast<DWORD>(ERROR_RESOURCE_ONLINE))
+      << "the service of the owning node counts";
+  for (HRESOURCE resource : {inst1, inst2, disk})
+    api.closeResource(resource);
+  api.closeGroup(g1);
+  api.closeGroup(g2);
+  api.closeCluster(cluster);
 }
 
 TEST_F(ClusterTest, EnumerationReportsLengthsAndEndsWithNoMoreItems) {

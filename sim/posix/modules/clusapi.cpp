@@ -33,37 +33,6 @@ template <typename Handle, typename Object> Handle handleFor(std::unique_ptr<Obj
   return static_cast<Handle>(registerHandle(std::move(object)));
 }
 
-std::string localComputerName() {
-  char name[256];
-  DWORD size = sizeof name;
-  return GetComputerNameA(name, &size) ? std::string(name, size) : std::string();
-}
-
-std::string clusterKeyOfMachine(const std::string &computer) {
-  return "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + computer + "\\" + kClusterKey;
-}
-
-// The state of the cluster service on the node whose cluster key is `key`.
-DWORD nodeStateAt(const std::string &key) {
-  DWORD state = ClusterStateNotInstalled;
-  if (!reg::keyExists(HKEY_LOCAL_MACHINE, key))
-    return ClusterStateNotInstalled;
-  return reg::readDword(HKEY_LOCAL_MACHINE, key, "NodeState", state) ? state : DWORD{ClusterStateNotRunning};
-}
-
-std::vector<std::string> nodeNames() {
-  std::vector<std::string> nodes = reg::subkeys(HKEY_LOCAL_MACHINE, kNodesKey);
-  if (nodes.empty())
-    nodes.push_back(localComputerName());
-  return nodes;
-}
-
-std::string resourceField(const std::string &resource, const char *field) {
-  std::string value;
-  reg::readString(HKEY_LOCAL_MACHINE, resourceKey(resource), field, value);
-  return value;
-}
-
 std::vector<std::string> dependenciesOf(const std::string &resource) {
   std::vector<std::string> names;
   reg::readMultiString(HKEY_LOCAL_MACHINE, resourceKey(resource), "DependsOn", names);
@@ -187,22 +156,26 @@ GroupObject *liveGroup(HGROUP handle) {
   return group;
 }
 
-std::string groupKey(const std::string &group) {
-  return std::string(kGroupsKey) + "\\" + group;
+// Offline and failed are the states in which the cluster lets a resource go.
+bool isOffline(DWORD state) {
+  return state == ClusterResourceOffline || state == ClusterResourceFailed;
 }
 
-std::string groupOwner(const std::string &group) {
-  std::string owner;
-  if (!reg::readString(HKEY_LOCAL_MACHINE, groupKey(group), "OwnerNode", owner) || owner.empty())
-    owner = localComputerName();
-  return owner;
+// Records a resource's new state; a service-backed resource starts or stops
+// its service on the owning node.
+void storeResourceState(const std::string &resource, DWORD state) {
+  reg::writeDword(HKEY_LOCAL_MACHINE, resourceKey(resource), "State", state);
+  std::string service;
+  if (resourceServiceKey(resource, service))
+    reg::writeDword(HKEY_LOCAL_MACHINE, service, "State",
+                    state == ClusterResourceOnline ? kServiceRunning : kServiceStopped);
 }
 
 // Sets the state of a group and of every resource in it.
 void setGroupState(const std::string &group, DWORD groupState, DWORD resourceState) {
   reg::writeDword(HKEY_LOCAL_MACHINE, groupKey(group), "State", groupState);
   for (const std::string &resource : resourcesOfField("Group", group))
-    reg::writeDword(HKEY_LOCAL_MACHINE, resourceKey(resource), "State", resourceState);
+    storeResourceState(resource, resourceState);
 }
 
 // Brings a resource online after what it depends on, or offline after what
@@ -215,7 +188,7 @@ void setResourceState(const std::string &resource, DWORD state, std::set<std::st
   for (const std::string &other : related)
     if (reg::keyExists(HKEY_LOCAL_MACHINE, resourceKey(other)))
       setResourceState(other, state, done);
-  reg::writeDword(HKEY_LOCAL_MACHINE, resourceKey(resource), "State", state);
+  storeResourceState(resource, state);
 }
 
 DWORD changeResourceState(HRESOURCE handle, DWORD state) {
@@ -468,6 +441,9 @@ DWORD WINAPI AddClusterResourceDependency(HRESOURCE hResource, HRESOURCE hDepend
   ResourceObject *provider = resource == nullptr ? nullptr : liveResource(hDependsOn);
   if (provider == nullptr)
     return GetLastError();
+  // Only resources of one group can depend on each other.
+  if (!equalsIgnoringCase(resourceField(resource->name, "Group"), resourceField(provider->name, "Group")))
+    return ERROR_INVALID_PARAMETER;
   std::vector<std::string> dependencies = dependenciesOf(resource->name);
   if (listsName(dependencies, provider->name))
     return ERROR_DEPENDENCY_ALREADY_EXISTS;
@@ -504,21 +480,17 @@ DWORD WINAPI OfflineClusterResource(HRESOURCE hResource) {
   return changeResourceState(hResource, ClusterResourceOffline);
 }
 
-// The resource goes whatever its state; resources that depended on it lose
-// that dependency rather than point at nothing.
+// Only an offline resource that nothing depends on can be deleted.
 DWORD WINAPI DeleteClusterResource(HRESOURCE hResource) {
   if (kxlsim::shouldFail("DeleteClusterResource"))
     return ERROR_RESOURCE_NOT_FOUND;
   ResourceObject *resource = liveResource(hResource);
   if (resource == nullptr)
     return GetLastError();
-  for (const std::string &dependent : dependentsOf(resource->name)) {
-    std::vector<std::string> kept = dependenciesOf(dependent);
-    kept.erase(std::remove_if(kept.begin(), kept.end(),
-                              [&](const std::string &n) { return equalsIgnoringCase(n, resource->name); }),
-               kept.end());
-    reg::writeMultiString(HKEY_LOCAL_MACHINE, resourceKey(dependent), "DependsOn", kept);
-  }
+  if (!isOffline(resourceState(resource->name)))
+    return ERROR_RESOURCE_ONLINE;
+  if (!dependentsOf(resource->name).empty())
+    return ERROR_DEPENDENT_RESOURCE_EXISTS;
   LONG rc = reg::deleteTree(HKEY_LOCAL_MACHINE, resourceKey(resource->name));
   return static_cast<DWORD>(rc);
 }
@@ -568,9 +540,7 @@ CLUSTER_RESOURCE_STATE WINAPI GetClusterResourceState(HRESOURCE hResource, LPWST
   DWORD groupRc = copyName(group, lpszGroupName, lpcchGroupName);
   if (rc != ERROR_SUCCESS || groupRc != ERROR_SUCCESS)
     return failWith(rc != ERROR_SUCCESS ? rc : groupRc, ClusterResourceStateUnknown);
-  DWORD state = ClusterResourceOffline;
-  reg::readDword(HKEY_LOCAL_MACHINE, resourceKey(resource->name), "State", state);
-  return static_cast<CLUSTER_RESOURCE_STATE>(state);
+  return static_cast<CLUSTER_RESOURCE_STATE>(resourceState(resource->name));
 }
 
 DWORD WINAPI DeleteClusterResourceType(HCLUSTER hCluster, LPCWSTR lpszResourceTypeName) {

@@ -47,4 +47,79 @@ ResourceObject *liveResource(HRESOURCE handle) {
   return resource;
 }
 
+std::string localComputerName() {
+  char name[256];
+  DWORD size = sizeof name;
+  return GetComputerNameA(name, &size) ? std::string(name, size) : std::string();
+}
+
+std::string clusterKeyOfMachine(const std::string &computer) {
+  return "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + computer + "\\" + kClusterKey;
+}
+
+// The state of the cluster service on the node whose cluster key is `key`.
+DWORD nodeStateAt(const std::string &key) {
+  DWORD state = ClusterStateNotInstalled;
+  if (!reg::keyExists(HKEY_LOCAL_MACHINE, key))
+    return ClusterStateNotInstalled;
+  return reg::readDword(HKEY_LOCAL_MACHINE, key, "NodeState", state) ? state : DWORD{ClusterStateNotRunning};
+}
+
+std::vector<std::string> nodeNames() {
+  std::vector<std::string> nodes = reg::subkeys(HKEY_LOCAL_MACHINE, kNodesKey);
+  if (nodes.empty())
+    nodes.push_back(localComputerName());
+  return nodes;
+}
+
+std::string resourceField(const std::string &resource, const char *field) {
+  std::string value;
+  reg::readString(HKEY_LOCAL_MACHINE, resourceKey(resource), field, value);
+  return value;
+}
+
+std::string groupKey(const std::string &group) {
+  return std::string(kGroupsKey) + "\\" + group;
+}
+
+std::string groupOwner(const std::string &group) {
+  std::string owner;
+  if (!reg::readString(HKEY_LOCAL_MACHINE, groupKey(group), "OwnerNode", owner) || owner.empty())
+    owner = localComputerName();
+  return owner;
+}
+
+// The key of the service that a resource of the same name runs as on the
+// node owning its group; false when that node has no such service.
+bool resourceServiceKey(const std::string &resource, std::string &key) {
+  std::string owner = groupOwner(resourceField(resource, "Group"));
+  std::string services = equalsIgnoringCase(owner, localComputerName())
+                             ? std::string(kServicesKey)
+                             : "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + owner + "\\" + kServicesKey;
+  std::string stored;
+  if (!findObject(services.c_str(), resource, stored))
+    return false;
+  key = services + "\\" + stored;
+  return true;
+}
+
+// A resource backed by a service is online exactly while that service runs
+// on the owning node; any other resource keeps the state it was last given.
+DWORD resourceState(const std::string &resource) {
+  std::string service;
+  DWORD state = ClusterResourceOffline;
+  if (resourceServiceKey(resource, service)) {
+    DWORD serviceState = kServiceStopped;
+    reg::readDword(HKEY_LOCAL_MACHINE, service, "State", serviceState);
+    return serviceState == kServiceRunning ? DWORD{ClusterResourceOnline} : DWORD{ClusterResourceOffline};
+  }
+  reg::readDword(HKEY_LOCAL_MACHINE, resourceKey(resource), "State", state);
+  return state;
+}
+
+DWORD nodeStateOf(const std::string &computer) {
+  return equalsIgnoringCase(computer, localComputerName()) ? nodeStateAt(kClusterKey)
+                                                           : nodeStateAt(clusterKeyOfMachine(computer));
+}
+
 } // namespace kxlsim::posix::cluster

@@ -14,9 +14,6 @@ using namespace kxlsim::posix::cluster;
 
 namespace {
 
-constexpr const char *kServicesKey = "SOFTWARE\\ZAV\\KXLSIM\\Services";
-constexpr DWORD kServiceStopped = 1;
-constexpr DWORD kServiceRunning = 4;
 constexpr DWORD kServiceDisabled = 4;
 constexpr DWORD kErrorServiceDisabled = 1058;
 
