@@ -203,4 +203,45 @@ void setToolExitCode(WorldWriter &w, const std::string &program, DWORD exitCode)
   w.setDword(localMachine(), std::string(kSimRoot) + "\\Tools\\" + program, "ExitCode", exitCode);
 }
 
+namespace {
+
+const std::string kClusterKey = std::string(kSimRoot) + "\\Cluster";
+
+} // namespace
+
+void addClusterNode(WorldWriter &w, const std::string &computer, bool local, DWORD nodeState) {
+  w.setDword(local ? localMachine() : remoteMachine(computer), kClusterKey, "NodeState", nodeState);
+  w.createKey(localMachine(), kClusterKey + "\\Nodes\\" + computer);
+}
+
+void addClusterResourceType(WorldWriter &w, const std::string &type, const std::string &dllName) {
+  std::string key = kClusterKey + "\\ResourceTypes\\" + type;
+  w.setString(localMachine(), key, "DisplayName", type);
+  w.setString(localMachine(), key, "DllName", dllName);
+  w.setDword(localMachine(), key, "LooksAlivePollInterval", 5000);
+  w.setDword(localMachine(), key, "IsAlivePollInterval", 60000);
+}
+
+void addClusterGroup(WorldWriter &w, const std::string &group, const std::string &ownerNode, DWORD state) {
+  std::string key = kClusterKey + "\\Groups\\" + group;
+  w.setString(localMachine(), key, "OwnerNode", ownerNode);
+  w.setDword(localMachine(), key, "State", state);
+}
+
+void addClusterResource(WorldWriter &w, const ClusterResourceSpec &resource) {
+  std::string key = kClusterKey + "\\Resources\\" + resource.name;
+  w.setString(localMachine(), key, "Type", resource.type);
+  w.setString(localMachine(), key, "Group", resource.group);
+  w.setMultiString(localMachine(), key, "DependsOn", resource.dependsOn);
+  w.setDword(localMachine(), key, "State", resource.state);
+  w.setDword(localMachine(), key, "SeparateMonitor", 0);
+}
+
+void addClusterProfile(WorldWriter &w, const RegTarget &machine, const std::string &instance,
+                       const std::string &machineList, const std::string &profilePath) {
+  std::string key = "Cluster\\ZAV\\KXL\\PROFILES\\" + instance;
+  w.setString(machine, key, "KXLCLUSTERLIST", machineList);
+  w.setString(machine, key, "KXLINSTPROF", profilePath);
+}
+
 } // namespace kxlsim

@@ -74,6 +74,17 @@ struct IdentitySpec {
   DWORD contentExtender = 0;
 };
 
+// The cluster database: kept in the local machine's registry, where the
+// simulated cluster modules read it; another node's subtree holds only the
+// state of its cluster service.
+struct ClusterResourceSpec {
+  std::string name;
+  std::string type;
+  std::string group;
+  std::vector<std::string> dependsOn;
+  DWORD state = 3; // 2 online, 3 offline; a resource named like a service follows that service
+};
+
 inline constexpr const char *kProductRoot = "SOFTWARE\\ZAV\\KXL";
 inline constexpr const char *kSimRoot = "SOFTWARE\\ZAV\\KXLSIM";
 
@@ -104,5 +115,15 @@ void addOdbcDataSource(WorldWriter &w, const RegTarget &hive, const std::string 
 // A loadable run-time module in the system folder ("odbc32.dll", ...).
 void addRuntimeModule(WorldWriter &w, const std::string &moduleName);
 void setToolExitCode(WorldWriter &w, const std::string &program, DWORD exitCode);
+
+// A node of the cluster, the local machine or another, with the state of its
+// cluster service (19 running, 3 stopped).
+void addClusterNode(WorldWriter &w, const std::string &computer, bool local, DWORD nodeState);
+void addClusterResourceType(WorldWriter &w, const std::string &type, const std::string &dllName);
+void addClusterGroup(WorldWriter &w, const std::string &group, const std::string &ownerNode, DWORD state);
+void addClusterResource(WorldWriter &w, const ClusterResourceSpec &resource);
+// The instance's cluster profile on one machine: its machine list and profile path.
+void addClusterProfile(WorldWriter &w, const RegTarget &machine, const std::string &instance,
+                       const std::string &machineList, const std::string &profilePath);
 
 } // namespace kxlsim

@@ -132,27 +132,125 @@ void addPartitionedInstance(WorldWriter &w, const CopySpec &copy) {
   w.writeText(copy.path + "\\function\\kxludf.dll", "MZ user functions of the KXL95 instances\r\n");
 }
 
+constexpr const char *kClusterName = "KXLCLUS";
+constexpr DWORD kNodeRunning = 19;
+constexpr DWORD kResourceOnline = 2;
+constexpr DWORD kGroupPartlyOnline = 3;
+
+// The two machines and the copies both of them have.
+void addTwoMachines(WorldWriter &w, const InstallSources &sources, const CopySpec &old,
+                    const CopySpec &current) {
+  addMachineBase(w);
+  addMachine(w, remoteIdentity());
+  addHost(w, "winsrv2", kRemoteHost, kRemoteComputer);
+  addHost(w, kRemoteHost, kRemoteHost, kRemoteComputer);
+  addCopy(w, old, sources);
+  addCopy(w, current, sources);
+  addCopyRegistration(w, remoteMachine(kRemoteComputer), old);
+  addCopyRegistration(w, remoteMachine(kRemoteComputer), current);
+  w.setString(localMachine(), std::string(kSimRoot) + "\\AdminServer", "Name", "KXLDAS00");
+}
+
+// A clustered instance's profile and cluster profile on both nodes, and one
+// stopped service per partition on each node (the cluster starts them).
+void addClusteredInstance(WorldWriter &w, const CopySpec &copy, InstanceSpec inst,
+                          const std::vector<std::string> &services) {
+  std::string profilePath = windowsParent(inst.directory);
+  inst.profile.insert(inst.profile.begin(), {"KXLCLUSTER", kClusterName});
+  inst.machines = {kRemoteComputer};
+  addInstance(w, inst);
+  std::string machineList = std::string(kLocalComputer) + " " + kRemoteComputer;
+  addClusterProfile(w, localMachine(), inst.name, machineList, profilePath);
+  addClusterProfile(w, remoteMachine(kRemoteComputer), inst.name, machineList, profilePath);
+  w.writeText(profilePath + "\\function\\kxludf.dll", "MZ user functions of " + inst.name + "\r\n");
+  for (const char *machine : {"", kRemoteComputer})
+    for (const std::string &service : services)
+      addService(w, {machine, service, serviceImage(copy), "KXL - " + copy.name + " - " + service,
+                     ".\\kxlsvc", 3, 1});
+}
+
+// CINST1, single partition, on the shared disk E: in its own group.
+void addClusteredSingleInstance(WorldWriter &w, const CopySpec &copy) {
+  InstanceSpec inst;
+  inst.name = "CINST1";
+  inst.copy = copy.name;
+  inst.directory = "E:\\KXLPROF\\CINST1";
+  inst.version = copy.version;
+  inst.release = copy.release;
+  addClusteredInstance(w, copy, inst, {"CINST1"});
+  addClusterGroup(w, "CINST1 Group", kLocalComputer, kGroupPartlyOnline);
+  addClusterResource(w, {"Disk E:", "Physical Disk", "CINST1 Group", {}, kResourceOnline});
+  addClusterResource(w, {"Disk H:", "Physical Disk", "CINST1 Group", {}, kResourceOnline});
+  addClusterResource(w, {"CINST1", "KXL", "CINST1 Group", {"Disk E:", "Disk H:"}});
+}
+
+// CINST2, partitions 0 on this node, 1 and 2 (logical port 1) on the other,
+// on the shared disk F:; a group per node, partition 2 served by a resource
+// of another type.
+void addClusteredPartitionedInstance(WorldWriter &w, const CopySpec &copy) {
+  InstanceSpec inst;
+  inst.name = "CINST2";
+  inst.copy = copy.name;
+  inst.directory = "F:\\KXLPROF\\CINST2";
+  inst.nodeType = 4;
+  inst.version = copy.version;
+  inst.release = copy.release;
+  inst.profile = {{"KXLPORTRANGE", "60010:60013"}, {"KXLNODECOMPUTER", kLocalComputer}};
+  inst.nodesFile = std::string("0 ") + kLocalHost + " " + kLocalComputer + " 0 \r\n" + "1 " + kRemoteHost +
+                   " " + kRemoteComputer + " 0 \r\n" + "2 " + kRemoteHost + " " + kRemoteComputer + " 1 \r\n";
+  addClusteredInstance(w, copy, inst, {"CINST2-0", "CINST2-1", "CINST2-2"});
+  addClusterGroup(w, "CINST2 Group 0", kLocalComputer, kGroupPartlyOnline);
+  addClusterGroup(w, "CINST2 Group 1", kRemoteComputer, kGroupPartlyOnline);
+  addClusterResource(w, {"Disk F:", "Physical Disk", "CINST2 Group 0", {}, kResourceOnline});
+  addClusterResource(w, {"CINST2-0", "KXL", "CINST2 Group 0", {"Disk F:"}});
+  addClusterResource(w, {"Disk G:", "Physical Disk", "CINST2 Group 1", {}, kResourceOnline});
+  addClusterResource(w, {"CINST2 IP", "IP Address", "CINST2 Group 1", {}, kResourceOnline});
+  addClusterResource(w, {"CINST2-1", "KXL", "CINST2 Group 1", {"Disk G:", "CINST2 IP"}});
+  addClusterResource(w, {"CINST2-2", "Generic Service", "CINST2 Group 1", {"Disk G:"}});
+}
+
+// Both nodes running the cluster service, the resource types, and the
+// resources of an instance that no copy here owns.
+void addCluster(WorldWriter &w) {
+  w.setString(localMachine(), std::string(kSimRoot) + "\\Cluster", "ClusterName", kClusterName);
+  addClusterNode(w, kLocalComputer, true, kNodeRunning);
+  addClusterNode(w, kRemoteComputer, false, kNodeRunning);
+  for (char drive : {'E', 'F', 'G', 'H', 'K'})
+    w.addDrive(drive);
+  addClusterResourceType(w, "Physical Disk", "clusres.dll");
+  addClusterResourceType(w, "IP Address", "clusres.dll");
+  addClusterResourceType(w, "Generic Service", "clusres.dll");
+  addClusterResourceType(w, "KXL", "kxlclres.dll");
+  addClusterGroup(w, "CINST3 Group", kRemoteComputer, kGroupPartlyOnline);
+  addClusterResource(w, {"Disk K:", "Physical Disk", "CINST3 Group", {}, kResourceOnline});
+  addClusterResource(w, {"CINST3", "KXL", "CINST3 Group", {"Disk K:"}});
+  addClusterResource(w, {"CINST3-0", "KXL", "CINST3 Group", {"Disk K:"}});
+  for (const char *module : {"clusapi.dll", "resutils.dll", "odbc32.dll"})
+    addRuntimeModule(w, module);
+}
+
+void buildCluster(WorldWriter &w, const InstallSources &sources) {
+  CopySpec old = copy95(), current = copy101();
+  addTwoMachines(w, sources, old, current);
+  addCluster(w);
+  addClusteredSingleInstance(w, old);
+  addClusteredPartitionedInstance(w, old);
+  addServicesFile(
+      w, {"KXL_CINST1         50020/tcp", "KXL_CINST2         60010/tcp", "KXL_CINST2_END     60013/tcp"});
+}
+
 void buildEmpty(WorldWriter &w, const InstallSources &) {
   addMachineBase(w);
 }
 
 void buildDemo(WorldWriter &w, const InstallSources &sources) {
-  addMachineBase(w);
-  addMachine(w, remoteIdentity());
-  addHost(w, "winsrv2", kRemoteHost, kRemoteComputer);
-  addHost(w, kRemoteHost, kRemoteHost, kRemoteComputer);
-
   CopySpec v8 = version8Copy(), old = copy95(), current = copy101();
+  addTwoMachines(w, sources, old, current);
   addCopy(w, v8, sources);
-  addCopy(w, old, sources);
-  addCopy(w, current, sources);
-  addCopyRegistration(w, remoteMachine(kRemoteComputer), old);
-  addCopyRegistration(w, remoteMachine(kRemoteComputer), current);
 
   addVersion8Instance(w, v8);
   addSinglePartitionInstance(w, old);
   addPartitionedInstance(w, old);
-  w.setString(localMachine(), std::string(kSimRoot) + "\\AdminServer", "Name", "KXLDAS00");
   addServicesFile(w, {"KXL_V8INST         50010/tcp", "KXL_INST1          50000/tcp",
                       "KXL_INST2          60000/tcp", "KXL_INST2_END      60003/tcp"});
   addRuntimeModule(w, "odbc32.dll");
@@ -175,6 +273,10 @@ const std::vector<Scenario> &scenarios() {
        "a version-8 installation with one instance; copy KXL95 (9.5) with INST1 and the partitioned INST2 "
        "over two machines; the current copy KXL101 (10.1) with the command",
        buildDemo},
+      {"cluster",
+       "a two-node cluster (WINSRV1, WINSRV2) with copies KXL95 and KXL101; the clustered CINST1 and the "
+       "clustered, partitioned CINST2 owned by KXL95, their \"KXL\" resources, and another instance's",
+       buildCluster},
   };
   return table;
 }

@@ -3,7 +3,10 @@
 #include "sim/kxlsim/dbmcfg_image.h"
 #include "sim/kxlsim/scenario_parts.h"
 #include "sim/kxlsim/world_reader.h"
+#include "sim/posix/modules/cluster.h"
+#include "sim/posix/reghelp.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <string>
 
@@ -14,8 +17,10 @@ namespace {
 void row(std::ostream &out, const char *format, const std::string &a, const std::string &b,
          const std::string &c, const std::string &d) {
   char line[1200];
-  std::snprintf(line, sizeof line, format, a.c_str(), b.c_str(), c.c_str(), d.c_str());
-  out << line << '\n';
+  int length = std::snprintf(line, sizeof line, format, a.c_str(), b.c_str(), c.c_str(), d.c_str());
+  std::string text(line, length < 0 ? 0 : std::min<size_t>(size_t(length), sizeof line - 1));
+  text.erase(text.find_last_not_of(' ') + 1);
+  out << text << '\n';
 }
 
 std::string versionText(const std::string &copyKey) {
@@ -89,6 +94,63 @@ void showMachines(std::ostream &out) {
         "");
 }
 
+struct StateName {
+  DWORD state;
+  const char *name;
+};
+
+template <size_t N> std::string stateText(DWORD state, const StateName (&names)[N]) {
+  for (const StateName &entry : names)
+    if (entry.state == state)
+      return entry.name;
+  return "state " + std::to_string(state);
+}
+
+constexpr StateName kNodeStates[] = {{ClusterStateRunning, "running"},
+                                     {ClusterStateNotRunning, "stopped"},
+                                     {ClusterStateNotInstalled, "not installed"}};
+constexpr StateName kResourceStates[] = {{DWORD(ClusterResourceOnline), "online"},
+                                         {DWORD(ClusterResourceOffline), "offline"},
+                                         {DWORD(ClusterResourceFailed), "failed"}};
+
+std::string joined(const std::vector<std::string> &items) {
+  std::string text;
+  for (const std::string &item : items)
+    text += (text.empty() ? "" : ", ") + item;
+  return text;
+}
+
+void showResourcesOfGroup(std::ostream &out, const std::string &group) {
+  namespace cl = kxlsim::posix::cluster;
+  for (const std::string &name : subkeys(localMachine(), cl::kResourcesKey)) {
+    if (cl::resourceField(name, "Group") != group)
+      continue;
+    std::vector<std::string> dependsOn;
+    kxlsim::posix::reg::readMultiString(HKEY_LOCAL_MACHINE, cl::resourceKey(name), "DependsOn", dependsOn);
+    std::string depends = dependsOn.empty() ? "" : "depends on " + joined(dependsOn);
+    row(out, "    %-14s %-16s %-8s %s", name, cl::resourceField(name, "Type"),
+        stateText(cl::resourceState(name), kResourceStates), depends);
+  }
+}
+
+// Nodes, resource types, and the groups with their resources, as the
+// simulated cluster modules report them.
+void showCluster(std::ostream &out) {
+  namespace cl = kxlsim::posix::cluster;
+  if (!keyExists(localMachine(), cl::kClusterKey))
+    return;
+  out << "Cluster " << stringValue(localMachine(), cl::kClusterKey, "ClusterName") << ":\n";
+  for (const std::string &node : cl::nodeNames())
+    row(out, "  node  %-12s %s%s%s", node, stateText(cl::nodeStateOf(node), kNodeStates), "", "");
+  for (const std::string &type : subkeys(localMachine(), cl::kTypesKey))
+    row(out, "  type  %-16s %s%s%s", type,
+        stringValue(localMachine(), std::string(cl::kTypesKey) + "\\" + type, "DllName"), "", "");
+  for (const std::string &group : subkeys(localMachine(), cl::kGroupsKey)) {
+    row(out, "  group %-16s owner %s%s%s", group, cl::groupOwner(group), "", "");
+    showResourcesOfGroup(out, group);
+  }
+}
+
 } // namespace
 
 void showWorld(std::ostream &out) {
@@ -96,6 +158,7 @@ void showWorld(std::ostream &out) {
   showInstances(out);
   showServices(out);
   showMachines(out);
+  showCluster(out);
 }
 
 } // namespace kxlsim

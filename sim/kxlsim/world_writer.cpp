@@ -5,6 +5,7 @@
 
 #include <sys/stat.h>
 
+#include <cctype>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
@@ -64,6 +65,15 @@ bool initWorld(const std::string &hostDir, std::string &error) {
     return false;
   }
   return selectWorld(hostDir, error);
+}
+
+void WorldWriter::addDrive(char letter) {
+  std::error_code ec;
+  std::string folder =
+      std::string("drive_") + static_cast<char>(std::tolower(static_cast<unsigned char>(letter)));
+  fs::create_directories(fs::path(kxlsim::posix::worldRoot()) / folder, ec);
+  if (ec)
+    note("cannot create drive " + std::string(1, letter) + ": " + ec.message());
 }
 
 std::string windowsParent(const std::string &windowsPath) {

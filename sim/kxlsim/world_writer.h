@@ -41,6 +41,8 @@ public:
   void setMultiString(const RegTarget &target, const std::string &key, const std::string &name,
                       const std::vector<std::string> &items);
 
+  // Makes drive `letter` (a disk of the machine, or a shared cluster disk) exist.
+  void addDrive(char letter);
   // Creates a Windows directory and its missing parents.
   void makeDirectory(const std::string &windowsPath);
   // Writes a file (parents created), replacing an existing one.
