@@ -8,13 +8,19 @@
 
 class UpgradeContext;
 
-inline constexpr uint32_t KXL_FN_UPGRADE_CLUSTER_INSTANCE = 0x18780560u;
+inline constexpr uint32_t KXL_FN_UPGRADE_CLUSTER_INSTANCE = 0x18780509u;
+inline constexpr uint32_t KXL_FN_IS_INSTANCE_RESOURCE = 0x1878050Au;
 
-// Result of this build's cluster step: clustered instances are not upgraded.
-inline constexpr int32_t CLUSTER_RC_NOT_SUPPORTED = -1;
+// Results of the step (each the negative number of its message).
+inline constexpr int32_t CLUSTER_RC_NO_API = -1251;        // a module or entry point is missing
+inline constexpr int32_t CLUSTER_RC_NOT_CONVERTED = -1252; // type, name, or a resource put back whole
+inline constexpr int32_t CLUSTER_RC_NOT_RECREATED = -1253; // a resource gone or without its dependencies
+inline constexpr int32_t CLUSTER_RC_NOT_DELETED = -1254;   // a resource could not be deleted; unchanged
 
-// Moves the context's instance's cluster resources to the resource type of
-// server type `toServerType` (1: the current copy's). 0 on success.
-// This build refuses: it writes one line on standard error and returns
-// CLUSTER_RC_NOT_SUPPORTED. Only clustered instances reach the step.
+// Registers the resource type "KXL Server" and re-creates each of the
+// instance's resources of the other server type ("KXL" when `toServerType` is
+// 1, the other way round when it is 0) under the new type, with its name, its
+// group and its dependencies. Resources converted before a failure stay
+// converted; the resource in hand is put back under its old type. 0 on
+// success; prints nothing.
 int32_t upgradeClusterInstance(UpgradeContext &context, int32_t toServerType, UpgradeOptions &options);

@@ -158,15 +158,17 @@ void decideProfilePath(const IKXLINSTANCE *instance, UpgradeOptions &options) {
   char parent[SQLO_PATH_SZ] = {}, oldPath[SQLO_PATH_SZ] = {};
   instance->GetInstanceParentDir(parent, sizeof parent);
   expandLongPath(parent, oldPath, sizeof oldPath);
-  if (options.profilePath[0] != '\0') {
+  if (instance->isClustered) {
+    // Every node's cluster profile names the instance's path on the shared
+    // disk and is written back unchanged: the instance stays there, -p or not.
+    copyText(options.profilePath, sizeof options.profilePath, oldPath);
+  } else if (options.profilePath[0] != '\0') {
     dropTrailingBackslash(options.profilePath);
     dropTrailingBackslash(oldPath);
-  } else if (!instance->isClustered) {
+  } else {
     bool networkShare = parent[0] == '\\' && parent[1] == '\\';
     copyText(options.profilePath, sizeof options.profilePath,
              networkShare ? parent : options.currentInstallPath);
-  } else {
-    copyText(options.profilePath, sizeof options.profilePath, oldPath);
   }
   if (!sameText(oldPath, options.profilePath, SQLO_PATH_SZ))
     options.flags |= UPGRADE_FLAG_PROFILE_PATH_MOVES;

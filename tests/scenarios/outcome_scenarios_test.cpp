@@ -64,10 +64,13 @@ TEST_F(OutcomeScenario, ProfilePathRules) {
   // A clustered instance keeps its path.
   world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1", "KXLCLUSTER",
                   "KXLCLUS");
-  RunResult clustered = run({"INST1"});
-  EXPECT_TRUE(has(handedOver(clustered), "flags", "0x0001")) << handedOver(clustered);
-  EXPECT_TRUE(has(handedOver(clustered), "profile", "C:\\\\Program Files\\\\ZAV\\\\KXL95"))
-      << handedOver(clustered);
+  for (const std::vector<std::string> &args :
+       {std::vector<std::string>{"INST1"}, std::vector<std::string>{"-p", "C:\\profiles", "INST1"}}) {
+    RunResult clustered = run(args);
+    EXPECT_TRUE(has(handedOver(clustered), "flags", "0x0001")) << handedOver(clustered);
+    EXPECT_TRUE(has(handedOver(clustered), "profile", "C:\\\\Program Files\\\\ZAV\\\\KXL95"))
+        << handedOver(clustered);
+  }
 }
 
 TEST_F(OutcomeScenario, InstanceOnANetworkShareKeepsItsPath) {
