@@ -1,5 +1,6 @@
 #include "sim/kxlsim/scenario_parts.h"
 
+#include "sim/common/installer.h"
 #include "sim/kxlsim/dbmcfg_image.h"
 #include "sim/tools/tool_names.h"
 
@@ -81,10 +82,7 @@ void addProducts(WorldWriter &w, const CopySpec &copy) {
                 product.displayName + " " + levelText(copy) + "\r\n");
     if (copy.name.empty() || product.productCode.empty())
       continue;
-    std::string key = std::string(kUninstallKey) + "\\" + product.productCode;
-    w.setString(localMachine(), key, "InstallLocation", copy.path + "\\");
-    w.setString(localMachine(), key, "DisplayName", product.displayName);
-    w.setString(localMachine(), key, "DisplayVersion", levelText(copy));
+    registerInstalledProduct(w, product, copy.path + "\\", levelText(copy));
   }
 }
 
@@ -93,6 +91,20 @@ std::string profileKey(const std::string &copyName, const std::string &instanceN
 }
 
 } // namespace
+
+void registerInstalledProduct(WorldWriter &w, const ProductSpec &product, const std::string &location,
+                              const std::string &version) {
+  w.setString(localMachine(), installerProductKey(product.productCode), "ProductName", product.displayName);
+  std::string properties = installerPropertiesKey(product.productCode);
+  w.setString(localMachine(), properties, "InstallLocation", location);
+  w.setString(localMachine(), properties, "DisplayName", product.displayName);
+  w.setString(localMachine(), properties, "DisplayVersion", version);
+  w.setDword(localMachine(), properties, "WindowsInstaller", 1);
+  std::string uninstall = std::string(kUninstallKey) + "\\" + product.productCode;
+  w.setString(localMachine(), uninstall, "InstallLocation", location);
+  w.setString(localMachine(), uninstall, "DisplayName", product.displayName);
+  w.setString(localMachine(), uninstall, "DisplayVersion", version);
+}
 
 std::string copyRegistryKey(const std::string &copyName) {
   if (copyName.empty())

@@ -100,6 +100,12 @@ void addHost(WorldWriter &w, const std::string &host, const std::string &fullNam
 void addMachine(WorldWriter &w, const IdentitySpec &identity);
 
 // The copy's registration on a machine; its files too on the local machine.
+// The product as Windows Installer registers a machine-wide installation at
+// `location` (with its trailing backslash): its advertisement, its installed
+// properties and its entry in the list of installed programs.
+void registerInstalledProduct(WorldWriter &w, const ProductSpec &product, const std::string &location,
+                              const std::string &version);
+
 void addCopyRegistration(WorldWriter &w, const RegTarget &machine, const CopySpec &copy);
 void addCopyFiles(WorldWriter &w, const CopySpec &copy, const InstallSources &sources);
 void addCopy(WorldWriter &w, const CopySpec &copy, const InstallSources &sources);

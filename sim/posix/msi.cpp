@@ -1,6 +1,9 @@
-// Windows Installer: a product is installed when its code has an uninstall
-// key, and its properties are that key's values.
+// Windows Installer: a machine-wide product is known from the keys the real
+// installer keeps (its advertisement and its installed properties, both under
+// the product code's packed form), so a world answers the same here as when it
+// is imported into Windows or Wine.
 #include "platform/win32.h"
+#include "sim/common/installer.h"
 #include "sim/common/simfail.h"
 #include "sim/posix/reghelp.h"
 #include "sim/posix/win32util.h"
@@ -14,27 +17,40 @@ using namespace kxlsim::posix;
 namespace {
 
 constexpr INSTALLSTATE kInstallStateInvalidArg = -2;
+constexpr std::size_t kBracedGuidLength = 38;
 
-std::string uninstallKey(LPCSTR productCode) {
-  return std::string("SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\") + productCode;
+bool hasGuidLength(LPCSTR productCode) {
+  return productCode != nullptr && std::strlen(productCode) == kBracedGuidLength;
 }
 
-bool validProductCode(LPCSTR productCode) {
-  return productCode != nullptr && *productCode != '\0' && std::strchr(productCode, '\\') == nullptr;
+bool windowsInstallerFlag(const std::string &propertiesKey) {
+  DWORD flag = 0;
+  return reg::readDword(HKEY_LOCAL_MACHINE, propertiesKey, "WindowsInstaller", flag) && flag != 0;
 }
 
 } // namespace
 
 extern "C" {
 
+// Installed (5) needs both keys and the properties' "WindowsInstaller" flag;
+// an advertisement alone is advertised (1); without it the product is unknown.
 INSTALLSTATE MsiQueryProductStateA(LPCSTR szProduct) {
   if (kxlsim::shouldFail("MsiQueryProductStateA"))
     return INSTALLSTATE_UNKNOWN;
-  if (!validProductCode(szProduct))
+  if (!hasGuidLength(szProduct))
     return kInstallStateInvalidArg;
+  std::string productKey = kxlsim::installerProductKey(szProduct);
+  if (productKey.empty())
+    return INSTALLSTATE_UNKNOWN;
   requireWorld();
-  return reg::keyExists(HKEY_LOCAL_MACHINE, uninstallKey(szProduct)) ? INSTALLSTATE_DEFAULT
-                                                                     : INSTALLSTATE_UNKNOWN;
+  std::string propertiesKey = kxlsim::installerPropertiesKey(szProduct);
+  bool advertised = reg::keyExists(HKEY_LOCAL_MACHINE, productKey);
+  bool hasProperties = advertised && reg::keyExists(HKEY_LOCAL_MACHINE, propertiesKey);
+  if (!advertised)
+    return INSTALLSTATE_UNKNOWN;
+  if (!hasProperties)
+    return INSTALLSTATE_ADVERTISED;
+  return windowsInstallerFlag(propertiesKey) ? INSTALLSTATE_DEFAULT : INSTALLSTATE_UNKNOWN;
 }
 
 // Sizes count characters without the terminator, as Windows Installer does: a
@@ -43,17 +59,18 @@ INSTALLSTATE MsiQueryProductStateA(LPCSTR szProduct) {
 UINT MsiGetProductInfoA(LPCSTR szProduct, LPCSTR szAttribute, LPSTR lpValueBuf, LPDWORD pcchValueBuf) {
   if (kxlsim::shouldFail("MsiGetProductInfoA"))
     return ERROR_UNKNOWN_PRODUCT;
-  if (!validProductCode(szProduct) || szAttribute == nullptr ||
-      (lpValueBuf != nullptr && pcchValueBuf == nullptr))
+  std::string productKey = szProduct != nullptr ? kxlsim::installerProductKey(szProduct) : std::string();
+  if (productKey.empty() || szAttribute == nullptr || (lpValueBuf != nullptr && pcchValueBuf == nullptr))
     return ERROR_INVALID_PARAMETER;
   requireWorld();
-  std::string key = uninstallKey(szProduct);
-  if (!reg::keyExists(HKEY_LOCAL_MACHINE, key))
+  if (!reg::keyExists(HKEY_LOCAL_MACHINE, productKey))
     return ERROR_UNKNOWN_PRODUCT;
-  if (std::strcmp(szAttribute, INSTALLPROPERTY_INSTALLLOCATION) != 0)
+  std::string propertiesKey = kxlsim::installerPropertiesKey(szProduct);
+  if (std::strcmp(szAttribute, INSTALLPROPERTY_INSTALLLOCATION) != 0 ||
+      !reg::keyExists(HKEY_LOCAL_MACHINE, propertiesKey))
     return ERROR_UNKNOWN_PROPERTY;
   std::string value;
-  if (!reg::readString(HKEY_LOCAL_MACHINE, key, "InstallLocation", value))
+  if (!reg::readString(HKEY_LOCAL_MACHINE, propertiesKey, "InstallLocation", value))
     value.clear();
   if (pcchValueBuf == nullptr)
     return ERROR_SUCCESS;

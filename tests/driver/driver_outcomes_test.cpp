@@ -8,8 +8,6 @@
 namespace drivertest {
 namespace {
 
-constexpr const char *kUninstall = "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\";
-
 uint32_t littleEndian(const std::string &bytes, std::size_t at, std::size_t count) {
   uint32_t value = 0;
   for (std::size_t i = count; i-- > 0;)
@@ -29,9 +27,11 @@ protected:
     if (code.empty())
       return;
     world.writeText(std::string(kCurrentCopy) + "\\CFG\\kxl" + code + ".lvl", "level\n");
-    world.setString(kxlsim::localMachine(), kUninstall + productCode, "InstallLocation",
-                    std::string(kCurrentCopy) + "\\");
+    kxlsim::registerInstalledProduct(world, {code, productCode, "product"}, std::string(kCurrentCopy) + "\\",
+                                     "10.1.0.0");
   }
+
+  void expectCompletedDespiteAudit(const std::string &fault);
 
   // 1231 at `probe`, the message naming the instance's type and the type the
   // copy's last-ranked product hosts; nothing copied.

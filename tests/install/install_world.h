@@ -4,6 +4,7 @@
 
 #include "../product/world_fixture.h"
 #include "install/ilist.h"
+#include "sim/common/installer.h"
 
 #include <cstdint>
 #include <string>
@@ -56,10 +57,12 @@ protected:
     return image;
   }
 
-  // Windows Installer knows `code` as installed at `location`.
+  // Windows Installer knows `code` as installed at `location`, from the keys
+  // the real installer keeps.
   static void registerInstaller(const std::string &code, const std::string &location) {
-    setString("SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\" + code, "InstallLocation",
-              location);
+    setString(kxlsim::installerProductKey(code), "ProductName", "product");
+    setString(kxlsim::installerPropertiesKey(code), "InstallLocation", location);
+    setDword(kxlsim::installerPropertiesKey(code), "WindowsInstaller", 1);
   }
 
   // Every element of a list, walked from its head.

@@ -75,11 +75,14 @@ TEST_F(DemoWorld, RegistryHoldsCopiesProfilesAndInstallerRegistrations) {
   EXPECT_EQ(stringValue(lm, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\GLOBAL_PROFILE", "KXLPATH"),
             "C:\\Program Files\\ZAV\\KXL101");
   EXPECT_EQ(stringValue(lm, "SOFTWARE\\ZAV\\KXLSIM\\Instances\\V8INST", "Copy"), "");
-  EXPECT_EQ(stringValue(lm,
-                        "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\"
-                        "{6E1C2A40-9F3B-4D21-8A11-5B2C7D0E9A01}",
-                        "InstallLocation"),
-            "C:\\Program Files\\ZAV\\KXL101\\");
+  // The installer's own keys, under the packed form of the server's product
+  // code {6E1C2A40-9F3B-4D21-8A11-5B2C7D0E9A01}.
+  EXPECT_TRUE(keyExists(lm, "SOFTWARE\\Classes\\Installer\\Products\\04A2C1E6B3F912D4A811B5C2D7E0A910"));
+  const std::string properties =
+      "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Installer\\UserData\\S-1-5-18\\"
+      "Products\\04A2C1E6B3F912D4A811B5C2D7E0A910\\InstallProperties";
+  EXPECT_EQ(stringValue(lm, properties, "InstallLocation"), "C:\\Program Files\\ZAV\\KXL101\\");
+  EXPECT_EQ(dwordValue(lm, properties, "WindowsInstaller", 0), 1u);
 
   RegTarget remote = remoteMachine("WINSRV2");
   EXPECT_EQ(

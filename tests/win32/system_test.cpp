@@ -82,5 +82,105 @@ TEST_F(Win32Test, UnknownProductIsUnknownToTheInstaller) {
             MsiGetProductInfoA(unknownProduct, INSTALLPROPERTY_INSTALLLOCATION, location, &size));
 }
 
+// A product registered the way Windows Installer registers a machine-wide
+// installation, under its code's packed form (worked out by hand here).
+const char registeredProduct[] = "{0A1B2C3D-4E5F-4061-8273-94A5B6C7D8E9}";
+const char productKey[] = "SOFTWARE\\Classes\\Installer\\Products\\D3C2B1A0F5E416042837495A6B7C8D9E";
+#define KXL_USERDATA_PRODUCT                                                                                 \
+  "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Installer\\UserData\\S-1-5-18\\Products\\"                  \
+  "D3C2B1A0F5E416042837495A6B7C8D9E"
+const char userDataKey[] = KXL_USERDATA_PRODUCT;
+const char propertiesKey[] = KXL_USERDATA_PRODUCT "\\InstallProperties";
+const char uninstallKey[] =
+    "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\{0A1B2C3D-4E5F-4061-8273-94A5B6C7D8E9}";
+const char location[] = "C:\\Program Files\\KxlConformance\\";
+
+class InstallerTest : public Win32Test {
+protected:
+  void TearDown() override {
+    unregister();
+    Win32Test::TearDown();
+  }
+
+  static void unregister() {
+    for (const char *key : {productKey, userDataKey, uninstallKey})
+      SHDeleteKeyA(HKEY_LOCAL_MACHINE, key);
+  }
+
+  static void write(const char *key, const char *name, const std::string &value) {
+    HKEY handle = nullptr;
+    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, key, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr,
+                                             &handle, nullptr));
+    ASSERT_EQ(ERROR_SUCCESS,
+              RegSetValueExA(handle, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
+                             static_cast<DWORD>(value.size() + 1)));
+    RegCloseKey(handle);
+  }
+
+  static void writeFlag(const char *key, const char *name, DWORD value) {
+    HKEY handle = nullptr;
+    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, key, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr,
+                                             &handle, nullptr));
+    ASSERT_EQ(ERROR_SUCCESS, RegSetValueExA(handle, name, 0, REG_DWORD,
+                                            reinterpret_cast<const BYTE *>(&value), sizeof value));
+    RegCloseKey(handle);
+  }
+
+  static void advertise() { write(productKey, "ProductName", "KxlConformance"); }
+  static void installProperties() {
+    write(propertiesKey, "InstallLocation", location);
+    writeFlag(propertiesKey, "WindowsInstaller", 1);
+  }
+};
+
+TEST_F(InstallerTest, RegisteredProductIsInstalledAtItsLocationWithTheTrailingBackslash) {
+  advertise();
+  installProperties();
+  EXPECT_EQ(INSTALLSTATE_DEFAULT, MsiQueryProductStateA(registeredProduct));
+  char value[MAX_PATH] = {};
+  DWORD size = sizeof value;
+  ASSERT_EQ(static_cast<UINT>(ERROR_SUCCESS),
+            MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, value, &size));
+  EXPECT_STREQ(location, value);
+  EXPECT_EQ(std::strlen(location), size); // characters, without the terminator
+
+  char shortBuffer[8] = {};
+  size = sizeof shortBuffer;
+  EXPECT_EQ(static_cast<UINT>(ERROR_MORE_DATA),
+            MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, shortBuffer, &size));
+  EXPECT_EQ(std::strlen(location), size); // what the value needs; the buffer's content is not defined
+}
+
+// What the installer makes of each partial registration; only the installer's
+// own keys count, never the list of installed programs.
+TEST_F(InstallerTest, PartialRegistrationsAreNotInstalled) {
+  struct Case {
+    const char *name;
+    bool advertised, properties, uninstallEntry;
+    INSTALLSTATE state;
+    UINT locationRc;
+  };
+  const Case cases[] = {
+      {"advertisement only", true, false, false, INSTALLSTATE_ADVERTISED, ERROR_UNKNOWN_PROPERTY},
+      {"properties only", false, true, false, INSTALLSTATE_UNKNOWN, ERROR_UNKNOWN_PRODUCT},
+      {"uninstall entry only", false, false, true, INSTALLSTATE_UNKNOWN, ERROR_UNKNOWN_PRODUCT},
+  };
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.name);
+    if (c.advertised)
+      advertise();
+    if (c.properties)
+      installProperties();
+    if (c.uninstallEntry)
+      write(uninstallKey, "InstallLocation", location);
+    EXPECT_EQ(c.state, MsiQueryProductStateA(registeredProduct));
+    char value[MAX_PATH] = {};
+    DWORD size = sizeof value;
+    EXPECT_EQ(c.locationRc,
+              MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, value, &size));
+    unregister();
+  }
+}
+
 } // namespace
 } // namespace kxltest
