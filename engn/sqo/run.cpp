@@ -296,6 +296,22 @@ bool logAuditEvent(uint32_t category, uint32_t event, const char *instanceName, 
   return data.logEvent(&options.status) == 0;
 }
 
+// A completed upgrade stays completed when its audit record cannot be read or
+// written: the instance has moved and a rerun would only find it upgraded. The
+// failure is printed after the final message (not in quiet mode) and recorded
+// in the diagnostic log; the result stays 0. A failed run takes the audit's
+// code as before.
+int auditFailureResult(int runRc, const UpgradeOptions &options) {
+  int auditRc = sqlcaCode(options.status);
+  if (runRc != 0)
+    return auditRc;
+  pdLog(PD_LEVEL_WARNING, KXL_FN_RUN_AUDIT, 3, auditRc,
+        "Upgrade completed; its audit record was not written");
+  if (!options.quiet)
+    printSqlcaMessage(kLegacyName, &options.status, "processing complete");
+  return 0;
+}
+
 // The audit record of the upgraded instance. A failed run is audited as a
 // failure even when its reason never reached the status block.
 int auditInstance(int rc, UpgradeOptions &options, const RunState &state, const char *savedInstance) {
@@ -306,7 +322,7 @@ int auditInstance(int rc, UpgradeOptions &options, const RunState &state, const 
   int32_t settingsRc = sqlexAuditGetInstanceSettings(false, &settings, nullptr);
   if (settingsRc != 0) {
     sqlzRcToSqlca(0, &options.status, kToolName, settingsRc, 0, 0);
-    rc = sqlcaCode(options.status);
+    rc = auditFailureResult(rc, options);
   } else if (settings.active) {
     int32_t sqlcode = sqlcaCode(options.status) != 0 ? sqlcaCode(options.status) : (rc < 0 ? rc : 0);
     uint64_t outcome = sqlcode < 0 ? kAuditFailure : kAuditSuccess;
@@ -318,7 +334,7 @@ int auditInstance(int rc, UpgradeOptions &options, const RunState &state, const 
       logged = logAuditEvent(kAuditInstanceCategory, kAuditInstanceEvent, state.auditInstance, sqlcode,
                              settings.errorType, options);
     if (!logged)
-      rc = sqlcaCode(options.status);
+      rc = auditFailureResult(rc, options);
   }
   sqlosins(savedInstance);
   pdtExit(KXL_FN_RUN_AUDIT, rc, 0);

@@ -31,7 +31,17 @@ std::string eventLine(const std::string &kind, const EventFields &fields) {
 }
 
 #ifdef _WIN32
+// Creates every missing folder of a Windows folder path ("C:\\a\\b").
+void createFolders(const std::string &folder) {
+  for (std::size_t cut = folder.find('\\', 3);; cut = folder.find('\\', cut + 1)) {
+    CreateDirectoryA(folder.substr(0, cut).c_str(), nullptr);
+    if (cut == std::string::npos)
+      return;
+  }
+}
+
 bool appendLine(const std::string &path, const std::string &line) {
+  createFolders(path.substr(0, path.find_last_of('\\')));
   HANDLE file = CreateFileA(path.c_str(), FILE_APPEND_DATA, FILE_SHARE_READ | FILE_SHARE_WRITE, nullptr,
                             OPEN_ALWAYS, FILE_ATTRIBUTE_NORMAL, nullptr);
   if (file == INVALID_HANDLE_VALUE)
@@ -52,18 +62,32 @@ bool appendLine(const std::string &path, const std::string &line) {
 }
 #endif
 
+std::string logFolder() {
+#ifdef _WIN32
+  // The machine's own data folder; KXLSIM_ROOT (a Windows folder) overrides it.
+  const char *root = std::getenv("KXLSIM_ROOT");
+  if (root != nullptr && root[0] != '\0')
+    return root;
+  const char *data = std::getenv("ProgramData");
+  return std::string(data != nullptr && data[0] != '\0' ? data : "C:\\ProgramData") + "\\ZAV\\KXLSIM";
+#else
+  return posix::worldRoot();
+#endif
+}
+
 } // namespace
 
 std::string eventsPath() {
+  std::string folder = logFolder();
 #ifdef _WIN32
-  const char *root = std::getenv("KXLSIM_ROOT");
-  if (root != nullptr && root[0] != '\0')
-    return std::string(root) + "\\events.jsonl";
-  return "C:\\kxlsim\\events.jsonl";
+  return folder + "\\events.jsonl";
 #else
-  const std::string &root = posix::worldRoot();
-  return root.empty() ? "" : root + "/events.jsonl";
+  return folder.empty() ? "" : folder + "/events.jsonl";
 #endif
+}
+
+bool appendLogLine(const std::string &path, const std::string &line) {
+  return !path.empty() && appendLine(path, line);
 }
 
 bool appendEvent(const std::string &kind, const EventFields &fields) {

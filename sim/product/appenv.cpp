@@ -31,7 +31,7 @@ void releaseTable() {
 
 std::vector<kxlprod::NodeLine> localPartition() {
   kxlprod::NodeLine node;
-  node.machine = kxlprod::identityComputerName();
+  node.machine = kxlprod::localComputerName();
   if (!kxlprod::identityString("FullHostName", node.host) || node.host.empty())
     node.host = node.machine;
   return {node};
@@ -44,7 +44,7 @@ bool isLocal(const kxlprod::NodeLine &node, const std::string &computer, const s
 // The partition this process works for: the lowest-numbered one of this
 // machine, else the lowest-numbered one of the instance.
 int16_t currentPartition(const std::vector<kxlprod::NodeLine> &nodes) {
-  std::string computer = kxlprod::identityComputerName(), fullHost;
+  std::string computer = kxlprod::localComputerName(), fullHost;
   kxlprod::identityString("FullHostName", fullHost);
   int32_t lowest = SQLO_MAX_NODE_NUMBER + 1, lowestLocal = SQLO_MAX_NODE_NUMBER + 1;
   for (const kxlprod::NodeLine &node : nodes) {

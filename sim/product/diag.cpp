@@ -169,8 +169,7 @@ int32_t pdLog(uint32_t level, uint32_t functionId, uint32_t probe, int32_t rc, c
     line.addv(format, args);
     va_end(args);
   }
-  appendLine(path, line.finish());
-  return 0;
+  return kxlsim::appendLogLine(path, line.finish()) ? 0 : SQLO_RC_IO_ERROR;
 }
 
 void pdtEntry(uint32_t functionId) {

@@ -105,7 +105,7 @@ int32_t sqloGetComputerNameA(char *buffer, uint32_t *size) {
     SetLastError(ERROR_INVALID_PARAMETER);
     return 0;
   }
-  std::string name = kxlprod::identityComputerName();
+  std::string name = kxlprod::localComputerName();
   if (name.empty()) {
     SetLastError(ERROR_FILE_NOT_FOUND);
     return 0;

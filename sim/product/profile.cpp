@@ -8,6 +8,7 @@
 #include "sim/common/simfail.h"
 #include "sim/product/installation.h"
 #include "sim/product/regutil.h"
+#include "sim/product/simstore.h"
 #include "sim/product/state.h"
 
 #include <cctype>
@@ -179,14 +180,6 @@ int32_t profileAction(uint32_t action, char *profileName) {
   }
 }
 
-std::string localComputerName() {
-  char name[64];
-  DWORD size = sizeof name;
-  if (!GetComputerNameA(name, &size))
-    return std::string();
-  return std::string(name, size < sizeof name ? size : sizeof name - 1);
-}
-
 void releaseMachine(SQLO_PREG_MACHINE *machine) {
   if (machine == nullptr)
     return;
@@ -300,7 +293,7 @@ int32_t sqloPRegMachineOpen(const char *machineName, SQLO_PREG_MACHINE **handle)
   if (machine == nullptr)
     return SQLO_RC_NO_MEMORY;
   kxlprod::copyBounded(name, machine->machineName, sizeof machine->machineName);
-  if (name.empty() || kxlprod::sameName(name, localComputerName())) {
+  if (name.empty() || kxlprod::sameName(name, kxlprod::localComputerName())) {
     machine->hklm = HKEY_LOCAL_MACHINE;
   } else {
     std::string key = std::string(kxlprod::kSimRoot) + "\\Machines\\" + name;

@@ -7,6 +7,7 @@
 #include "sim/common/simfail.h"
 #include "sim/product/regutil.h"
 #include "sim/product/simstate.h"
+#include "sim/product/simstore.h"
 
 #include <cstring>
 #include <string>
@@ -14,7 +15,6 @@
 namespace {
 
 constexpr char kServicesKey[] = "SOFTWARE\\ZAV\\KXLSIM\\Services\\";
-constexpr char kMachinesKey[] = "SOFTWARE\\ZAV\\KXLSIM\\Machines\\";
 
 enum ServiceState : DWORD {
   kStopped = 1,
@@ -25,29 +25,6 @@ enum ServiceState : DWORD {
   kPausePending = 6,
   kPaused = 7,
 };
-
-std::string localComputerName() {
-  char name[SQLO_COMPUTERNAME_SZ] = {};
-  DWORD size = sizeof name;
-  if (!GetComputerNameA(name, &size))
-    return std::string();
-  return std::string(name, size < sizeof name ? size : sizeof name - 1);
-}
-
-// Key prefix of the machine's HKEY_LOCAL_MACHINE inside the local registry;
-// false when the machine cannot be reached.
-bool machinePrefix(const char *machine, std::string &prefix) {
-  prefix.clear();
-  if (machine == nullptr || machine[0] == '\0' || kxlprod::sameName(machine, localComputerName()))
-    return true;
-  if (std::strlen(machine) >= SQLO_COMPUTERNAME_SZ)
-    return false;
-  prefix = std::string(kMachinesKey) + machine;
-  if (!kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, prefix))
-    return false;
-  prefix += "\\";
-  return true;
-}
 
 int32_t codeForState(DWORD state) {
   switch (state) {
@@ -88,7 +65,7 @@ int32_t sqloQueryKXLService(const char *serviceName, SQLO_SVC_OUT *out, const ch
   if (serviceName == nullptr || serviceName[0] == '\0')
     return SQLO_RC_INVALID_ARGUMENT;
   std::string prefix;
-  if (!machinePrefix(machine, prefix)) {
+  if (!kxlprod::machineKeyPrefix(machine, prefix)) {
     report(out, ERROR_BAD_CONFIGURATION, 0);
     return SQLO_RC_MACHINE_UNREACHABLE;
   }

@@ -40,7 +40,7 @@ bool inSnapshot(const KeySnapshot &snapshot, const std::string &name) {
 
 bool machineKeyPrefix(const char *machine, std::string &prefix) {
   prefix.clear();
-  if (machine == nullptr || machine[0] == '\0' || sameName(machine, identityComputerName()))
+  if (machine == nullptr || machine[0] == '\0' || sameName(machine, localComputerName()))
     return true;
   if (std::strlen(machine) >= 16)
     return false;
@@ -82,10 +82,15 @@ bool identityString(const char *name, std::string &value) {
   return readRegString(HKEY_LOCAL_MACHINE, kIdentityKey, name, value) == ERROR_SUCCESS;
 }
 
-std::string identityComputerName() {
+std::string localComputerName() {
   std::string name;
-  identityString("ComputerName", name);
-  return name;
+  if (identityString("ComputerName", name) && !name.empty())
+    return name;
+  char system[64] = {};
+  DWORD size = sizeof system;
+  if (!GetComputerNameA(system, &size))
+    return std::string();
+  return std::string(system, size < sizeof system ? size : sizeof system - 1);
 }
 
 LONG readWholeFile(const std::string &windowsPath, size_t maxBytes, std::vector<uint8_t> &data) {

@@ -33,8 +33,11 @@ std::string processInstance();
 // A string value of the machine identity; false when missing.
 bool identityString(const char *name, std::string &value);
 
-// The local computer name from the machine identity ("" when missing).
-std::string identityComputerName();
+// The local computer's name, the one source of it for the whole library: the
+// machine identity's "ComputerName", else the system's name ("" when neither
+// is known). A machine whose system name differs from its identity (a world
+// imported into Windows or Wine) still agrees with itself everywhere.
+std::string localComputerName();
 
 // Binary file content of at most `maxBytes` bytes (Windows path, no quotes).
 // Windows error codes; ERROR_MORE_DATA for a longer file.

@@ -103,6 +103,8 @@ Outcome DriverTest::run(const std::vector<std::string> &args, const std::string 
   std::string tag = temp_ + "/run" + std::to_string(++runs_);
   std::string eventLog = root_ + "/events.jsonl";
   std::size_t eventsBefore = readHostFile(eventLog).size();
+  std::string diagLog = root_ + "/kxldiag.log";
+  std::size_t diagBefore = readHostFile(diagLog).size();
   kxltestsupport::CommandRun command;
   command.program = hostPath(std::string(kCurrentCopy) + "\\bin\\kxliupgrade.exe");
   command.args = args;
@@ -119,6 +121,7 @@ Outcome DriverTest::run(const std::vector<std::string> &args, const std::string 
   std::istringstream added(readHostFile(eventLog).substr(eventsBefore));
   for (std::string line; std::getline(added, line);)
     outcome.events.push_back(line);
+  outcome.diagnostics = readHostFile(diagLog).substr(diagBefore);
   return outcome;
 }
 

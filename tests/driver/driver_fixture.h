@@ -31,6 +31,7 @@ struct Outcome {
   std::vector<DriverFailure> failures; // the driver's error trace lines
   std::string out, err, trace;
   std::vector<std::string> events; // lines appended to events.jsonl
+  std::string diagnostics;         // what the run appended to the diagnostic log
 };
 
 // Relative path -> content of every file below a directory.

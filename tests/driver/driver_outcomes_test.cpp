@@ -100,6 +100,31 @@ TEST_F(DriverOutcomeTest, CleanupRunThatCannotStartDoesNotChangeTheResult) {
   EXPECT_EQ(outcome.driverResult, 0) << outcome.out << outcome.err;
 }
 
+// The audit record comes after the instance has moved: it can no longer undo
+// anything, and a rerun would only find the instance upgraded. So a completed
+// upgrade stays completed, and the audit failure is shown and logged.
+void DriverOutcomeTest::expectCompletedDespiteAudit(const std::string &fault) {
+  world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
+                  "active = yes\ninstance = both\n");
+  Outcome outcome = run({"INST1"}, fault);
+  EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
+  EXPECT_EQ(outcome.driverResult, 0);
+  EXPECT_TRUE(keyExists(profileKey("KXL101", "INST1")));
+  EXPECT_NE(outcome.out.find("KXL1000I"), std::string::npos) << outcome.out;
+  EXPECT_NE(outcome.out.find("1042"), std::string::npos) << "the audit failure is shown: " << outcome.out;
+  EXPECT_NE(outcome.diagnostics.find("audit record was not written"), std::string::npos)
+      << outcome.diagnostics;
+  EXPECT_EQ(run({"-q", "INST1"}).exitCode, -1949 & 0xFF) << "a rerun finds it on the current copy";
+}
+
+TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompletedWhenItsAuditEventIsLost) {
+  expectCompletedDespiteAudit("logEvent:1");
+}
+
+TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompletedWhenItsAuditSettingsCannotBeRead) {
+  expectCompletedDespiteAudit("sqlexAuditGetInstanceSettings:1");
+}
+
 TEST_F(DriverOutcomeTest, VersionEightProfileKeyMovesAndIsDeleted) {
   std::string oldKey = profileKey("", "V8INST");
   ASSERT_TRUE(keyExists(oldKey));
