@@ -6,6 +6,7 @@
 
 #include <cstdlib>
 #include <cstring>
+#include <initializer_list>
 
 namespace {
 
@@ -75,22 +76,49 @@ StepResult copyToNewProfilePath(DriverState &state) {
   if ((state.options.flags & UPGRADE_FLAG_PROFILE_PATH_MOVES) == 0)
     return stepDone();
   const char *profilePath = state.options.profilePath;
-  if (!pathExists(profilePath) && !createDirectory(profilePath))
-    return stepFailed(kProbeProfilePathCreate, UPGRADE_RC_PROFILE_PATH_FAILED);
+  if (!pathExists(profilePath)) {
+    if (!createDirectory(profilePath))
+      return stepFailed(kProbeProfilePathCreate, UPGRADE_RC_PROFILE_PATH_FAILED);
+    state.profilePathCreated = true;
+  }
   char target[KXL_JOINED_PATH_SZ];
   joinPath(target, profilePath, state.instanceName);
   if (pathExists(target))
     return stepFailed(kProbeInstanceDirExists, UPGRADE_RC_PROFILE_PATH_FAILED);
+  // From here on the directory is this run's, even when the copy stops half way.
+  std::memcpy(state.profileCopyDir, target, sizeof state.profileCopyDir);
   if (sqlocopydir(target, state.instanceDir, 0) != 0)
     return stepFailed(kProbeProfileCopy, UPGRADE_RC_BACKUP_FAILED);
   return stepDone();
+}
+
+void noteNewFunctionDirectory(DriverState &state, const char *newProfilePath) {
+  char functionDir[KXL_JOINED_PATH_SZ];
+  joinPath(functionDir, newProfilePath, "\\function");
+  if (!pathExists(functionDir))
+    std::memcpy(state.newFunctionDir, functionDir, sizeof state.newFunctionDir);
+}
+
+bool removeProfileCopies(DriverState &state) {
+  bool removed = true;
+  for (char *directory : {state.newFunctionDir, state.profileCopyDir}) {
+    if (directory[0] != '\0' && pathExists(directory) && sqlodeletedir(directory) != 0)
+      removed = false;
+    else
+      directory[0] = '\0';
+  }
+  // A profile path this run created holds nothing but what the run put there.
+  if (removed && state.profilePathCreated) {
+    removed = sqlodeletedir(state.options.profilePath) == 0;
+    state.profilePathCreated = !removed;
+  }
+  return removed;
 }
 
 bool restoreBackup(DriverState &state) {
   int32_t rc = sqlocopydir(state.savedInstanceDir, state.backupDir, 0);
   if (rc == 0)
     return true;
-  state.backupChosen = false;
   pdLog(PD_LEVEL_SEVERE, KXL_FN_UPGRADE_INSTANCE, kProbeRestoreFailed, rc,
         "instance directory %s not restored; its backup is kept in %s", state.savedInstanceDir,
         state.backupDir);

@@ -24,12 +24,22 @@ StepResult makeBackup(DriverState &state);
 
 // With UPGRADE_FLAG_PROFILE_PATH_MOVES: creates the options' profile path when
 // missing and copies the instance directory to "<profile path>\<instance>",
-// which must not exist yet. Without the flag nothing happens.
+// which must not exist yet. Without the flag nothing happens. Records what it
+// created (state.profilePathCreated, state.profileCopyDir) for the undo.
 StepResult copyToNewProfilePath(DriverState &state);
 
+// Remembers the new profile path's function directory when it does not exist
+// yet, so that a failure removes the copy the upgrade is about to make.
+void noteNewFunctionDirectory(DriverState &state, const char *newProfilePath);
+
+// Removes what this call created under the new instance profile path: the
+// instance directory's copy, the function directory's copy, and the profile
+// path itself when this call created it. Never a directory that existed
+// before the call. False when one of them could not be removed.
+bool removeProfileCopies(DriverState &state);
+
 // Copies the backup back over the saved instance directory. When that copy
-// fails the backup is kept (and its place logged) so that nothing is lost;
-// returns false then.
+// fails its place is logged and false returned; the undo then keeps it.
 bool restoreBackup(DriverState &state);
 
 // Deletes the backup directory when this call created it.

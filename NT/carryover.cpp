@@ -35,8 +35,10 @@ void dropAuditCopy(const DriverState &state) {
   sqlodelete(state.auditCopyFile, 0);
 }
 
+// A missing file comes as an error or as a warning, a missing folder as its own code.
 bool carriedOrAbsent(int32_t rc) {
-  return rc == 0 || rc == SQLO_RC_FILE_NOT_FOUND || rc == SQLO_RC_PATH_NOT_FOUND;
+  return rc == 0 || rc == SQLO_RC_FILE_NOT_FOUND || rc == SQLO_RC_FILE_NOT_FOUND_W ||
+         rc == SQLO_RC_PATH_NOT_FOUND;
 }
 
 StepResult carryOverFiles(const DriverState &state) {

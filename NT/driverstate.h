@@ -39,9 +39,16 @@ struct DriverState {
   InstallCopyList *rereadCopies = nullptr; // owned by the driver
   IKXLINSTANCE *newInstance = nullptr;     // borrowed from rereadCopies
 
-  bool profileMoved = false;   // the registry profile lives under the current copy
+  // The registry profile move was started: some or all machines may hold the
+  // key under the current copy.
+  bool profileMoved = false;
   bool backupChosen = false;   // backupDir was created by this call
   bool backupComplete = false; // backupDir holds the whole instance directory
+
+  // What this call made under a new instance profile path, removed again on failure.
+  char profileCopyDir[KXL_JOINED_PATH_SZ] = {}; // the instance directory's copy
+  char newFunctionDir[KXL_JOINED_PATH_SZ] = {}; // the function directory's copy
+  bool profilePathCreated = false;              // options.profilePath itself
 };
 
 // Outcome of one step: rc 0 for success, else the result and its trace point.

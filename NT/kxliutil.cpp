@@ -28,6 +28,7 @@ constexpr int32_t kToCurrentServerType = 1;
 
 // Trace points.
 constexpr uint32_t kProbeActive = 10;
+constexpr uint32_t kProbeNodeList = 11;
 constexpr uint32_t kProbeCurrentCopy = 5;
 constexpr uint32_t kProbeProfileMove = 80;
 constexpr uint32_t kProbeServices = 90;
@@ -38,6 +39,8 @@ constexpr uint32_t kProbeDbmConfig = 130;
 constexpr uint32_t kProbeAuthType = 140;
 constexpr uint32_t kProbeFunctionDir = 190;
 constexpr uint32_t kProbeCluster = 200;
+constexpr uint32_t kProbeForcedKeys = 210; // diagnostic log only
+constexpr uint32_t kProbeDropFailed = 310; // diagnostic log only
 
 bool isPartitioned(const DriverState &state) {
   return state.options.partitionedInstance == 1 || state.context.nodeType == kPartitionedNodeType;
@@ -54,6 +57,17 @@ StepResult refuseActiveInstance(DriverState &state) {
   if (isInstanceActive(state.context, state.options))
     return stepFailed(kProbeActive, UPGRADE_RC_INSTANCE_ACTIVE);
   return stepDone();
+}
+
+// A partitioned instance whose node list is missing, empty or unreadable has
+// no partition to check, move or re-point: refused before anything changes.
+StepResult requireNodeList(DriverState &state) {
+  if (!isPartitioned(state) ||
+      (state.context.nodeList != nullptr && sqloNodeListCount(state.context.nodeList) > 0))
+    return stepDone();
+  state.options.tokenCount = 1;
+  state.options.tokens[0] = state.options.instanceName;
+  return stepFailed(kProbeNodeList, UPGRADE_RC_NO_NODE_LIST);
 }
 
 // The current copy in the context's list. The run has found it already; a
@@ -87,12 +101,12 @@ StepResult checkCurrentEdition(DriverState &state) {
   return stepFailed(probe, rc);
 }
 
+// A move that fails on one machine may have moved the key on others already:
+// the undo reverts whatever was moved, machine by machine.
 StepResult moveProfile(DriverState &state) {
-  int32_t rc = moveInstanceProfile(state.context, state.options);
-  if (rc != 0)
-    return stepFailed(kProbeProfileMove, rc);
   state.profileMoved = true;
-  return stepDone();
+  int32_t rc = moveInstanceProfile(state.context, state.options);
+  return rc != 0 ? stepFailed(kProbeProfileMove, rc) : stepDone();
 }
 
 StepResult keepAudit(DriverState &state) {
@@ -179,6 +193,7 @@ StepResult copyFunctions(DriverState &state) {
   char newProfilePath[KXL_JOINED_PATH_SZ] = {};
   state.context.instance->GetInstanceParentDir(oldProfilePath, sizeof oldProfilePath);
   state.newInstance->GetInstanceParentDir(newProfilePath, sizeof newProfilePath);
+  noteNewFunctionDirectory(state, newProfilePath);
   int32_t rc = copyFunctionDirectory(state.context, newProfilePath, oldProfilePath);
   return rc != 0 ? stepFailed(kProbeFunctionDir, rc) : stepDone();
 }
@@ -190,6 +205,16 @@ StepResult upgradeCluster(DriverState &state) {
   return rc != 0 ? stepFailed(kProbeCluster, rc) : stepDone();
 }
 
+// The other machines' old profile keys of a force-copy-name upgrade are kept
+// until everything else has succeeded, so that a failure can put them back.
+StepResult dropForcedKeys(DriverState &state) {
+  int32_t rc = dropForcedProfileKeys(state.context, state.options);
+  if (rc != 0)
+    pdLog(PD_LEVEL_WARNING, KXL_FN_UPGRADE_INSTANCE, kProbeForcedKeys, rc,
+          "old profile keys of the force-copy-name machines not all deleted");
+  return stepDone();
+}
+
 StepResult cleanProfileRegistry(DriverState &) {
   runCleanupTool();
   return stepDone();
@@ -199,27 +224,14 @@ using Step = StepResult (*)(DriverState &);
 
 // The upgrade, in order.
 constexpr Step kSteps[] = {
-    takeInstanceName,
-    refuseActiveInstance,
-    findCurrentCopy,
-    readInstanceNodeType,
-    checkCurrentEdition,
-    makeBackup,
-    copyToNewProfilePath,
-    moveProfile,
-    keepAudit,
-    upgradeServices,
-    upgradeAudit,
-    upgradeSsl,
-    rereadCopies,
-    findUpgradedInstance,
-    prepareEnvironment,
-    convertConfiguration,
-    applyAuthenticationType,
-    carryFiles,
-    copyFunctions,
-    upgradeCluster,
-    cleanProfileRegistry,
+    takeInstanceName,   refuseActiveInstance, requireNodeList,
+    findCurrentCopy,    readInstanceNodeType, checkCurrentEdition,
+    makeBackup,         copyToNewProfilePath, moveProfile,
+    keepAudit,          upgradeServices,      upgradeAudit,
+    upgradeSsl,         rereadCopies,         findUpgradedInstance,
+    prepareEnvironment, convertConfiguration, applyAuthenticationType,
+    carryFiles,         copyFunctions,        upgradeCluster,
+    dropForcedKeys,     cleanProfileRegistry,
 };
 
 void releaseCopies(DriverState &state) {
@@ -228,13 +240,63 @@ void releaseCopies(DriverState &state) {
   state.newInstance = nullptr;
 }
 
+// Drops the instance that the services step re-created under the current
+// copy: the product library puts back the instance's registration, profile
+// key, service and configuration file as they were before the re-creation.
+bool dropRecreatedInstance(DriverState &state) {
+  uint32_t nodeType = state.context.recreatedNodeType;
+  if (nodeType == 0)
+    return true;
+  int32_t rc = 0;
+  if (nodeType == kPartitionedNodeType) {
+    SQLO_INST_OUT first{}, second{};
+    rc = sqlo_instance_delnode(state.instanceName, 0, nullptr, 0, &first, &second);
+  }
+  char directory[KXL_JOINED_PATH_SZ];
+  joinPath(directory, state.options.profilePath, state.instanceName);
+  int32_t dropRc = sqlo_instance_drop(state.instanceName, directory);
+  rc = rc != 0 ? rc : dropRc;
+  if (rc != 0) {
+    pdLog(PD_LEVEL_SEVERE, KXL_FN_UPGRADE_INSTANCE, kProbeDropFailed, rc,
+          "instance %s re-created under the current copy could not be dropped", state.instanceName);
+    return false;
+  }
+  return true;
+}
+
+// What the undo achieved, for the final message. An incomplete undo keeps the
+// backup so that nothing of the instance is lost.
+void reportUndo(DriverState &state, bool changed, bool complete) {
+  UpgradeOptions &options = state.options;
+  if (!complete && state.backupChosen) {
+    options.undoOutcome = UPGRADE_UNDO_INCOMPLETE;
+    std::memcpy(options.keptBackupDir, state.backupDir, sizeof options.keptBackupDir);
+    options.keptBackupDir[sizeof options.keptBackupDir - 1] = '\0';
+    state.backupChosen = false;
+  } else if (!complete) {
+    options.undoOutcome = UPGRADE_UNDO_INCOMPLETE;
+  } else if (changed) {
+    options.undoOutcome = UPGRADE_UNDO_COMPLETE;
+  }
+}
+
 int32_t undo(DriverState &state, const StepResult &failure) {
   pdtError(KXL_FN_UPGRADE_INSTANCE, failure.probe, failure.rc);
+  bool recreated = state.context.recreatedNodeType != 0;
+  bool changed = recreated || state.profileMoved || state.profileCopyDir[0] != '\0';
+  // The re-creation first: it put the current copy's profile key and the
+  // services as they were after the move, which the revert then undoes.
+  bool dropped = dropRecreatedInstance(state);
+  bool complete = dropped;
   if (state.profileMoved)
-    revertInstanceProfile(state.context, state.options);
+    complete = revertInstanceProfile(state.context, state.options) == 0 && complete;
   if (failure.rc < 0 && state.backupComplete)
-    restoreBackup(state);
+    complete = restoreBackup(state) && complete;
+  // A copy the instance is still registered in stays where it is.
+  if (dropped)
+    complete = removeProfileCopies(state) && complete;
   releaseCopies(state);
+  reportUndo(state, changed, complete);
   removeBackup(state);
   return failure.rc;
 }

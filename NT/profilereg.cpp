@@ -71,10 +71,11 @@ template <class... Args> bool formatWhole(char *buffer, size_t size, const char 
 // The keys one machine's move works on, and what they were formed from.
 struct ProfileKeys {
   char currentCopy[kCopyNameSize] = {};
-  int32_t ownerVersion = 0;        // major version of the copy that owned the instance
-  char current[kKeyPathSize] = {}; // profile key under the current copy
-  char force[kKeyPathSize] = {};   // force-copy-name placeholder of the current copy
-  char old[kKeyPathSize] = {};     // profile key under the owning copy
+  char ownerCopy[kCopyNameSize] = {}; // the owning copy's name; empty for the single-copy layout
+  int32_t ownerVersion = 0;           // major version of the copy that owned the instance
+  char current[kKeyPathSize] = {};    // profile key under the current copy
+  char force[kKeyPathSize] = {};      // force-copy-name placeholder of the current copy
+  char old[kKeyPathSize] = {};        // profile key under the owning copy
 };
 
 bool namedProfileKey(char (&path)[kKeyPathSize], const char *copy, const char *instance) {
@@ -97,10 +98,10 @@ int32_t ownerMajorVersion(const UpgradeContext &context) {
 bool formOldKey(const UpgradeContext &context, const char *instance, ProfileKeys &keys) {
   if (keys.ownerVersion < kFirstNamedCopyVersion)
     return formatWhole(keys.old, sizeof keys.old, "%s\\PROFILES\\%s", kProductRoot, instance);
-  char copyName[kCopyNameSize] = {};
-  if (context.instance == nullptr || context.instance->GetCopyName(copyName, sizeof copyName) != 0)
+  if (context.instance == nullptr ||
+      context.instance->GetCopyName(keys.ownerCopy, sizeof keys.ownerCopy) != 0)
     return false;
-  return namedProfileKey(keys.old, copyName, instance);
+  return namedProfileKey(keys.old, keys.ownerCopy, instance);
 }
 
 bool loadKeys(const UpgradeContext &context, const UpgradeOptions &options, ProfileKeys &keys) {
@@ -124,6 +125,41 @@ LONG createKey(HKEY root, const char *path, HKEY *key, DWORD *disposition) {
                          disposition);
 }
 
+// True when the key exists and holds neither values nor subkeys.
+bool isEmptyKey(HKEY root, const char *path) {
+  HKEY key = nullptr;
+  if (RegOpenKeyExA(root, path, 0, kReadAccess, &key) != ERROR_SUCCESS)
+    return false;
+  char name[4];
+  DWORD size = sizeof name;
+  bool empty = RegEnumKeyExA(key, 0, name, &size, nullptr, nullptr, nullptr, nullptr) == ERROR_NO_MORE_ITEMS;
+  size = sizeof name;
+  empty =
+      empty && RegEnumValueA(key, 0, name, &size, nullptr, nullptr, nullptr, nullptr) == ERROR_NO_MORE_ITEMS;
+  RegCloseKey(key);
+  return empty;
+}
+
+// Deletes a key this run created, and the parents below the product root that
+// creating it made and that are empty now.
+void deleteCreatedKey(HKEY root, const char *path) {
+  SHDeleteKeyA(root, path);
+  char parent[kKeyPathSize];
+  if (!formatWhole(parent, sizeof parent, "%s", path))
+    return;
+  const size_t rootLength = sizeof kProductRoot - 1;
+  for (char *cut = std::strrchr(parent, '\\');
+       cut != nullptr && static_cast<size_t>(cut - parent) > rootLength; cut = std::strrchr(parent, '\\')) {
+    *cut = '\0';
+    if (!isEmptyKey(root, parent))
+      return;
+    RegDeleteKeyA(root, parent);
+  }
+}
+
+// In force mode the old key stays until the whole upgrade has succeeded
+// (dropForcedProfileKeys): it holds the machine's profile values, which a
+// failed upgrade must put back.
 int32_t moveKey(HKEY root, const ProfileKeys &keys, bool force) {
   const char *target = force ? keys.force : keys.current;
   HKEY newKey = nullptr;
@@ -131,13 +167,18 @@ int32_t moveKey(HKEY root, const ProfileKeys &keys, bool force) {
   if (createKey(root, target, &newKey, &disposition) != ERROR_SUCCESS)
     return traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
   int32_t rc = 0;
-  if (!sameText(keys.old, target, kKeyPathSize)) {
-    if (!force && SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS)
+  bool copyFailed = false;
+  if (!force && !sameText(keys.old, target, kKeyPathSize)) {
+    copyFailed = SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS;
+    if (copyFailed)
       rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
     else
       SHDeleteKeyA(root, keys.old);
   }
   RegCloseKey(newKey);
+  // A key this call created for a copy that failed would be taken for a move.
+  if (copyFailed && disposition == REG_CREATED_NEW_KEY)
+    deleteCreatedKey(root, target);
   return rc;
 }
 
@@ -147,16 +188,29 @@ int32_t revertKey(HKEY root, const ProfileKeys &keys, bool force) {
   if (createKey(root, keys.old, &oldKey, &disposition) != ERROR_SUCCESS)
     return traced(KXL_FN_REVERT_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
   int32_t rc = 0;
-  if (disposition != REG_OPENED_EXISTING_KEY) {
-    if (force)
-      SHDeleteKeyA(root, keys.force);
-    else if (SHCopyKeyA(root, keys.current, oldKey, 0) != ERROR_SUCCESS)
+  bool created = disposition != REG_OPENED_EXISTING_KEY;
+  if (!force && created) {
+    if (SHCopyKeyA(root, keys.current, oldKey, 0) != ERROR_SUCCESS)
       rc = traced(KXL_FN_REVERT_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
     else
       SHDeleteKeyA(root, keys.current);
   }
   RegCloseKey(oldKey);
+  // A forced machine keeps its old key through the upgrade: only the
+  // placeholder goes, and an old key that was not there is not invented.
+  if (force) {
+    deleteCreatedKey(root, keys.force);
+    if (created)
+      deleteCreatedKey(root, keys.old);
+  }
   return rc;
+}
+
+// After a successful force-copy-name upgrade: the old key of a forced machine.
+int32_t dropForcedKey(HKEY root, const ProfileKeys &keys) {
+  if (!sameText(keys.old, keys.force, kKeyPathSize))
+    SHDeleteKeyA(root, keys.old);
+  return 0;
 }
 
 using KeyOperation = int32_t (*)(UpgradeContext &, HKEY, UpgradeOptions &, uint8_t);
@@ -173,6 +227,9 @@ struct MachineWalk {
   const ProfileKeys *keys; // the undo's service names; null for the move
   SQLO_PREG_MACHINE *machine = nullptr;
   std::vector<std::string> handled;
+  // The undo goes on past a machine it cannot handle, so that every machine
+  // it can reach is put back; it reports the first failure.
+  bool keepGoing = false;
 
   MachineWalk(UpgradeContext &c, UpgradeOptions &o, uint32_t f, KeyOperation op, const ProfileKeys *k)
       : context(c), options(o), function(f), operation(op), keys(k) {}
@@ -272,17 +329,19 @@ using EntryHook = void (*)(MachineWalk &, const unsigned char *entry, uint8_t fo
 // Each machine once (the entries of logical port 0), then the hook for every entry.
 int32_t walkPartitions(MachineWalk &walk, const char *localHost, EntryHook hook) {
   NodeCursor nodes(walk.context.nodeList);
+  int32_t first = 0;
   for (const unsigned char *entry = nodes.next(); entry != nullptr; entry = nodes.next()) {
     uint8_t force = forceFor(walk.options, localHost, entry);
     if (sqloNodePort(entry) == 0) {
       int32_t rc = onMachine(walk, sqloNodeMachine(entry), force, kProbePartitionOpen, kProbePartitionKey);
-      if (rc != 0)
+      if (rc != 0 && !walk.keepGoing)
         return rc;
+      first = first != 0 ? first : rc;
     }
     if (hook != nullptr)
       hook(walk, entry, force, localHost);
   }
-  return 0;
+  return first;
 }
 
 // ---------------------------------------------------------------------------
@@ -319,6 +378,7 @@ int32_t walkCluster(MachineWalk &walk) {
     return traced(walk.function, kProbeClusterName, static_cast<int32_t>(nameRc));
   char list[kRegValueBuffer];
   readClusterList(walk.options.instanceName, list);
+  int32_t first = 0;
   for (char *name = list; *name != '\0';) {
     char *end = std::strchr(name, ' ');
     char *rest = end != nullptr ? end + 1 : name + std::strlen(name);
@@ -327,11 +387,12 @@ int32_t walkCluster(MachineWalk &walk) {
     int32_t rc = 0;
     if (name[0] != '\0' && !sameText(name, computer, SQLO_COMPUTERNAME_SZ) && !walk.handledAlready(name))
       rc = onMachine(walk, name, 0, kProbeClusterOpen, kProbeClusterKey);
-    if (rc != 0)
+    if (rc != 0 && !walk.keepGoing)
       return rc;
+    first = first != 0 ? first : rc;
     name = rest;
   }
-  return 0;
+  return first;
 }
 
 bool isClustered(const UpgradeContext &context) {
@@ -342,12 +403,13 @@ bool isClustered(const UpgradeContext &context) {
 // The undo's services
 // ---------------------------------------------------------------------------
 
-// "KXL - <service>" for version-8 copies, else with the current copy's name.
+// The name the owning copy gives its services: "KXL - <service>" for
+// version-8 copies, else with the owning copy's name, as before the upgrade.
 void serviceDisplayName(const ProfileKeys &keys, const char *service, char (&display)[kDisplayNameSize]) {
   if (keys.ownerVersion < kFirstNamedCopyVersion)
     std::snprintf(display, sizeof display, "KXL - %s", service);
   else
-    std::snprintf(display, sizeof display, "KXL - %s - %s", keys.currentCopy, service);
+    std::snprintf(display, sizeof display, "KXL - %s - %s", keys.ownerCopy, service);
 }
 
 // The owning copy's service program. A path that does not fit leaves the
@@ -407,8 +469,10 @@ void repointPartitionService(MachineWalk &walk, const unsigned char *entry, uint
   char display[kDisplayNameSize];
   std::snprintf(service, sizeof service, "%s-%d", walk.options.instanceName, sqloNodeNumber(entry));
   serviceDisplayName(*walk.keys, service, display);
-  // Without a user name the service keeps its account.
-  const char *account = textOrNull(walk.options.userName);
+  // Without a user name the service keeps its account, and so it does when
+  // the services were never re-pointed with that name (the instance was not
+  // re-created): the undo then changes no account.
+  const char *account = walk.context.recreatedNodeType != 0 ? textOrNull(walk.options.userName) : nullptr;
   repointService(walk.context, service, machine, force != 0 ? nullptr : textOrNull(program), account,
                  account != nullptr ? walk.options.password : nullptr, display);
 }
@@ -438,6 +502,15 @@ int32_t moveMachines(MachineWalk &walk) {
   return walkPartitions(walk, localHost, nullptr);
 }
 
+// The old profile keys of the forced partitions' machines.
+int32_t dropForcedMachines(MachineWalk &walk) {
+  if (walk.options.partitionedInstance != 1 || (walk.options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) == 0)
+    return 0;
+  char localHost[SQLO_HOSTNAME_SZ] = {};
+  int32_t rc = localFullHostName(walk, localHost);
+  return rc != 0 ? rc : walkPartitions(walk, localHost, nullptr);
+}
+
 int32_t revertMachines(MachineWalk &walk) {
   if (walk.options.partitionedInstance != 1) {
     int32_t rc = onLocalMachine(walk, kProbeLocalKey);
@@ -453,6 +526,16 @@ int32_t revertMachines(MachineWalk &walk) {
 int32_t keysOrFailure(const UpgradeContext &context, const UpgradeOptions &options, ProfileKeys &keys,
                       uint32_t function) {
   return loadKeys(context, options, keys) ? 0 : traced(function, kProbeCreateKey, KXL_RC_PROFILE_KEY);
+}
+
+// The walk's operation after a successful force-copy-name upgrade.
+int32_t dropForcedProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptions &options,
+                             uint8_t force) {
+  if (force == 0)
+    return 0;
+  ProfileKeys keys;
+  int32_t rc = keysOrFailure(context, options, keys, KXL_FN_MOVE_INSTANCE_PROFILE);
+  return rc != 0 ? rc : dropForcedKey(machineRoot, keys);
 }
 
 } // namespace
@@ -492,12 +575,24 @@ int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options) 
   pdtEntry(KXL_FN_REVERT_INSTANCE_PROFILE);
   ProfileKeys keys;
   MachineWalk walk(context, options, KXL_FN_REVERT_INSTANCE_PROFILE, revertProfileKey, &keys);
+  walk.keepGoing = true;
   int32_t rc = keysOrFailure(context, options, keys, KXL_FN_REVERT_INSTANCE_PROFILE);
-  if (rc == 0)
+  if (rc == 0) {
     rc = revertMachines(walk);
-  if (rc == 0 && isClustered(context))
-    rc = walkCluster(walk);
+    int32_t clusterRc = isClustered(context) ? walkCluster(walk) : 0;
+    rc = rc != 0 ? rc : clusterRc;
+  }
   walk.release();
   pdtExit(KXL_FN_REVERT_INSTANCE_PROFILE, rc, 0);
+  return rc;
+}
+
+int32_t dropForcedProfileKeys(UpgradeContext &context, UpgradeOptions &options) {
+  pdtEntry(KXL_FN_MOVE_INSTANCE_PROFILE);
+  MachineWalk walk(context, options, KXL_FN_MOVE_INSTANCE_PROFILE, dropForcedProfileKey, nullptr);
+  walk.keepGoing = true;
+  int32_t rc = dropForcedMachines(walk);
+  walk.release();
+  pdtExit(KXL_FN_MOVE_INSTANCE_PROFILE, rc, 0);
   return rc;
 }

@@ -18,8 +18,10 @@ inline constexpr int32_t KXL_RC_MACHINE_REGISTRY = -1913;   // a machine's regis
 inline constexpr int32_t KXL_RC_NO_LOCAL_HOST_NAME = -1042; // put into options.status.sqlcode; result -1
 
 // Moves the profile key on the one machine whose HKEY_LOCAL_MACHINE is
-// `machineRoot`. force 1: the current copy gets the empty force-copy-name key
-// and the old key is deleted without being copied.
+// `machineRoot`. force 1: the current copy gets the empty force-copy-name key;
+// the old key stays until dropForcedProfileKeys, so that a failed upgrade can
+// put the machine's profile values back. A key created for a copy that failed
+// is deleted again.
 int32_t moveProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptions &options, uint8_t force);
 
 // Moves the profile key on every machine of the instance: each partition's
@@ -27,9 +29,15 @@ int32_t moveProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptions
 int32_t moveInstanceProfile(UpgradeContext &context, UpgradeOptions &options);
 
 // The undo of moveProfileKey on one machine: nothing when the old key still
-// exists, otherwise the old key is rebuilt from the current copy's key.
+// exists, otherwise the old key is rebuilt from the current copy's key. force
+// 1: the force-copy-name key is deleted (the old key was never removed).
 int32_t revertProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptions &options, uint8_t force);
 
-// The undo of moveInstanceProfile; also points the instance's services at the
-// owning copy's program again.
+// The undo of moveInstanceProfile, also after a move that failed part way;
+// also points the instance's services at the owning copy's program and name
+// again. Goes on past a machine it cannot reach and returns the first failure.
 int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options);
+
+// After a successful force-copy-name upgrade of a partitioned instance: deletes
+// the old profile key on the machines of the forced partitions.
+int32_t dropForcedProfileKeys(UpgradeContext &context, UpgradeOptions &options);

@@ -481,6 +481,7 @@ int32_t runServicesStep(ServicesStep &step) {
     return rc;
   if ((rc = recreateInstance(step, newNodeType, workstationFlag)) != 0)
     return rc;
+  context.recreatedNodeType = static_cast<uint32_t>(newNodeType);
   sqloGetCurrentInstallationName(step.copyName, sizeof step.copyName);
   if (newNodeType == 4 && step.partitioned())
     return repointPartitions(step);

@@ -526,7 +526,7 @@ int32_t sqloopenp(const char *path, uint32_t flags, uint32_t mode, SQLO_FHANDLE 
 int32_t sqloread(SQLO_FHANDLE handle, void *buffer, uint32_t size, uint32_t *bytesRead);
 int32_t sqlowrite(SQLO_FHANDLE handle, const void *buffer, uint32_t size, uint32_t *bytesWritten);
 int32_t sqloclose(SQLO_FHANDLE handle);
-// Copies one file over the target. SQLO_RC_FILE_NOT_FOUND when the source is missing,
+// Copies one file over the target. SQLO_RC_FILE_NOT_FOUND_W when the source is missing,
 // SQLO_RC_PATH_NOT_FOUND when the source's directory is missing; missing directories
 // of the target are created.
 int32_t sqlocopy(const char *source, const char *target, uint32_t flags);

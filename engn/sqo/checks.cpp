@@ -23,6 +23,7 @@ constexpr uint32_t kDirectorySize = 255;
 // Program path, six fixed words, the log path and the quoted directory, each
 // bounded by a path buffer: the block never has to be cut.
 constexpr std::size_t kArgBlockSize = 4 * SQLO_PATH_SZ + 64;
+constexpr uint32_t kMaxDataSources = 65536; // more than any machine's ODBC list
 constexpr int kCheckWarning = 1225;
 constexpr char kCheckToolName[] = "kxlckupgrade";
 constexpr char kDriverText[] = "ZAV KXL ODBC DRIVER";
@@ -143,6 +144,54 @@ template <typename Function> Function boundEntry(HMODULE module, const char *nam
   return reinterpret_cast<Function>(reinterpret_cast<void (*)()>(entry));
 }
 
+bool fetched(SQLRETURN rc) {
+  return rc == SQL_SUCCESS || rc == SQL_SUCCESS_WITH_INFO;
+}
+
+// Fetches one data source; a description is only ever read once fetched.
+SQLRETURN fetchSource(PFN_SQLDataSources dataSources, SQLHENV environment, SQLUSMALLINT direction,
+                      SQLCHAR (&description)[256]) {
+  SQLCHAR name[256] = {};
+  SQLSMALLINT nameLength = 0, descriptionLength = 0;
+  SQLRETURN rc = dataSources(environment, direction, name, sizeof name, &nameLength, description,
+                             sizeof description, &descriptionLength);
+  description[sizeof description - 1] = 0;
+  return rc;
+}
+
+// Walks the data sources until one uses the driver. Any answer but success
+// ends the walk, and so does a list longer than any machine keeps, so that a
+// driver manager answering something unexpected never keeps the run from
+// ending. `outcome` as findOdbcDataSources reports it; an unexpected answer
+// to the first fetch counts as an error.
+bool scanDataSources(PFN_SQLAllocEnv allocEnv, PFN_SQLDataSources dataSources, const char *driverText,
+                     int32_t &outcome) {
+  SQLHENV environment = nullptr;
+  if (!fetched(allocEnv(&environment)) || environment == nullptr) {
+    outcome = SQL_ERROR;
+    return false;
+  }
+  SQLCHAR description[256] = {};
+  SQLRETURN rc = fetchSource(dataSources, environment, SQL_FETCH_FIRST, description);
+  if (!fetched(rc)) {
+    outcome = rc == SQL_NO_DATA || rc == SQL_INVALID_HANDLE ? rc : SQL_ERROR;
+    return false;
+  }
+  outcome = rc;
+  if (describesProductDriver(description, driverText))
+    return true;
+  outcome = 0;
+  for (uint32_t fetches = 1; fetches < kMaxDataSources; ++fetches) {
+    if (!fetched(fetchSource(dataSources, environment, SQL_FETCH_NEXT, description)))
+      return false;
+    if (describesProductDriver(description, driverText)) {
+      outcome = 1;
+      return true;
+    }
+  }
+  return false;
+}
+
 } // namespace
 
 int checkLocalAdmin(sqlca *status) {
@@ -193,31 +242,12 @@ bool findOdbcDataSources(const char *copyName, int32_t *status) {
   auto allocEnv = odbc != nullptr ? boundEntry<PFN_SQLAllocEnv>(odbc, "SQLAllocEnv") : nullptr;
   auto dataSources = odbc != nullptr ? boundEntry<PFN_SQLDataSources>(odbc, "SQLDataSources") : nullptr;
   if (allocEnv != nullptr && dataSources != nullptr) {
-    SQLHENV environment = nullptr;
-    allocEnv(&environment);
     char driverText[SQLO_PATH_SZ];
     if (copyName != nullptr)
       ossSnprintf(driverText, sizeof driverText, "%s - %s", kDriverText, copyName);
     else
       copyText(driverText, sizeof driverText, kDriverText);
-    SQLCHAR name[256], description[256];
-    SQLSMALLINT nameLength = 0, descriptionLength = 0;
-    SQLRETURN rc = dataSources(environment, SQL_FETCH_FIRST, name, sizeof name, &nameLength, description,
-                               sizeof description, &descriptionLength);
-    outcome = rc;
-    if (rc != SQL_ERROR && rc != SQL_INVALID_HANDLE && rc != SQL_NO_DATA) {
-      found = describesProductDriver(description, driverText);
-      while (!found) {
-        rc = dataSources(environment, SQL_FETCH_NEXT, name, sizeof name, &nameLength, description,
-                         sizeof description, &descriptionLength);
-        if (rc == SQL_NO_DATA || rc == SQL_ERROR || rc == SQL_INVALID_HANDLE) {
-          outcome = 0;
-          break;
-        }
-        found = describesProductDriver(description, driverText);
-        outcome = found ? 1 : 0;
-      }
-    }
+    found = scanDataSources(allocEnv, dataSources, driverText, outcome);
   }
   if (status != nullptr)
     *status = outcome;

@@ -82,6 +82,11 @@ struct PartitionRecord {
   int32_t extraMessage;         // further message number, written by the instance creation
 };
 
+// What the upgrade engine's undo achieved after a failed upgrade.
+inline constexpr uint8_t UPGRADE_UNDO_NOTHING = 0;    // no failure, or nothing had been changed
+inline constexpr uint8_t UPGRADE_UNDO_COMPLETE = 1;   // every change was put back
+inline constexpr uint8_t UPGRADE_UNDO_INCOMPLETE = 2; // not everything; the backup is kept in keptBackupDir
+
 struct UpgradeOptions {
   char authTypeName[UPGRADE_AUTH_NAME_SZ];
   uint16_t authType; // valid only with UPGRADE_FLAG_AUTH_TYPE
@@ -100,4 +105,6 @@ struct UpgradeOptions {
   uint8_t tokenCount; // valid entries of tokens, 0..2
   const char *tokens[UPGRADE_MAX_TOKENS];
   char programName[UPGRADE_PROGRAM_NAME_SZ];
+  uint8_t undoOutcome;                 // UPGRADE_UNDO_*, written by the upgrade engine
+  char keptBackupDir[UPGRADE_PATH_SZ]; // the instance directory's backup, when it is kept
 };

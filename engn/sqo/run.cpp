@@ -30,6 +30,8 @@ constexpr int kSuccessMessage = 1000;
 constexpr int kTextSearchWarning = 1273;
 constexpr int kOdbcNotice = 1917;
 constexpr int kLegacyWarning = 1392;
+constexpr int kUndoCompleteNotice = 1971;
+constexpr int kUndoIncompleteMessage = -1972;
 
 constexpr uint32_t kAuditAdminCategory = 0x80000000u;
 constexpr uint32_t kAuditAdminEvent = 53;
@@ -262,6 +264,19 @@ void printSuccess(const UpgradeOptions &options, const RunState &state) {
     printInstanceMessage(kLegacyName, options.partitionRecord.extraMessage, "processing completed", nullptr);
 }
 
+// After a failed upgrade: whether the instance was put back, and when not,
+// where the backup of its directory is kept.
+void printUndoOutcome(const UpgradeOptions &options) {
+  if (options.undoOutcome == UPGRADE_UNDO_COMPLETE) {
+    printInstanceMessage(kLegacyName, kUndoCompleteNotice, "processing complete", nullptr);
+  } else if (options.undoOutcome == UPGRADE_UNDO_INCOMPLETE) {
+    UpgradeOptions record{};
+    record.tokenCount = 1;
+    record.tokens[0] = options.keptBackupDir;
+    printInstanceMessage(kLegacyName, kUndoIncompleteMessage, "processing complete", &record);
+  }
+}
+
 void printFinalMessage(int rc, const UpgradeOptions &options, const RunState &state,
                        const char *savedInstance) {
   if (options.quiet)
@@ -276,6 +291,8 @@ void printFinalMessage(int rc, const UpgradeOptions &options, const RunState &st
     printSuccess(options, state);
   else
     printInstanceMessage(kLegacyName, rc, "processing complete", &options);
+  if (rc != 0)
+    printUndoOutcome(options);
 }
 
 // Logs one audit event; false (and the run's result from the status block)
@@ -312,8 +329,17 @@ int auditFailureResult(int runRc, const UpgradeOptions &options) {
   return 0;
 }
 
-// The audit record of the upgraded instance. A failed run is audited as a
-// failure even when its reason never reached the status block.
+// The code an audit event carries: the status block's for a success or for a
+// result the block explains (-1), else the result the run ended with.
+int32_t auditedCode(int rc, const UpgradeOptions &options) {
+  int32_t blockCode = sqlcaCode(options.status);
+  if (rc == 0 || (rc == UPGRADE_RC_SQLCA && blockCode != 0))
+    return blockCode;
+  return rc;
+}
+
+// The audit record of the upgraded instance. Every run that did not upgrade
+// it, a refusal with a positive code included, is audited as a failure.
 int auditInstance(int rc, UpgradeOptions &options, const RunState &state, const char *savedInstance) {
   if (sqlosins(state.auditInstance) != 0)
     return rc;
@@ -324,8 +350,8 @@ int auditInstance(int rc, UpgradeOptions &options, const RunState &state, const 
     sqlzRcToSqlca(0, &options.status, kToolName, settingsRc, 0, 0);
     rc = auditFailureResult(rc, options);
   } else if (settings.active) {
-    int32_t sqlcode = sqlcaCode(options.status) != 0 ? sqlcaCode(options.status) : (rc < 0 ? rc : 0);
-    uint64_t outcome = sqlcode < 0 ? kAuditFailure : kAuditSuccess;
+    int32_t sqlcode = auditedCode(rc, options);
+    uint64_t outcome = rc != 0 || sqlcode < 0 ? kAuditFailure : kAuditSuccess;
     bool logged = true;
     if (settings.classMask1 & outcome)
       logged =

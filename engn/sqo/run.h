@@ -45,6 +45,11 @@ public:
   char var159Tail[UPGRADE_VAR159_SZ] = {};
   SQLO_NODELIST *nodeList = nullptr; // std::malloc'ed by the platform, owned
   int32_t serviceStartType = UPGRADE_NO_SERVICE_STATE;
+  // The node type the services step re-created the instance with under the
+  // current copy; 0 while it has not been re-created. The driver's undo drops
+  // a re-created instance again; the profile undo then knows that the
+  // services were re-pointed.
+  uint32_t recreatedNodeType = 0;
 };
 
 // The upgrade driver the run hands the bound instance to. The entry point

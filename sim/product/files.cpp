@@ -244,8 +244,10 @@ int32_t sqlocopy(const char *source, const char *target, uint32_t flags) {
   std::string from = unquotedPath(source);
   std::string to = unquotedPath(target);
   DWORD attributes = GetFileAttributesA(from.c_str());
+  // A missing file is reported as the warning callers tolerate as "missing".
   if (attributes == INVALID_FILE_ATTRIBUTES)
-    return missingPathCode(from);
+    return missingPathCode(from) == SQLO_RC_FILE_NOT_FOUND ? SQLO_RC_FILE_NOT_FOUND_W
+                                                           : SQLO_RC_PATH_NOT_FOUND;
   if (attributes & FILE_ATTRIBUTE_DIRECTORY)
     return SQLO_RC_ACCESS_DENIED;
   // A missing target directory is made, so that a file being carried over is

@@ -1,6 +1,7 @@
 // Every way the upgrade driver can fail, driven through the installed command:
-// the result and trace point, the registry profile back under the old copy,
-// and the instance directory as it was before the run.
+// the result and trace point, the machine as it was before the run (registry
+// of every machine and files, apart from the logs), what the final message
+// says about it, and a plain rerun that then upgrades the instance.
 #include "driver_fixture.h"
 
 #include "sim/kxlsim/world_reader.h"
@@ -20,12 +21,26 @@ bool hasBackup(const std::vector<std::string> &entries) {
                      [](const std::string &name) { return name.rfind("KXL", 0) == 0; });
 }
 
+// The partitions' services run under this account already: a failure after
+// they were re-pointed with it leaves them as they were.
+const std::vector<std::string> kPartitioned = {"-u", ".\\kxlsvc,secret", "INST2"};
+constexpr const char *kRestoredNotice = "KXL1971I";
+constexpr const char *kNotRestored = "KXL1972E";
+
+std::vector<std::string> withArgs(std::initializer_list<const char *> first,
+                                  const std::vector<std::string> &rest) {
+  std::vector<std::string> args(first.begin(), first.end());
+  args.insert(args.end(), rest.begin(), rest.end());
+  return args;
+}
+
 class DriverFailureTest : public DriverTest {
 protected:
   void SetUp() override {
     DriverTest::SetUp();
     before = tree(kOldInstanceDir);
     ASSERT_FALSE(before.empty());
+    keepWorld();
   }
 
   // The driver failed once, at `probe`, with `rc`, and returned it.
@@ -37,13 +52,21 @@ protected:
     EXPECT_EQ(outcome.driverResult, rc);
   }
 
-  // What every failure leaves: the profile under the old copy only, the old
-  // instance directory as before, no backup directory.
+  // What every failure leaves: the world as it was kept before the run (the
+  // instance registered under the old copy, its profile there on every
+  // machine, its services and directory as they were), no backup directory.
   void expectUndone() {
-    EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
-    EXPECT_FALSE(keyExists(profileKey("KXL101", "INST1")));
-    EXPECT_EQ(treeDifferences(before, tree(kOldInstanceDir)), "");
+    EXPECT_EQ(worldChanges(), "");
     EXPECT_FALSE(hasBackup(tempEntries()));
+  }
+
+  // The same command without a fault upgrades the instance.
+  void expectRerunUpgrades(const std::vector<std::string> &args, const std::string &instance = "INST1") {
+    Outcome again = run(args);
+    EXPECT_EQ(again.exitCode, 0) << again.out << again.err << again.trace;
+    EXPECT_TRUE(again.failures.empty()) << again.trace;
+    EXPECT_EQ(stringValue("SOFTWARE\\ZAV\\KXLSIM\\Instances\\" + instance, "Copy"), "KXL101");
+    EXPECT_TRUE(keyExists(profileKey("KXL101", instance)));
   }
 
   Tree before;
@@ -51,6 +74,7 @@ protected:
 
 TEST_F(DriverFailureTest, ActiveInstanceIsRefusedBeforeAnythingIsCopied) {
   world.setDword(kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1", "State", 4);
+  keepWorld();
   std::vector<std::string> tempBefore = tempEntries();
   // Installer mode skips the database check, which would refuse it first.
   Outcome outcome = run({"-install", "INST1"});
@@ -59,6 +83,7 @@ TEST_F(DriverFailureTest, ActiveInstanceIsRefusedBeforeAnythingIsCopied) {
   EXPECT_EQ(tempEntries(), tempBefore);
   EXPECT_FALSE(exists(kNewInstanceDir));
   expectUndone();
+  EXPECT_EQ(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
 }
 
 TEST_F(DriverFailureTest, BackupFailuresEndWith1969AndLeaveNoDirectory) {
@@ -71,10 +96,10 @@ TEST_F(DriverFailureTest, BackupFailuresEndWith1969AndLeaveNoDirectory) {
     SCOPED_TRACE(c.fault);
     Outcome outcome = run({"INST1"}, c.fault);
     expectFailure(outcome, c.probe, -1969);
-    EXPECT_FALSE(exists(kNewInstanceDir));
     expectUndone();
+    EXPECT_EQ(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
   }
-  EXPECT_EQ(run({"INST1"}).driverResult, 0);
+  expectRerunUpgrades({"INST1"});
 }
 
 // An in-place upgrade re-creates the instance in its own directory: an
@@ -89,54 +114,148 @@ TEST_F(DriverFailureTest, InPlaceUpgradeWithAFailedListingChangesNothing) {
 
 TEST_F(DriverFailureTest, ProfilePathWithTheInstanceAlreadyThereChangesNothing) {
   world.writeText("C:\\Profiles\\INST1\\keep.txt", "someone else's\n");
-  Tree profileBefore = tree("C:\\Profiles");
+  keepWorld();
   Outcome outcome = run({"-p", "C:\\Profiles", "INST1"});
   expectFailure(outcome, 70, -1959);
-  EXPECT_EQ(treeDifferences(profileBefore, tree("C:\\Profiles")), "");
-  EXPECT_FALSE(exists(kNewInstanceDir));
   expectUndone();
+  removeTree("C:\\Profiles\\INST1");
+  expectRerunUpgrades({"-p", "C:\\Profiles", "INST1"});
 }
 
-TEST_F(DriverFailureTest, CopyToTheNewProfilePathFailing) {
+// Faults from the copy to the new profile path on, for the single-partition
+// and the partitioned instance, in place and under a new profile path: each
+// is undone completely, the message says so, and the same command then works.
+TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
+  struct Case {
+    std::vector<std::string> args;
+    const char *fault;
+    long long probe;
+    long long rc; // 0: any negative result
+  } cases[] = {
+      {{"INST1"}, "sqlocopydir:2", 60, -1969},
+      {{"INST1"}, "sqloQueryNTServiceConfig:1", 90, -1925},
+      {{"INST1"}, "sqlo_instance_create_extended:1", 90, 0},
+      {{"-install", "INST1"}, "sqloexec2:1", 95, kExecFailed},
+      {{"-install", "INST1"}, "sqloexec2:2", 97, kExecFailed},
+      {{"INST1"}, "sqleInitApplicationEnvironment:1", 120, 0},
+      {{"-a", "SERVER", "INST1"}, "sqlfusys:1", 140, -1},
+      {{"INST1"}, "sqlocopydir:3", 190, 0},
+      {{"-p", kOldCopy, "INST1"}, "sqleInitApplicationEnvironment:1", 120, 0},
+      {{"-p", "C:\\Profiles", "INST1"}, "sqleInitApplicationEnvironment:1", 120, 0},
+      {{"-p", "C:\\Profiles", "INST1"}, "sqlocopydir:2", 60, -1969},
+      {kPartitioned, "sqleInitApplicationEnvironment:1", 120, 0},
+      {withArgs({"-forcecn"}, kPartitioned), "sqleInitApplicationEnvironment:1", 120, 0},
+      {withArgs({"-forcecn"}, kPartitioned), "sqlo_instance_addnode:1", 90, 0},
+  };
+  for (const Case &c : cases) {
+    SCOPED_TRACE(std::string(c.fault) + " " + c.args.front() + " " + c.args.back());
+    resetWorld();
+    world.makeDirectory("C:\\Profiles");
+    keepWorld();
+    Outcome outcome = run(c.args, c.fault);
+    ASSERT_TRUE(outcome.driverRan) << outcome.out << outcome.err;
+    ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+    EXPECT_EQ(outcome.failures[0].probe, c.probe);
+    if (c.rc != 0) {
+      EXPECT_EQ(outcome.driverResult, c.rc);
+    }
+    EXPECT_LT(outcome.driverResult, 0);
+    expectUndone();
+    EXPECT_NE(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
+    EXPECT_EQ(outcome.out.find(kNotRestored), std::string::npos) << outcome.out;
+    expectRerunUpgrades(c.args, c.args.back());
+  }
+}
+
+TEST_F(DriverFailureTest, NewProfilePathThatExistedStaysAndTheCopyGoes) {
   world.makeDirectory("C:\\Profiles");
-  Outcome outcome = run({"-p", "C:\\Profiles", "INST1"}, "sqlocopydir:2");
-  expectFailure(outcome, 60, -1969);
-  expectUndone();
-}
-
-TEST_F(DriverFailureTest, ServicesStepFailingMovesTheProfileBackAndRestoresTheDirectory) {
-  world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg", "audit.active=1\n");
-  before = tree(kOldInstanceDir);
-  Outcome outcome = run({"INST1"}, "sqloQueryNTServiceConfig:1");
-  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
-  EXPECT_EQ(outcome.failures[0].probe, 90);
-  EXPECT_LT(outcome.driverResult, 0);
-  expectUndone();
-}
-
-TEST_F(DriverFailureTest, FailedAuditToolLeavesTheAuditCopy) {
-  // Installer mode: the database check tool does not run, so the audit tool
-  // is the first program the run starts.
-  Outcome outcome = run({"-install", "INST1"}, "sqloexec2:1");
-  expectFailure(outcome, 95, kExecFailed);
-  EXPECT_TRUE(exists(std::string(kNewInstanceDir) + "\\security\\kxlauditcopy.cfg"));
-  expectUndone();
-}
-
-TEST_F(DriverFailureTest, FailedSslToolRun) {
-  Outcome outcome = run({"-install", "INST1"}, "sqloexec2:2");
-  expectFailure(outcome, 97, kExecFailed);
-  EXPECT_FALSE(exists(std::string(kNewInstanceDir) + "\\security\\kxlauditcopy.cfg"));
-  expectUndone();
-}
-
-TEST_F(DriverFailureTest, ApplicationEnvironmentFailing) {
-  Outcome outcome = run({"INST1"}, "sqleInitApplicationEnvironment:1");
+  world.writeText("C:\\Profiles\\other\\keep.txt", "someone else's\n");
+  keepWorld();
+  Outcome outcome = run({"-p", "C:\\Profiles", "INST1"}, "sqleInitApplicationEnvironment:1");
   ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
   EXPECT_EQ(outcome.failures[0].probe, 120);
-  EXPECT_EQ(outcome.failures[0].rc, outcome.driverResult);
-  EXPECT_NE(outcome.driverResult, 0);
   expectUndone();
+  EXPECT_TRUE(exists("C:\\Profiles\\other\\keep.txt"));
+  expectRerunUpgrades({"-p", "C:\\Profiles", "INST1"});
+}
+
+// A move that fails on the second machine: the first one gets its key back.
+TEST_F(DriverFailureTest, PartialProfileMoveIsRevertedMachineByMachine) {
+  std::vector<std::string> args = kPartitioned;
+  Outcome outcome = run(args, "sqloPRegMachineOpen:2");
+  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+  EXPECT_EQ(outcome.failures[0].probe, 80);
+  EXPECT_EQ(outcome.driverResult, -1913);
+  expectUndone();
+  EXPECT_NE(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
+  expectRerunUpgrades(args, "INST2");
+}
+
+TEST_F(DriverFailureTest, ForceCopyNameKeepsTheOtherMachinesProfileValues) {
+  const std::string remoteProfile =
+      "SOFTWARE\\ZAV\\KXLSIM\\Machines\\WINSRV2\\" + profileKey("KXL95", "INST2");
+  ASSERT_EQ(stringValue(remoteProfile, "KXLPORTRANGE"), "60000:60003");
+  std::vector<std::string> args = withArgs({"-forcecn"}, kPartitioned);
+  Outcome outcome = run(args, "sqlocopydir:3");
+  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+  EXPECT_EQ(outcome.failures[0].probe, 190);
+  expectUndone();
+  EXPECT_EQ(stringValue(remoteProfile, "KXLPORTRANGE"), "60000:60003");
+  expectRerunUpgrades(args, "INST2");
+  // Only a successful upgrade drops the old key of the forced machine.
+  EXPECT_FALSE(keyExists(remoteProfile));
+}
+
+// A node list that cannot be had is refused before anything is touched, and
+// once the file is repaired the same command upgrades the instance.
+TEST_F(DriverFailureTest, PartitionedInstanceWithoutAReadableNodeListIsRefused) {
+  const std::string nodesFile = std::string(kOldCopy) + "\\INST2\\kxlnodes.cfg";
+  const std::string good = fileContent(nodesFile);
+  ASSERT_FALSE(good.empty());
+  std::vector<std::string> args = kPartitioned;
+  struct Case {
+    const char *what;
+    const char *content; // null: no file
+  } cases[] = {{"missing", nullptr},
+               {"empty", ""},
+               {"node listed twice", "0 winsrv1.zav.test WINSRV1 0\r\n"
+                                     "0 winsrv1.zav.test WINSRV1 0\r\n"}};
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.what);
+    resetWorld();
+    if (c.content == nullptr)
+      removeTree(nodesFile);
+    else
+      world.writeText(nodesFile, c.content);
+    keepWorld();
+    Outcome outcome = run(args);
+    ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+    EXPECT_EQ(outcome.failures[0].probe, 11);
+    EXPECT_EQ(outcome.driverResult, -1960);
+    EXPECT_NE(outcome.out.find("KXL1960E  The partitioned instance \"INST2\" cannot be upgraded"),
+              std::string::npos)
+        << outcome.out;
+    EXPECT_EQ(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
+    expectUndone();
+    world.writeText(nodesFile, good);
+    expectRerunUpgrades(args, "INST2");
+  }
+}
+
+// The message never claims a restore that failed: it names the backup, which
+// is kept with the instance's files.
+TEST_F(DriverFailureTest, FailedRestoreKeepsTheBackupAndSaysWhere) {
+  Outcome outcome = run({"-p", kOldCopy, "INST1"}, "sqleInitApplicationEnvironment:1,sqlocopydir:2");
+  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+  EXPECT_EQ(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
+  std::size_t at =
+      outcome.out.find(std::string(kNotRestored) + "  The instance could not be restored completely.");
+  ASSERT_NE(at, std::string::npos) << outcome.out;
+  std::size_t open = outcome.out.find("\"C:\\windows\\temp\\KXL", at);
+  ASSERT_NE(open, std::string::npos) << outcome.out;
+  std::string backup = outcome.out.substr(open + 1, outcome.out.find('"', open + 1) - open - 1);
+  EXPECT_EQ(treeDifferences(before, tree(backup)), "");
+  expectRerunUpgrades({"-p", kOldCopy, "INST1"});
 }
 
 TEST_F(DriverFailureTest, ConfigurationConversionFailureIs1947) {
@@ -145,44 +264,38 @@ TEST_F(DriverFailureTest, ConfigurationConversionFailureIs1947) {
   ASSERT_TRUE(kxlsim::readFileHead(std::string(kOldInstanceDir) + "\\kxlsystm", 1 << 20, image));
   image[0] ^= 0xFF;
   world.writeFile(std::string(kOldInstanceDir) + "\\kxlsystm", image);
-  before = tree(kOldInstanceDir);
+  keepWorld();
   Outcome outcome = run({"INST1"});
   expectFailure(outcome, 130, -1947);
   expectUndone();
-}
-
-TEST_F(DriverFailureTest, AuthenticationTypeNotSetIsMinusOne) {
-  Outcome outcome = run({"-a", "SERVER", "INST1"}, "sqlfusys:1");
-  expectFailure(outcome, 140, -1);
-  expectUndone();
+  EXPECT_EQ(outcome.out, "KXL1947E  The database manager configuration of the instance could not be "
+                         "upgraded.\n"
+                         "KXL1971I  The instance was restored as it was before the command ran.\n");
+  image[0] ^= 0xFF;
+  world.writeFile(std::string(kOldInstanceDir) + "\\kxlsystm", image);
+  expectRerunUpgrades({"INST1"});
 }
 
 TEST_F(DriverFailureTest, CarriedFileThatCannotBeCopiedEndsWithItsCode) {
   // A folder where the file should be cannot be copied as a file.
   removeTree(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
   world.makeDirectory(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
-  before = tree(kOldInstanceDir);
+  keepWorld();
   Outcome outcome = run({"INST1"});
   expectFailure(outcome, 170, kAccessDenied);
   expectUndone();
+  removeTree(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
+  expectRerunUpgrades({"INST1"});
 }
 
 TEST_F(DriverFailureTest, MissingFunctionDirectoryFailsTheCopy) {
   removeTree(std::string(kOldCopy) + "\\function");
-  before = tree(kOldInstanceDir);
+  keepWorld();
   Outcome outcome = run({"INST1"});
   expectFailure(outcome, 190, kPathNotFound);
   expectUndone();
-}
-
-TEST_F(DriverFailureTest, InstanceRecreatedInPlaceIsRestoredFromTheBackup) {
-  // With the profile path unchanged the instance is re-created in its own
-  // directory; a later failure puts the old files back.
-  Outcome outcome = run({"-p", kOldCopy, "INST1"}, "sqleInitApplicationEnvironment:1");
-  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
-  EXPECT_EQ(outcome.failures[0].probe, 120);
-  EXPECT_LT(outcome.driverResult, 0);
-  expectUndone();
+  world.writeText(std::string(kOldCopy) + "\\function\\kxludf.dll", "MZ\r\n");
+  expectRerunUpgrades({"INST1"});
 }
 
 // A clustered instance on a machine without the cluster modules: the cluster

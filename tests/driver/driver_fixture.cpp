@@ -1,5 +1,6 @@
 #include "driver_fixture.h"
 
+#include "sim/kxlsim/diff.h"
 #include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/world_reader.h"
 #include "tests/support/command_run.h"
@@ -82,7 +83,12 @@ void DriverTest::SetUp() {
   ASSERT_FALSE(dir.empty());
   temp_ = dir.string();
   root_ = (dir / "world").string();
+  resetWorld();
+}
+
+void DriverTest::resetWorld() {
   std::error_code failure;
+  fs::remove_all(root_, failure);
   fs::copy(DemoWorld::built / "world", root_, fs::copy_options::recursive, failure);
   ASSERT_FALSE(failure) << failure.message();
   std::string reason;
@@ -125,6 +131,34 @@ Outcome DriverTest::run(const std::vector<std::string> &args, const std::string 
   return outcome;
 }
 
+void DriverTest::keepWorld() {
+  kept_ = temp_ + "/kept" + std::to_string(runs_);
+  std::error_code failure;
+  fs::remove_all(kept_, failure);
+  fs::copy(root_, kept_, fs::copy_options::recursive, failure);
+  ASSERT_FALSE(failure) << failure.message();
+}
+
+std::string DriverTest::worldChanges() const {
+  static const char *const kIgnored[] = {"events.jsonl", "kxldiag.log", "C:\\KXLDBMIG.TXT",
+                                         "C:\\upgrade.log"};
+  std::ostringstream diff;
+  kxlsim::diffWorlds(kept_, root_, diff);
+  std::istringstream lines(diff.str());
+  std::string changes;
+  bool skipping = false;
+  for (std::string line; std::getline(lines, line);) {
+    if (line.rfind("  ", 0) != 0) {
+      skipping = false;
+      for (const char *ignored : kIgnored)
+        skipping = skipping || line.find(std::string(" ") + ignored + " ") != std::string::npos;
+    }
+    if (!skipping)
+      changes += line + "\n";
+  }
+  return changes;
+}
+
 std::string DriverTest::hostPath(const std::string &windowsPath) const {
   return kxltestsupport::drivePath(root_, windowsPath);
 }
@@ -146,6 +180,10 @@ bool DriverTest::exists(const std::string &windowsPath) const {
 
 std::string DriverTest::fileContent(const std::string &windowsPath) const {
   return readHostFile(hostPath(windowsPath));
+}
+
+std::string DriverTest::diagnosticLog() const {
+  return readHostFile(root_ + "/kxldiag.log");
 }
 
 void DriverTest::removeTree(const std::string &windowsPath) const {

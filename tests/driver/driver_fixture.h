@@ -51,8 +51,19 @@ protected:
   // The whole content of a file ("" when it cannot be read).
   std::string fileContent(const std::string &windowsPath) const;
   void removeTree(const std::string &windowsPath) const;
+  // The world's diagnostic log ("" when there is none).
+  std::string diagnosticLog() const;
   // Entries of the world's temporary directory.
   std::vector<std::string> tempEntries() const;
+
+  // The demo world afresh.
+  void resetWorld();
+  // Keeps a copy of the world as it is now, for worldChanges.
+  void keepWorld();
+  // What differs between the kept world and the world now, as `kxlsim diff`
+  // shows it, without the logs and the database check tool's files in the
+  // current directory ("" when nothing else differs).
+  std::string worldChanges() const;
 
   // Registry of the local machine.
   bool keyExists(const std::string &key) const;
@@ -64,6 +75,7 @@ protected:
 private:
   std::string temp_;
   std::string root_;
+  std::string kept_;
   int runs_ = 0;
 };
 

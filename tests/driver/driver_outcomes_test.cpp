@@ -61,6 +61,43 @@ TEST_F(DriverOutcomeTest, CopyWithoutProductsNamesTypeZero) {
   expectEditionMismatch(outcome, 17, "type STANDALONE cannot");
 }
 
+// A refusal is a run that did not upgrade: audited as a failure with its code,
+// in the instance's own audit settings (only failures are recorded here).
+TEST_F(DriverOutcomeTest, RefusedUpgradeIsAuditedAsAFailureWithItsCode) {
+  world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
+                  "active = yes\nadmin = failure\ninstance = failure\n");
+  setProducts({"cli", "zqc"});
+  Outcome refused = run({"INST1"});
+  ASSERT_EQ(refused.driverResult, 1231) << refused.out;
+  std::vector<std::string> audits;
+  for (const std::string &event : refused.events)
+    if (event.find("\"event\":\"audit\"") != std::string::npos)
+      audits.push_back(event);
+  ASSERT_EQ(audits.size(), 2u) << refused.out;
+  for (const std::string &audit : audits)
+    EXPECT_NE(audit.find("\"sqlcode\":\"1231\""), std::string::npos) << audit;
+}
+
+// A driver manager that answers something unexpected to every call cannot
+// keep the run from ending: the upgrade is reported and the answer logged.
+TEST_F(DriverOutcomeTest, OdbcScanEndsWhateverTheDriverManagerAnswers) {
+  const std::string answers = "SOFTWARE\\ZAV\\KXLSIM\\Odbc";
+  struct Case {
+    const char *function;
+    DWORD answer;
+  } cases[] = {{"SQLDataSources", 5}, {"SQLDataSources", 2}, {"SQLAllocEnv", 5}, {"SQLAllocEnv", 0xFFFFFFFE}};
+  for (const Case &c : cases) {
+    SCOPED_TRACE(std::string(c.function) + " " + std::to_string(c.answer));
+    resetWorld();
+    kxlsim::addOdbcDataSource(world, kxlsim::localMachine(), "Sales", "ZAV KXL ODBC DRIVER - KXL95");
+    world.setDword(kxlsim::localMachine(), answers, c.function, c.answer);
+    Outcome outcome = run({"INST1"});
+    EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
+    EXPECT_EQ(outcome.out, "KXL1000I  KXLIUPGRADE finished: the instance now belongs to this copy.\n");
+    EXPECT_NE(diagnosticLog().find("ODBC data sources could not be listed"), std::string::npos);
+  }
+}
+
 TEST_F(DriverOutcomeTest, PartitionedInstanceNeedsAPartitionedEdition) {
   setProducts({}, "tlv", "{6E1C2A45-9F3B-4D21-8A10-5B2C7D0E9A01}");
   Outcome outcome = run({"-install", "-u", "KXLADMIN,secret", "INST2"});
@@ -159,15 +196,6 @@ TEST_F(DriverOutcomeTest, QuotedProfilePathKeepsItsQuotes) {
   EXPECT_FALSE(exists("C:\\Quoted Profiles\\INST1\\security\\kxlauditcopy.cfg"));
   EXPECT_TRUE(exists("C:\\Quoted Profiles\\INST1\\security\\kxlaudit.cfg"));
   EXPECT_FALSE(exists(kNewInstanceDir));
-}
-
-TEST_F(DriverOutcomeTest, CopyToTheNewProfilePathStaysAfterALaterFailure) {
-  world.makeDirectory("C:\\Profiles");
-  Outcome outcome = run({"-p", "C:\\Profiles", "INST1"}, "sqleInitApplicationEnvironment:1");
-  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
-  EXPECT_EQ(outcome.failures[0].probe, 120);
-  EXPECT_TRUE(exists("C:\\Profiles\\INST1\\kxlsystm"));
-  EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
 }
 
 } // namespace

@@ -64,7 +64,7 @@ TEST_F(Files, CopyReplacesTheTargetAndNamesWhatIsMissing) {
   EXPECT_EQ(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\a.txt", 0));
   EXPECT_EQ("new", readFile("C:\\dst\\a.txt"));
 
-  EXPECT_EQ(int32_t(0x860F000Au), sqlocopy("C:\\src\\missing.txt", "C:\\dst\\b.txt", 0));
+  EXPECT_EQ(int32_t(0x870F000Au), sqlocopy("C:\\src\\missing.txt", "C:\\dst\\b.txt", 0));
   EXPECT_EQ(int32_t(0x870F0011u), sqlocopy("C:\\src\\cfg\\missing.txt", "C:\\dst\\b.txt", 0));
   EXPECT_FALSE(exists("C:\\dst\\b.txt"));
 

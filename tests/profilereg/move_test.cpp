@@ -22,16 +22,13 @@ TEST_F(MoveProfile, InstanceOfTheCurrentCopyStaysWhereItIs) {
   expectProfileAt(kLocal, kCurrent);
 }
 
-TEST_F(MoveProfile, FailedCopyKeepsOldKeyAndLeavesNewKeyEmpty) {
+TEST_F(MoveProfile, FailedCopyKeepsOldKeyAndDropsTheKeyItCreated) {
   ownBy(kOld);
   seedProfile(kLocal, kOld);
   startTrace();
   failCalls("SHCopyKeyA:1");
   EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
-  expectProfileAt(kLocal, kOld);
-  EXPECT_TRUE(keyExists(profile(kCurrent)));
-  EXPECT_EQ("<missing>", getString(profile(kCurrent), "KXLMARK"));
-  EXPECT_FALSE(keyExists(profile(kCurrent) + "\\Node0"));
+  expectUntouched(kLocal, kOld, kCurrent);
   std::string trace = traceText();
   EXPECT_NE(std::string::npos, trace.find("error 0x18780506 probe=110 rc=-1918"));
   EXPECT_NE(std::string::npos, trace.find("error 0x18780506 probe=30 rc=-1918"));
@@ -76,11 +73,16 @@ TEST_F(MoveProfile, ForceCopyNameGivesOtherHostsAnEmptyPlaceholder) {
   EXPECT_EQ(0, moveInstanceProfile(context_, options_));
   expectMoved(kLocal, kOld, kCurrent);
   EXPECT_FALSE(keyExists(forceProfile()));
-  EXPECT_FALSE(keyExists(at("M2", profile(kOld))));
-  EXPECT_FALSE(keyExists(at("M2", profile(kCurrent))));
+  // The other host keeps its old key until the whole upgrade has succeeded.
+  expectUntouched("M2", kOld, kCurrent);
   EXPECT_TRUE(keyExists(at("M2", forceProfile())));
   EXPECT_EQ("<missing>", getString(at("M2", forceProfile()), "KXLMARK"));
   EXPECT_FALSE(keyExists(at("M2", forceProfile() + "\\Node0")));
+
+  EXPECT_EQ(0, dropForcedProfileKeys(context_, options_));
+  EXPECT_FALSE(keyExists(at("M2", profile(kOld))));
+  EXPECT_TRUE(keyExists(at("M2", forceProfile())));
+  expectProfileAt(kLocal, kCurrent);
 }
 
 TEST_F(MoveProfile, ForceCopyNameNeedsTheLocalHostName) {

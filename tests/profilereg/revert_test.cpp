@@ -20,10 +20,21 @@ TEST_F(RevertProfile, PartialMoveIsUndoneOnlyWhereItHappened) {
 
   EXPECT_EQ(0, revertInstanceProfile(context_, options_));
   expectMoved(kLocal, kCurrent, kOld);
-  // The machine whose copy failed still has its old key; the empty new one stays.
-  expectProfileAt("M2", kOld);
-  EXPECT_TRUE(keyExists(at("M2", profile(kCurrent))));
+  // The machine whose copy failed still has its old key and no new one.
+  expectUntouched("M2", kOld, kCurrent);
   expectUntouched("M3", kOld, kCurrent);
+}
+
+TEST_F(RevertProfile, UnreachableMachineDoesNotStopTheOthersComingBack) {
+  ownBy(kOld);
+  for (const char *machine : {kLocal, "M3"})
+    seedProfile(machine, kCurrent);
+  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M9 0\n2 hostc.zav.test M3 0\n");
+  startTrace();
+  EXPECT_EQ(KXL_RC_MACHINE_REGISTRY, revertInstanceProfile(context_, options_));
+  expectMoved(kLocal, kCurrent, kOld);
+  expectMoved("M3", kCurrent, kOld);
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780507 probe=10 rc=-1913"));
 }
 
 TEST_F(RevertProfile, LocalServicePointsAtTheOwningCopyAgain) {
@@ -37,7 +48,7 @@ TEST_F(RevertProfile, LocalServicePointsAtTheOwningCopyAgain) {
   EXPECT_EQ(0, revertInstanceProfile(context_, options_));
   expectMoved(kLocal, kCurrent, kOld);
   EXPECT_EQ("C:\\KXL95\\bin\\kxlsyscs.exe", service(kLocal, "INST1", "ImagePath"));
-  EXPECT_EQ("KXL - KXL101 - INST1", service(kLocal, "INST1", "DisplayName"));
+  EXPECT_EQ("KXL - KXL95 - INST1", service(kLocal, "INST1", "DisplayName"));
   EXPECT_EQ("LocalSystem", service(kLocal, "INST1", "ObjectName"));
   EXPECT_EQ(DWORD(SQLO_SVC_AUTO_START), serviceStart("INST1"));
   std::string trace = traceText();
@@ -83,6 +94,7 @@ TEST_F(RevertProfile, PartitionServicesOnEveryMachine) {
   std::snprintf(options_.userName, sizeof options_.userName, "svcuser");
   std::snprintf(options_.password, sizeof options_.password, "secret");
   context_.serviceStartType = SQLO_SVC_DEMAND_START;
+  context_.recreatedNodeType = 4; // the services were re-pointed under that account
 
   EXPECT_EQ(0, revertInstanceProfile(context_, options_));
   for (const char *machine : {kLocal, "M2", "M3"})
@@ -92,8 +104,8 @@ TEST_F(RevertProfile, PartitionServicesOnEveryMachine) {
   EXPECT_EQ("D:\\KXLOLD\\bin\\kxlsyscs.exe", service("M2", "INST1-2", "ImagePath"));
   // A host without a recorded installation runs the owning copy's program.
   EXPECT_EQ("C:\\KXL95\\bin\\kxlsyscs.exe", service("M3", "INST1-3", "ImagePath"));
-  EXPECT_EQ("KXL - KXL101 - INST1-0", service(kLocal, "INST1-0", "DisplayName"));
-  EXPECT_EQ("KXL - KXL101 - INST1-2", service("M2", "INST1-2", "DisplayName"));
+  EXPECT_EQ("KXL - KXL95 - INST1-0", service(kLocal, "INST1-0", "DisplayName"));
+  EXPECT_EQ("KXL - KXL95 - INST1-2", service("M2", "INST1-2", "DisplayName"));
   EXPECT_EQ("svcuser", service("M2", "INST1-1", "ObjectName"));
   EXPECT_EQ(DWORD(SQLO_SVC_DEMAND_START), serviceStart("INST1-0"));
 }
@@ -109,11 +121,11 @@ TEST_F(RevertProfile, ForceCopyNameRoundTripDropsThePlaceholder) {
 
   EXPECT_EQ(0, revertInstanceProfile(context_, options_));
   expectMoved(kLocal, kCurrent, kOld);
-  // The forced host's profile was never copied: it comes back as an empty key.
-  EXPECT_TRUE(keyExists(at("M2", profile(kOld))));
+  // The forced host's profile values are there as before; the placeholder is gone.
+  expectUntouched("M2", kOld, kCurrent);
   EXPECT_FALSE(keyExists(at("M2", forceProfile())));
   EXPECT_EQ("C:\\KXL101\\bin\\kxlsyscs.exe", service("M2", "INST1-1", "ImagePath"));
-  EXPECT_EQ("KXL - KXL101 - INST1-1", service("M2", "INST1-1", "DisplayName"));
+  EXPECT_EQ("KXL - KXL95 - INST1-1", service("M2", "INST1-1", "DisplayName"));
 }
 
 TEST_F(RevertProfile, ClusterRoundTripRestoresEveryMachine) {

@@ -221,5 +221,14 @@ TEST_F(PartitionedServicesTest, NodesFileFailuresAndUnreachableMachine) {
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=90 rc=-1913"));
 }
 
+// The library reports a missing nodes file as the warning the step tolerates:
+// nothing to save, nothing to put back, and the partitions are re-pointed.
+TEST_F(PartitionedServicesTest, MissingNodesFileIsNotAFailure) {
+  ASSERT_TRUE(DeleteFileA(nodesPath().c_str()));
+  ASSERT_EQ(0, run());
+  EXPECT_FALSE(pathExists(nodesPath() + ".mig"));
+  EXPECT_EQ("C:\\KXL10\\bin\\kxlsyscs.exe", getString(serviceKey("INST1-1"), "ImagePath"));
+}
+
 } // namespace
 } // namespace kxltest

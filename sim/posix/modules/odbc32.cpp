@@ -17,6 +17,16 @@ using namespace kxlsim::posix;
 namespace {
 
 constexpr const char *kDataSourcesKey = "SOFTWARE\\ODBC\\ODBC.INI\\ODBC Data Sources";
+// A broken driver manager: a dword named after a function is its every answer.
+constexpr const char *kAnswersKey = "SOFTWARE\\ZAV\\KXLSIM\\Odbc";
+
+bool fixedAnswer(const char *function, SQLRETURN &answer) {
+  DWORD value = 0;
+  if (!reg::readDword(HKEY_LOCAL_MACHINE, kAnswersKey, function, value))
+    return false;
+  answer = static_cast<SQLRETURN>(static_cast<int32_t>(value));
+  return true;
+}
 
 struct EnvironmentObject : HandleObject {
   bool closableByCloseHandle() const override { return false; }
@@ -80,6 +90,8 @@ SQLRETURN SQL_API SQLAllocEnv(SQLHENV *EnvironmentHandle) {
   *EnvironmentHandle = nullptr;
   if (kxlsim::shouldFail("SQLAllocEnv"))
     return SQL_ERROR;
+  if (SQLRETURN answer; fixedAnswer("SQLAllocEnv", answer))
+    return answer;
   auto environment = std::make_unique<EnvironmentObject>();
   environment->sources = dataSources(true, true);
   *EnvironmentHandle = registerHandle(std::move(environment));
@@ -91,6 +103,8 @@ SQLRETURN SQL_API SQLDataSources(SQLHENV EnvironmentHandle, SQLUSMALLINT Directi
                                  SQLSMALLINT BufferLength2, SQLSMALLINT *NameLength2) {
   if (kxlsim::shouldFail("SQLDataSources"))
     return SQL_ERROR;
+  if (SQLRETURN answer; fixedAnswer("SQLDataSources", answer))
+    return answer;
   auto *environment = lookupHandleAs<EnvironmentObject>(EnvironmentHandle);
   if (environment == nullptr)
     return SQL_INVALID_HANDLE;
