@@ -36,19 +36,6 @@ void flatten(const reg::Key &key, const std::string &path, FlatHive &out) {
     flatten(sub, path + "\\" + sub.name, out);
 }
 
-bool loadHive(const fs::path &file, const std::string &rootName, reg::Key &tree, std::string &error) {
-  std::string text;
-  if (!readHostFile(file, text)) {
-    error = "cannot read " + file.string();
-    return false;
-  }
-  if (!reg::parseHive(text, rootName, tree, error)) {
-    error = file.string() + ": " + error;
-    return false;
-  }
-  return true;
-}
-
 std::string hexBytes(const std::vector<BYTE> &data) {
   std::string text = "hex:";
   char byte[4];
@@ -155,7 +142,9 @@ bool diffRegistry(const fs::path &a, const fs::path &b, const char *file, const 
                   Report &report, std::ostream &out) {
   reg::Key treeA, treeB;
   std::string error;
-  if (!loadHive(a / file, rootName, treeA, error) || !loadHive(b / file, rootName, treeB, error)) {
+  // As programs in the worlds see them: each hive with its change log replayed.
+  if (!reg::loadHive((a / file).string(), rootName, treeA, error) ||
+      !reg::loadHive((b / file).string(), rootName, treeB, error)) {
     out << "kxlsim: " << error << '\n';
     return false;
   }

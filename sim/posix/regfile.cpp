@@ -298,7 +298,8 @@ bool joinContinuations(LineReader &lines, std::string &logical) {
   }
 }
 
-bool parseValueLine(std::string_view line, LineReader &lines, Key &key) {
+// A value line; with `changes`, "=-" removes the value.
+bool parseValueLine(std::string_view line, LineReader &lines, Key &key, bool changes) {
   Value value;
   size_t pos = 0;
   if (line[0] == '@') {
@@ -311,6 +312,10 @@ bool parseValueLine(std::string_view line, LineReader &lines, Key &key) {
   if (pos >= line.size() || line[pos] != '=')
     return false;
   std::string dataText(trimmed(line.substr(pos + 1)));
+  if (changes && dataText == "-") {
+    key.values.erase(fold(value.name));
+    return true;
+  }
   if (dataText.compare(0, 3, "hex") == 0 && !joinContinuations(lines, dataText))
     return false;
   if (!parseData(dataText, value))
@@ -319,11 +324,9 @@ bool parseValueLine(std::string_view line, LineReader &lines, Key &key) {
   return true;
 }
 
-bool parseSection(std::string_view line, const std::string &rootName, Key &root, Key *&current) {
-  if (line.size() < 3 || line.back() != ']' || line[1] == '-')
-    return false;
-  std::string_view path = line.substr(1, line.size() - 2);
-  KeyPath names;
+// "ROOT\a\b" as the key path below the root; false for another root or an empty name.
+bool parseKeyName(std::string_view path, const std::string &rootName, KeyPath &names) {
+  names.clear();
   size_t start = 0;
   while (start <= path.size()) {
     size_t sep = path.find('\\', start);
@@ -337,18 +340,40 @@ bool parseSection(std::string_view line, const std::string &rootName, Key &root,
   if (fold(names.front()) != fold(rootName))
     return false;
   names.erase(names.begin());
+  return true;
+}
+
+// A section line; with `changes`, "[-KEY]" removes the key and its subtree
+// (values may not follow it).
+bool parseSection(std::string_view line, const std::string &rootName, Key &root, Key *&current,
+                  bool changes) {
+  bool removal = line.size() >= 2 && line[1] == '-';
+  if (line.size() < 3 || line.back() != ']' || (removal && !changes))
+    return false;
+  KeyPath names;
+  if (!parseKeyName(line.substr(removal ? 2 : 1, line.size() - (removal ? 3 : 2)), rootName, names))
+    return false;
+  if (removal) {
+    if (names.empty())
+      return false; // the root itself is never removed
+    current = nullptr;
+    Key *parent = findKey(root, KeyPath(names.begin(), names.end() - 1));
+    if (parent != nullptr)
+      parent->subkeys.erase(fold(names.back()));
+    return true;
+  }
   bool created = false;
   current = &createKey(root, names, created);
   return true;
 }
 
-} // namespace
-
-bool parseHive(std::string_view text, const std::string &rootName, Key &out, std::string &error) {
-  out = Key{};
+// Reads REGEDIT4 text into `tree` (which keeps what it holds); `changes`
+// allows the removal forms of change text.
+bool parseInto(std::string_view text, const std::string &rootName, Key &tree, bool changes,
+               std::string &error) {
   LineReader lines(text);
   std::string_view line;
-  bool header = false;
+  bool header = changes; // change text has no header of its own
   Key *current = nullptr;
   while (lines.next(line)) {
     line = trimmed(line);
@@ -358,9 +383,9 @@ bool parseHive(std::string_view text, const std::string &rootName, Key &out, std
     if (!header)
       ok = header = line == "REGEDIT4";
     else if (line[0] == '[')
-      ok = parseSection(line, rootName, out, current);
+      ok = parseSection(line, rootName, tree, current, changes);
     else if (current != nullptr && (line[0] == '"' || line[0] == '@'))
-      ok = parseValueLine(line, lines, *current);
+      ok = parseValueLine(line, lines, *current, changes);
     if (!ok) {
       error = "line " + std::to_string(lines.number()) + ": " + std::string(line.substr(0, 80));
       return false;
@@ -373,9 +398,56 @@ bool parseHive(std::string_view text, const std::string &rootName, Key &out, std
   return true;
 }
 
+} // namespace
+
+bool parseHive(std::string_view text, const std::string &rootName, Key &out, std::string &error) {
+  out = Key{};
+  return parseInto(text, rootName, out, false, error);
+}
+
+bool applyChange(std::string_view text, const std::string &rootName, Key &tree) {
+  std::string error;
+  return parseInto(text, rootName, tree, true, error);
+}
+
+// ---------------------------------------------------------------- changes
+
+std::string Change::keyName(const KeyPath &path) const {
+  std::string name = rootName_;
+  for (const std::string &part : path)
+    name += "\\" + part;
+  return name;
+}
+
+void Change::createKey(const KeyPath &path) {
+  text_ += "[" + keyName(path) + "]\n";
+}
+
+void Change::setValue(const KeyPath &path, const Value &value) {
+  text_ += "[" + keyName(path) + "]\n" + valueLine(value) + "\n";
+}
+
+void Change::deleteValue(const KeyPath &path, const std::string &name) {
+  text_ += "[" + keyName(path) + "]\n" + (name.empty() ? std::string("@") : quoted(name)) + "=-\n";
+}
+
+void Change::deleteKey(const KeyPath &path) {
+  text_ += "[-" + keyName(path) + "]\n";
+}
+
+void Change::mergeKey(const KeyPath &path, const Key &source) {
+  formatKey(source, keyName(path), false, text_);
+}
+
 // ---------------------------------------------------------------- the file
 
 namespace {
+
+// The change log starts with this word and the hash of the hive text it
+// applies to; then one record per change: "@<length> <hash>\n" and the text.
+constexpr char kLogMagic[] = "KXLSIM-REGLOG";
+// A log longer than the hive (and than this) is folded into the hive.
+constexpr long long kMinFoldBytes = 64 * 1024;
 
 // flock on the folder holding the hives: one lock serves both hives of a world
 // and leaves no lock file behind in it.
@@ -408,15 +480,33 @@ private:
   int fd_ = -1;
 };
 
-long long mtimeOf(const struct stat &st) {
-  return static_cast<long long>(st.st_mtim.tv_sec) * 1000000000LL + st.st_mtim.tv_nsec;
+HiveFile::Seen seenOf(const struct stat &st) {
+  return {static_cast<unsigned long long>(st.st_dev), static_cast<unsigned long long>(st.st_ino),
+          static_cast<long long>(st.st_size),
+          static_cast<long long>(st.st_mtim.tv_sec) * 1000000000LL + st.st_mtim.tv_nsec};
 }
 
-bool readAll(int fd, std::string &out) {
+bool operator==(const HiveFile::Seen &a, const HiveFile::Seen &b) {
+  return a.dev == b.dev && a.ino == b.ino && a.size == b.size && a.mtimeNs == b.mtimeNs;
+}
+
+// What is at `path` now (ino 0 when nothing is); false when it cannot be told.
+bool look(const std::string &path, HiveFile::Seen &out) {
+  struct stat st {};
+  out = HiveFile::Seen{};
+  if (stat(path.c_str(), &st) == 0) {
+    out = seenOf(st);
+    return true;
+  }
+  return errno == ENOENT;
+}
+
+// Reads from `offset` to the end of the file.
+bool readFrom(int fd, off_t offset, std::string &out) {
   out.clear();
   char buffer[65536];
   while (true) {
-    ssize_t n = ::read(fd, buffer, sizeof buffer);
+    ssize_t n = ::pread(fd, buffer, sizeof buffer, offset);
     if (n < 0 && errno == EINTR)
       continue;
     if (n < 0)
@@ -424,6 +514,7 @@ bool readAll(int fd, std::string &out) {
     if (n == 0)
       return true;
     out.append(buffer, static_cast<size_t>(n));
+    offset += n;
   }
 }
 
@@ -440,10 +531,46 @@ bool writeAll(int fd, const std::string &text) {
   return true;
 }
 
-bool sameFile(int heldFd, const struct stat &now, long long size, long long mtimeNs) {
-  struct stat held {};
-  return heldFd >= 0 && fstat(heldFd, &held) == 0 && held.st_dev == now.st_dev && held.st_ino == now.st_ino &&
-         now.st_size == size && mtimeOf(now) == mtimeNs;
+unsigned long long fnv1a(std::string_view text) {
+  unsigned long long hash = 14695981039346656037ULL;
+  for (unsigned char c : text) {
+    hash ^= c;
+    hash *= 1099511628211ULL;
+  }
+  return hash;
+}
+
+std::string logHeader(unsigned long long hiveHash) {
+  char text[64];
+  std::snprintf(text, sizeof text, "%s %016llx\n", kLogMagic, hiveHash);
+  return text;
+}
+
+std::string logRecord(const std::string &change) {
+  char head[64];
+  std::snprintf(head, sizeof head, "@%zu %016llx\n", change.size(), fnv1a(change));
+  return head + change;
+}
+
+// Applies the whole records of `log` from `pos` on and returns where the last
+// one ends: a record cut short or damaged (a killed writer's) ends the replay.
+size_t replayRecords(std::string_view log, size_t pos, const std::string &rootName, Key &tree) {
+  while (pos < log.size() && log[pos] == '@') {
+    size_t eol = log.find('\n', pos);
+    if (eol == std::string_view::npos || eol - pos > 40)
+      break;
+    std::string head(log.substr(pos + 1, eol - pos - 1));
+    unsigned long long length = 0, hash = 0;
+    int used = 0;
+    if (std::sscanf(head.c_str(), "%llu %llx%n", &length, &hash, &used) != 2 ||
+        static_cast<size_t>(used) != head.size() || length > log.size() - (eol + 1))
+      break;
+    std::string_view change = log.substr(eol + 1, length);
+    if (fnv1a(change) != hash || !applyChange(change, rootName, tree))
+      break;
+    pos = eol + 1 + length;
+  }
+  return pos;
 }
 
 int batchDepth = 0;
@@ -456,16 +583,45 @@ std::vector<HiveFile *> &liveHives() {
 
 } // namespace
 
+bool loadHive(const std::string &path, const std::string &rootName, Key &out, std::string &error) {
+  HiveFile file(path, rootName);
+  LONG rc = file.read([&](const Key &tree) -> LONG {
+    out = tree;
+    return ERROR_SUCCESS;
+  });
+  if (rc == ERROR_SUCCESS)
+    return true;
+  // Say why: the hive's own text is what can be wrong.
+  std::string text;
+  int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+  error = "cannot read " + path;
+  if (fd >= 0 && readFrom(fd, 0, text) && !parseHive(text, rootName, out, error))
+    error = path + ": " + error;
+  if (fd >= 0)
+    close(fd);
+  return false;
+}
+
 HiveFile::HiveFile(std::string path, std::string rootName)
-    : path_(std::move(path)), rootName_(std::move(rootName)) {
+    : path_(std::move(path)), logPath_(path_ + ".log"), rootName_(std::move(rootName)) {
   liveHives().push_back(this);
 }
 
 HiveFile::~HiveFile() {
   flush();
+  foldAtEnd();
   std::vector<HiveFile *> &hives = liveHives();
   hives.erase(std::remove(hives.begin(), hives.end(), this), hives.end());
   forget();
+}
+
+void HiveFile::forgetLog() {
+  if (logFd_ >= 0)
+    close(logFd_);
+  logFd_ = -1;
+  log_ = Seen{};
+  logGood_ = 0;
+  logStale_ = false;
 }
 
 void HiveFile::forget() {
@@ -474,58 +630,154 @@ void HiveFile::forget() {
   heldFd_ = -1;
   loaded_ = false;
   tree_ = Key{};
-  size_ = -1;
-  mtimeNs_ = 0;
+  hive_ = Seen{};
+  hiveHash_ = 0;
+  forgetLog();
 }
 
-// Brings tree_ up to the file's current content (caller holds the lock).
+// True when neither the hive nor its log changed since they were read. The
+// files read are held open, so a replaced file never shows the same inode.
+bool HiveFile::current() const {
+  Seen hive, log;
+  return loaded_ && look(path_, hive) && hive == hive_ && look(logPath_, log) && log == log_;
+}
+
+// Brings tree_ up to the hive and its log (caller holds the lock).
 bool HiveFile::refresh() {
+  for (int attempt = 0; attempt < 2; ++attempt) {
+    if (current())
+      return true;
+    Seen hive;
+    if (!look(path_, hive))
+      return false;
+    if ((!loaded_ || !(hive == hive_)) && !loadHiveFile())
+      return false;
+    if (replayLog())
+      return true;
+    forget(); // not the log replayed so far: start again from the hive
+  }
+  return false;
+}
+
+bool HiveFile::loadHiveFile() {
+  forget();
   int fd = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
   if (fd < 0) {
     if (errno != ENOENT)
       return false;
-    forget(); // no file yet: an empty hive
+    hiveHash_ = fnv1a(""); // no file yet: an empty hive
     loaded_ = true;
     return true;
   }
   struct stat st {};
-  if (fstat(fd, &st) != 0) {
-    close(fd);
-    return false;
-  }
-  if (loaded_ && sameFile(heldFd_, st, size_, mtimeNs_)) {
-    close(fd);
-    return true;
-  }
   std::string text, error;
   Key tree;
-  if (!readAll(fd, text) || !parseHive(text, rootName_, tree, error)) {
+  if (fstat(fd, &st) != 0 || !readFrom(fd, 0, text) || !parseHive(text, rootName_, tree, error)) {
     close(fd);
-    forget();
     return false;
   }
-  forget();
   tree_ = std::move(tree);
   heldFd_ = fd;
-  size_ = st.st_size;
-  mtimeNs_ = mtimeOf(st);
+  hive_ = seenOf(st);
+  hiveHash_ = fnv1a(text);
   loaded_ = true;
   return true;
 }
 
-// Writes tree_ through (caller holds the exclusive lock). A leftover temporary
-// file of a killed writer is simply overwritten by the next one.
+// Replays what is new in the log (caller holds the lock). False when the log
+// is not the one replayed so far, or cannot be read.
+bool HiveFile::replayLog() {
+  Seen now;
+  if (!look(logPath_, now))
+    return false;
+  if (now.ino == 0) {
+    // A log is removed only after its hive was replaced, and that was checked first.
+    bool replayedOne = log_.ino != 0 && !logStale_;
+    forgetLog();
+    return !replayedOne;
+  }
+  if (log_.ino != 0 && (now.dev != log_.dev || now.ino != log_.ino || now.size < log_.size))
+    return false;
+  if (log_.ino == 0) {
+    int fd = open(logPath_.c_str(), O_RDONLY | O_CLOEXEC);
+    struct stat st {};
+    std::string text;
+    if (fd < 0 || fstat(fd, &st) != 0 || !readFrom(fd, 0, text)) {
+      if (fd >= 0)
+        close(fd);
+      return false;
+    }
+    logFd_ = fd;
+    log_ = seenOf(st);
+    log_.size = static_cast<long long>(text.size());
+    std::string header = logHeader(hiveHash_);
+    logStale_ = text.compare(0, header.size(), header) != 0;
+    logGood_ =
+        logStale_ ? log_.size : static_cast<long long>(replayRecords(text, header.size(), rootName_, tree_));
+    return true;
+  }
+  std::string text;
+  if (!readFrom(logFd_, log_.size, text))
+    return false;
+  const long long end = log_.size + static_cast<long long>(text.size());
+  // Nothing is ever appended after a cut-off record (writers fold instead), nor to a stale log.
+  if (!logStale_ && logGood_ == log_.size)
+    logGood_ += static_cast<long long>(replayRecords(text, 0, rootName_, tree_));
+  log_ = now;
+  log_.size = end;
+  return true;
+}
+
+// Appends one change to the log (caller holds the exclusive lock; tree_ holds
+// the change already). A log ending in a cut-off record, or grown past the
+// hive, is folded into the hive instead.
+bool HiveFile::appendToLog(const std::string &change) {
+  bool fresh = log_.ino == 0 || logStale_;
+  if (!fresh && (logGood_ != log_.size || log_.size > std::max(kMinFoldBytes, hive_.size)))
+    return writeThrough();
+  std::string bytes = (fresh ? logHeader(hiveHash_) : std::string()) + logRecord(change);
+  int fd = -1;
+  if (fresh) {
+    unlink(logPath_.c_str()); // a stale log, left by a killed fold
+    fd = open(logPath_.c_str(), O_RDWR | O_CREAT | O_EXCL | O_APPEND | O_CLOEXEC, 0644);
+  } else {
+    fd = open(logPath_.c_str(), O_WRONLY | O_APPEND | O_CLOEXEC);
+  }
+  struct stat st {};
+  bool ok = fd >= 0 && writeAll(fd, bytes) && fstat(fd, &st) == 0;
+  if (fresh && ok) {
+    forgetLog();
+    logFd_ = fd; // held like the hive
+  } else if (fd >= 0) {
+    ok = close(fd) == 0 && ok;
+  }
+  if (!ok)
+    return false;
+  log_ = seenOf(st);
+  logGood_ = log_.size;
+  appended_ = true;
+  return true;
+}
+
+// Writes tree_ through whole (caller holds the exclusive lock) and removes the
+// log it now holds. A leftover temporary file of a killed writer is simply
+// overwritten by the next one; a log left by a writer killed between the
+// rename and the removal names the old hive, so readers ignore it.
 bool HiveFile::writeThrough() {
   std::string temporary = path_ + ".tmp";
+  std::string text = formatHive(tree_, rootName_);
   int fd = open(temporary.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
   if (fd < 0)
     return false;
-  bool ok = writeAll(fd, formatHive(tree_, rootName_));
+  bool ok = writeAll(fd, text);
   ok = close(fd) == 0 && ok;
   if (!ok || rename(temporary.c_str(), path_.c_str()) != 0) {
     unlink(temporary.c_str());
     return false;
   }
+  unlink(logPath_.c_str());
+  forgetLog();
+  appended_ = false;
   // Hold the new file so the next operation sees it as current without re-reading it.
   int held = open(path_.c_str(), O_RDONLY | O_CLOEXEC);
   struct stat st {};
@@ -538,14 +790,25 @@ bool HiveFile::writeThrough() {
   if (heldFd_ >= 0)
     close(heldFd_);
   heldFd_ = held;
-  size_ = st.st_size;
-  mtimeNs_ = mtimeOf(st);
+  hive_ = seenOf(st);
+  hiveHash_ = fnv1a(text);
   return true;
 }
 
+// A process that changed the hive through the log leaves it folded, so a
+// world at rest is its hive files alone.
+void HiveFile::foldAtEnd() {
+  if (!appended_)
+    return;
+  appended_ = false;
+  FolderLock lock(path_, LOCK_EX);
+  if (lock.held() && refresh() && log_.ino != 0 && !logStale_)
+    writeThrough();
+}
+
 LONG HiveFile::read(const std::function<LONG(const Key &)> &reader) {
-  if (dirty_)
-    return reader(tree_); // the batch's own changes are the current content
+  if (dirty_ || current())
+    return reader(tree_); // a batch's own changes are the current content
   FolderLock lock(path_, LOCK_SH);
   if (!lock.held() || !refresh())
     return ERROR_CANTREAD;
@@ -574,6 +837,28 @@ LONG HiveFile::update(const std::function<LONG(Key &, bool &changed)> &writer) {
   if (rc != ERROR_SUCCESS || !writeThrough()) {
     forget(); // the tree no longer matches the file: re-read next time
     return rc != ERROR_SUCCESS ? rc : ERROR_CANTWRITE;
+  }
+  return ERROR_SUCCESS;
+}
+
+LONG HiveFile::change(const std::function<LONG(const Key &, Change &)> &writer) {
+  Change change(rootName_);
+  if (batchDepth > 0) {
+    return update([&](Key &tree, bool &changed) -> LONG {
+      LONG rc = writer(tree, change);
+      changed = rc == ERROR_SUCCESS && !change.empty();
+      return changed && !applyChange(change.text(), rootName_, tree) ? ERROR_CANTWRITE : rc;
+    });
+  }
+  FolderLock lock(path_, LOCK_EX);
+  if (!lock.held() || !refresh())
+    return ERROR_CANTREAD;
+  LONG rc = writer(tree_, change);
+  if (rc != ERROR_SUCCESS || change.empty())
+    return rc;
+  if (!applyChange(change.text(), rootName_, tree_) || !appendToLog(change.text())) {
+    forget(); // the tree no longer matches the files: re-read next time
+    return ERROR_CANTWRITE;
   }
   return ERROR_SUCCESS;
 }

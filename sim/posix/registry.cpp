@@ -109,13 +109,6 @@ LONG keyOfHandle(const Key &root, const OpenKey &handle, const Key *&out) {
   return handle.predefined ? ERROR_FILE_NOT_FOUND : ERROR_KEY_DELETED;
 }
 
-LONG keyOfHandle(Key &root, const OpenKey &handle, Key *&out) {
-  const Key *found = nullptr;
-  LONG rc = keyOfHandle(static_cast<const Key &>(root), handle, found);
-  out = const_cast<Key *>(found);
-  return rc;
-}
-
 // A subkey path is taken below an opened key only while that key exists; a
 // missing root path (HKEY_CLASSES_ROOT) is simply created along the way.
 LONG checkBase(const Key &root, const OpenKey &base) {
@@ -136,15 +129,16 @@ LONG readKey(HKEY hKey, const std::function<LONG(const Key &)> &fn) {
   });
 }
 
-// Runs `fn` on the key behind `hKey` for changing; `fn` tells whether it changed anything.
-LONG updateKey(HKEY hKey, const std::function<LONG(Key &, bool &)> &fn) {
+// Runs `fn` on the key behind `hKey` for changing: `fn` describes its change
+// of the key, whose path it is given.
+LONG changeKey(HKEY hKey, const std::function<LONG(const Key &, const KeyPath &, hive::Change &)> &fn) {
   OpenKey handle;
   if (LONG rc = lookupKey(hKey, handle); rc != ERROR_SUCCESS)
     return rc;
-  return hiveFile(handle.hiveId).update([&](Key &root, bool &changed) -> LONG {
-    Key *key = nullptr;
+  return hiveFile(handle.hiveId).change([&](const Key &root, hive::Change &change) -> LONG {
+    const Key *key = nullptr;
     LONG rc = keyOfHandle(root, handle, key);
-    return rc == ERROR_SUCCESS ? fn(*key, changed) : rc;
+    return rc == ERROR_SUCCESS ? fn(*key, handle.path, change) : rc;
   });
 }
 
@@ -210,20 +204,15 @@ LONG deleteKey(HKEY hKey, const char *subKey, bool onlyLeaf) {
     return rc;
   if (target.path.empty())
     return ERROR_ACCESS_DENIED; // a root key cannot be deleted
-  return hiveFile(target.hiveId).update([&](Key &root, bool &changed) -> LONG {
+  return hiveFile(target.hiveId).change([&](const Key &root, hive::Change &change) -> LONG {
     if (LONG rc = checkBase(root, base); rc != ERROR_SUCCESS)
       return rc;
-    KeyPath parentPath(target.path.begin(), target.path.end() - 1);
-    Key *parent = hive::findKey(root, parentPath);
-    if (parent == nullptr)
+    const Key *key = hive::findKey(root, target.path);
+    if (key == nullptr)
       return ERROR_FILE_NOT_FOUND;
-    auto it = parent->subkeys.find(hive::fold(target.path.back()));
-    if (it == parent->subkeys.end())
-      return ERROR_FILE_NOT_FOUND;
-    if (onlyLeaf && !it->second.subkeys.empty())
+    if (onlyLeaf && !key->subkeys.empty())
       return ERROR_ACCESS_DENIED;
-    parent->subkeys.erase(it);
-    changed = true;
+    change.deleteKey(target.path);
     return ERROR_SUCCESS;
   });
 }
@@ -238,21 +227,20 @@ LONG openOrCreate(HKEY hKey, const char *subKey, REGSAM sam, bool create, PHKEY 
   if (LONG rc = resolveSubKey(hKey, subKey, sam, base, target); rc != ERROR_SUCCESS)
     return rc;
   bool created = false;
-  auto work = [&](Key &root, bool &changed) -> LONG {
+  // ERROR_SUCCESS when the key is there, ERROR_FILE_NOT_FOUND when it is not.
+  auto find = [&](const Key &root) -> LONG {
     if (LONG rc = checkBase(root, base); rc != ERROR_SUCCESS)
       return rc;
-    if (hive::findKey(root, target.path) != nullptr)
-      return ERROR_SUCCESS;
-    if (!create)
-      return ERROR_FILE_NOT_FOUND;
-    hive::createKey(root, target.path, created);
-    changed = created;
-    return ERROR_SUCCESS;
+    return hive::findKey(root, target.path) != nullptr ? ERROR_SUCCESS : ERROR_FILE_NOT_FOUND;
   };
   HiveFile &file = hiveFile(target.hiveId);
-  LONG rc = create ? file.update(work) : file.read([&](const Key &root) -> LONG {
-    bool unused = false;
-    return work(const_cast<Key &>(root), unused);
+  LONG rc = !create ? file.read(find) : file.change([&](const Key &root, hive::Change &change) -> LONG {
+    LONG found = find(root);
+    if (found != ERROR_FILE_NOT_FOUND)
+      return found;
+    change.createKey(target.path);
+    created = true;
+    return ERROR_SUCCESS;
   });
   if (rc != ERROR_SUCCESS)
     return rc;
@@ -325,9 +313,9 @@ LONG RegSetValueExA(HKEY hKey, LPCSTR lpValueName, DWORD, DWORD dwType, const BY
   // reader gets a terminated string back.
   if ((dwType == REG_SZ || dwType == REG_EXPAND_SZ) && !data.empty() && data.back() != 0)
     data.push_back(0);
-  return updateKey(hKey, [&](hive::Key &key, bool &changed) -> LONG {
-    hive::setValue(key, name, dwType, std::move(data));
-    changed = true;
+  const hive::Value value{name, dwType, std::move(data)};
+  return changeKey(hKey, [&](const Key &, const KeyPath &path, hive::Change &change) -> LONG {
+    change.setValue(path, value);
     return ERROR_SUCCESS;
   });
 }
@@ -370,9 +358,12 @@ LONG RegDeleteValueA(HKEY hKey, LPCSTR lpValueName) {
     return ERROR_ACCESS_DENIED;
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
   std::string name = hive::fold(lpValueName == nullptr ? "" : lpValueName);
-  return updateKey(hKey, [&](hive::Key &key, bool &changed) -> LONG {
-    changed = key.values.erase(name) != 0;
-    return changed ? ERROR_SUCCESS : ERROR_FILE_NOT_FOUND;
+  return changeKey(hKey, [&](const Key &key, const KeyPath &path, hive::Change &change) -> LONG {
+    auto it = key.values.find(name);
+    if (it == key.values.end())
+      return ERROR_FILE_NOT_FOUND;
+    change.deleteValue(path, it->second.name);
+    return ERROR_SUCCESS;
   });
 }
 
@@ -415,9 +406,8 @@ LONG SHCopyKeyA(HKEY hkeySrc, LPCSTR pszSrcSubKey, HKEY hkeyDest, DWORD) {
   });
   if (rc != ERROR_SUCCESS)
     return rc;
-  return updateKey(hkeyDest, [&](hive::Key &key, bool &changed) -> LONG {
-    hive::mergeKey(key, copy);
-    changed = true;
+  return changeKey(hkeyDest, [&](const Key &, const KeyPath &path, hive::Change &change) -> LONG {
+    change.mergeKey(path, copy);
     return ERROR_SUCCESS;
   });
 }

@@ -9,6 +9,8 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <filesystem>
+#include <functional>
 #include <random>
 
 namespace kxlsim::testing {
@@ -143,11 +145,16 @@ TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
 }
 
 // A batch keeps its changes in this process until it ends, then writes each
-// changed hive once; the file (what other processes read) shows nothing of it
-// before that and all of it after.
+// changed hive once; other readers see nothing of it before that and all of it
+// after.
 TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
-  auto fileHas = [this](const char *text) {
-    return readText(root + "/system.reg").find(text) != std::string::npos;
+  // What a reader with a cache of its own (as another process) finds.
+  auto othersSee = [this](const char *value) {
+    Key tree;
+    std::string error;
+    EXPECT_TRUE(posix::hive::loadHive(root + "/system.reg", "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    const Key *batch = posix::hive::findKey(tree, {"SOFTWARE", "Batch"});
+    return batch != nullptr && batch->values.count(posix::hive::fold(value)) != 0;
   };
   std::string before = readText(root + "/system.reg");
   {
@@ -162,16 +169,215 @@ TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
     EXPECT_EQ(getDword(key, "Second", seen), ERROR_SUCCESS); // this process sees its own changes
     EXPECT_EQ(seen, 2u);
     EXPECT_EQ(readText(root + "/system.reg"), before);
+    EXPECT_FALSE(othersSee("First"));
     EXPECT_TRUE(outer.commit());
-    EXPECT_TRUE(fileHas("\"First\"=dword:00000001"));
-    EXPECT_TRUE(fileHas("\"Second\"=dword:00000002"));
+    EXPECT_TRUE(othersSee("First"));
+    EXPECT_TRUE(othersSee("Second"));
     EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
   }
-  // After the batch, changes are written through at once again.
+  // After the batch, changes reach the others at once again.
   HKEY key = createKey("SOFTWARE\\Batch");
   ASSERT_EQ(setDword(key, "Third", 3), ERROR_SUCCESS);
-  EXPECT_TRUE(fileHas("\"Third\"=dword:00000003"));
+  EXPECT_TRUE(othersSee("Third"));
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
+}
+
+// ---- the change log beside the hive
+
+std::string formatted(const Key &tree) {
+  return posix::hive::formatHive(tree, "HKEY_LOCAL_MACHINE");
+}
+
+// The registry as a reader with a cache of its own finds it: hive and log.
+std::string replayed(const std::string &hivePath) {
+  Key tree;
+  std::string error;
+  EXPECT_TRUE(posix::hive::loadHive(hivePath, "HKEY_LOCAL_MACHINE", tree, error)) << error;
+  return formatted(tree);
+}
+
+bool exists(const std::string &path) {
+  return std::filesystem::exists(path);
+}
+
+// Each kind of change, with names and data the text form must escape: what
+// another reader replays from the log is exactly the writer's tree, and once
+// the writer ends the hive file is that tree written whole, with no log left.
+TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
+  const std::string hivePath = root + "/system.reg";
+  const std::vector<BYTE> binary = {0, 1, 0xfe, '"', '\\', '\n'};
+  const std::vector<std::function<void(posix::hive::Change &)>> changes = {
+      [](auto &c) {
+        c.createKey({"SOFTWARE", "Kinds", "Empty"});
+      },
+      [](auto &c) {
+        c.setValue({"SOFTWARE", "Kinds"}, {"Quote\"and\\slash", REG_SZ, {'a', '"', 0}});
+      },
+      [&](auto &c) {
+        c.setValue({"SOFTWARE", "Kinds"}, {"", REG_BINARY, binary});
+      },
+      [](auto &c) {
+        c.setValue({"SOFTWARE", "Kinds"}, {"Lines", REG_SZ, {'a', '\r', '\n', 'b', 0}});
+      },
+      [](auto &c) {
+        c.setValue({"SOFTWARE", "Kinds"}, {"Number", REG_DWORD, {1, 2, 3, 4}});
+      },
+      [](auto &c) {
+        c.setValue({"SOFTWARE", "Kinds", "Gone"}, {"X", REG_MULTI_SZ, {'x', 0, 0}});
+      },
+      [](auto &c) {
+        c.setValue({"SOFTWARE", "Kinds"}, {"Dropped", REG_NONE, {}});
+      },
+      [](auto &c) {
+        c.deleteValue({"SOFTWARE", "Kinds"}, "DROPPED");
+      },
+      [](auto &c) {
+        c.deleteValue({"SOFTWARE", "Kinds"}, "");
+      },
+      [](auto &c) {
+        c.setValue({"SOFTWARE", "Kinds"}, {"", REG_SZ, {'d', 0}});
+      },
+      [](auto &c) {
+        Key source;
+        bool created = false;
+        Key &sub = posix::hive::createKey(source, {"Deep", "Er"}, created);
+        posix::hive::setValue(sub, "V", REG_EXPAND_SZ, {'%', 'p', '%', 0});
+        c.mergeKey({"SOFTWARE", "Copied"}, source);
+      },
+      [](auto &c) {
+        c.deleteKey({"software", "KINDS", "gone"});
+      },
+      [](auto &c) {
+        c.setValue({"software", "kinds"}, {"number", REG_DWORD, {9, 9, 9, 9}});
+      },
+  };
+  std::string writerTree;
+  {
+    HiveFile file(hivePath, "HKEY_LOCAL_MACHINE");
+    for (const auto &describe : changes) {
+      ASSERT_EQ(file.change([&](const Key &, posix::hive::Change &c) -> LONG {
+        describe(c);
+        return ERROR_SUCCESS;
+      }),
+                ERROR_SUCCESS);
+      ASSERT_EQ(file.read([&](const Key &tree) -> LONG {
+        writerTree = formatted(tree);
+        return ERROR_SUCCESS;
+      }),
+                ERROR_SUCCESS);
+      ASSERT_EQ(replayed(hivePath), writerTree);
+    }
+    EXPECT_TRUE(exists(hivePath + ".log"));
+    EXPECT_EQ(writerTree.find("Gone"), std::string::npos);
+    EXPECT_NE(writerTree.find("\"Number\"=dword:09090909"), std::string::npos) << "first spelling kept";
+  }
+  EXPECT_EQ(readText(hivePath), writerTree);
+  EXPECT_FALSE(exists(hivePath + ".log"));
+}
+
+// A writer killed in the middle of a record leaves it cut off: readers take
+// the records before it and nothing of it; the next writer writes the hive
+// whole instead of appending after it.
+TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
+  const std::string hivePath = root + "/system.reg";
+  pid_t child = fork();
+  if (child == 0) {
+    HKEY key = createKey("SOFTWARE\\Cut");
+    _exit(setDword(key, "Whole", 1) == ERROR_SUCCESS ? 0 : 1); // no clean-up: the log stays
+  }
+  ASSERT_EQ(waitExit(child), 0);
+  const std::string whole = replayed(hivePath);
+  ASSERT_NE(whole.find("\"Whole\"=dword:00000001"), std::string::npos);
+  const std::string record = "[HKEY_LOCAL_MACHINE\\SOFTWARE\\Cut]\n\"Torn\"=dword:00000002\n";
+  for (const std::string &cut : {std::string("@"), std::string("@57 00000000"),
+                                 "@" + std::to_string(record.size()) + " 0000000000000000\n" + record,
+                                 "@" + std::to_string(record.size() + 9) + " 0000000000000000\n" + record}) {
+    std::string log = readText(hivePath + ".log");
+    writeText(hivePath + ".log", log + cut);
+    EXPECT_EQ(replayed(hivePath), whole) << cut;
+    writeText(hivePath + ".log", log);
+  }
+  writeText(hivePath + ".log", readText(hivePath + ".log") + record.substr(0, 20));
+  HKEY key = createKey("SOFTWARE\\Cut");
+  ASSERT_EQ(setDword(key, "After", 3), ERROR_SUCCESS);
+  EXPECT_FALSE(exists(hivePath + ".log")) << "folded";
+  std::string text = readText(hivePath);
+  EXPECT_NE(text.find("\"Whole\"=dword:00000001"), std::string::npos);
+  EXPECT_NE(text.find("\"After\"=dword:00000003"), std::string::npos);
+  EXPECT_EQ(text.find("Torn"), std::string::npos);
+  EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
+}
+
+// A writer killed after writing the hive whole but before removing the log
+// leaves a log of changes the hive already holds. Replayed again they would
+// bring back what was changed after them, so readers ignore that log, and the
+// next change starts a new one.
+TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
+  const std::string hivePath = root + "/system.reg";
+  std::string oldLog;
+  pid_t child = fork();
+  if (child == 0) {
+    HKEY key = createKey("SOFTWARE\\Stale");
+    bool ok = setDword(key, "Value", 1) == ERROR_SUCCESS;
+    oldLog = readText(hivePath + ".log");
+    ok = ok && RegDeleteValueA(key, "Value") == ERROR_SUCCESS;
+    writeText(root + "/old.log", oldLog);
+    _exit(ok ? 0 : 1);
+  }
+  ASSERT_EQ(waitExit(child), 0);
+  {
+    HiveFile fold(hivePath, "HKEY_LOCAL_MACHINE"); // folds when it ends, as a process does
+    ASSERT_EQ(fold.change([](const Key &, posix::hive::Change &c) -> LONG {
+      c.createKey({"SOFTWARE", "Stale", "Folded"});
+      return ERROR_SUCCESS;
+    }),
+              ERROR_SUCCESS);
+  }
+  ASSERT_FALSE(exists(hivePath + ".log"));
+  std::filesystem::rename(root + "/old.log", hivePath + ".log");
+  const std::string folded = replayed(hivePath);
+  EXPECT_EQ(folded, readText(hivePath));
+  EXPECT_EQ(folded.find("\"Value\""), std::string::npos);
+  HKEY key = createKey("SOFTWARE\\Stale");
+  ASSERT_EQ(setDword(key, "Next", 2), ERROR_SUCCESS);
+  const std::string next = replayed(hivePath);
+  EXPECT_EQ(next.find("\"Value\""), std::string::npos);
+  EXPECT_NE(next.find("\"Next\"=dword:00000002"), std::string::npos);
+  EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
+}
+
+// A writer appending to the log, killed at random moments: what is left reads
+// as a prefix of its changes, none lost before the last one seen, and the
+// next process goes on from there.
+TEST_F(SharingTest, KilledLogWriterLeavesAPrefixOfItsChanges) {
+  const std::string hivePath = root + "/system.reg";
+  std::mt19937 random(777);
+  DWORD highest = 0;
+  for (int round = 0; round < 6; ++round) {
+    pid_t child = fork();
+    if (child == 0) {
+      HKEY key = createKey("SOFTWARE\\Prefix");
+      for (DWORD n = highest + 1;; ++n) {
+        std::string name = "V" + std::to_string(n);
+        setDword(key, name.c_str(), n);
+      }
+    }
+    usleep(20000 + random() % 60000);
+    kill(child, SIGKILL);
+    waitpid(child, nullptr, 0);
+    Key tree;
+    std::string error;
+    ASSERT_TRUE(posix::hive::loadHive(hivePath, "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    ASSERT_TRUE(posix::hive::parseHive(readText(hivePath), "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    ASSERT_TRUE(posix::hive::loadHive(hivePath, "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    const Key *prefix = posix::hive::findKey(tree, {"SOFTWARE", "Prefix"});
+    size_t count = prefix == nullptr ? 0 : prefix->values.size();
+    ASSERT_GE(count, highest);
+    for (DWORD n = 1; n <= count; ++n)
+      ASSERT_EQ(prefix->values.count("v" + std::to_string(n)), 1u) << "V" << n << " of " << count;
+    highest = static_cast<DWORD>(count);
+  }
+  EXPECT_GT(highest, 0u);
 }
 
 } // namespace
