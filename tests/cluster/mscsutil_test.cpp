@@ -3,6 +3,10 @@
 // so each case can check that no operation leaves a cluster handle open.
 #include "cluster/mscsutil.h"
 
+#include "cluster/clusterstep.h"
+#include "engn/sqo/run.h"
+#include "install/kxlinstance.h"
+
 #include "sim/common/simfail.h"
 #include "sim/posix/modules.h"
 #include "sim/posix/world.h"
@@ -332,6 +336,24 @@ TEST_F(ClusterOps, FailedOpensLeaveNoHandleOpen) {
 TEST_F(ClusterOps, AResourceWhoseTypeCannotBeReadIsNotListed) {
   failCalls("ClusterResourceControl:1");
   EXPECT_EQ(names(util.GetResourcesOfType("KXL Server")), (std::vector<std::string>{"C-inst@G1"}));
+}
+
+// The step asked for the old type converts the other way: the instance's
+// "KXL Server" resource becomes "KXL" with its dependency; another name stays.
+TEST_F(ClusterOps, StepConvertsBackWhenAskedForTheOldType) {
+  addType("KXL");
+  setDependsOn("C-inst", std::string("B-disk") + '\0');
+  IKXLINSTANCE instance("C-INST", nullptr, "C:\\prof\\C-INST");
+  UpgradeContext context;
+  context.instance = &instance;
+  UpgradeOptions options{};
+  std::snprintf(options.instanceName, sizeof options.instanceName, "C-INST");
+  EXPECT_EQ(upgradeClusterInstance(context, 0, options), 0);
+  context.instance = nullptr;
+  EXPECT_EQ(getString(kResources + "C-inst", "Type"), "KXL");
+  EXPECT_EQ(names(util.GetResourceDependencies("C-inst")), (std::vector<std::string>{"B-disk@"}));
+  EXPECT_EQ(getString(kResources + "A-inst", "Type"), "KXL Server");
+  EXPECT_TRUE(keyExists(kCluster + "\\ResourceTypes\\KXL Server"));
 }
 
 } // namespace
