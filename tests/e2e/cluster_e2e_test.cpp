@@ -1,0 +1,470 @@
+// Clustered instances upgraded in the cluster world of kxlsim, seen through
+// the programs a user has: kxlsim to build, show and compare the world, and
+// the installed command. The failures of the cluster step are driven the same
+// way, each followed by a plain run that then succeeds.
+#include "sim/kxlsim/scenario_parts.h"
+#include "tests/support/command_run.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <functional>
+#include <sstream>
+#include <string>
+#include <vector>
+
+namespace {
+
+namespace fs = std::filesystem;
+using kxltestsupport::CommandRun;
+using kxltestsupport::readHostFile;
+
+constexpr const char *kCommand = "Program Files\\ZAV\\KXL101\\bin\\kxliupgrade.exe";
+constexpr const char *kResources = "SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Resources\\";
+constexpr const char *kGroups = "SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\";
+constexpr const char *kServerType = "  type  KXL Server       kxlserver.dll";
+constexpr const char *kCinst1Converted =
+    "    CINST1         KXL Server       offline  depends on Disk E:, Disk H:";
+constexpr const char *kCinst1Unchanged =
+    "    CINST1         KXL              offline  depends on Disk E:, Disk H:";
+
+// The clustered upgrades of the cluster world, as a scenario and the command
+// line in it, for programs that drive every end-to-end upgrade.
+struct ClusterUpgrade {
+  const char *instance;
+  std::vector<std::string> args;
+};
+const ClusterUpgrade kSingle{"CINST1", {"-p", "C:\\Program Files\\ZAV\\KXL101", "CINST1"}};
+const ClusterUpgrade kPartitioned{"CINST2", {"-u", "kxlsvc,Secret1", "CINST2"}};
+
+struct Outcome {
+  int exitCode = -1;
+  std::string out, trace;
+};
+
+std::vector<std::string> lines(const std::string &text) {
+  std::vector<std::string> out;
+  std::istringstream in(text);
+  for (std::string line; std::getline(in, line);)
+    out.push_back(line);
+  return out;
+}
+
+bool hasLine(const std::string &text, const std::string &line) {
+  for (const std::string &candidate : lines(text))
+    if (candidate == line)
+      return true;
+  return false;
+}
+
+// The registry lines of a diff.
+std::string registryChanges(const std::string &diff) {
+  std::string out;
+  for (const std::string &line : lines(diff))
+    if (line.rfind("registry ", 0) == 0)
+      out += line + "\n";
+  return out;
+}
+
+// The step's error lines, "probe=N rc=M" each.
+std::vector<std::string> stepErrors(const std::string &trace) {
+  std::vector<std::string> out;
+  for (const std::string &line : lines(trace))
+    if (line.rfind("error 0x18780509 ", 0) == 0)
+      out.push_back(line.substr(17));
+  return out;
+}
+
+class ClusterE2eTest : public ::testing::Test {
+protected:
+  void SetUp() override {
+    temp_ = kxltestsupport::newTempDir("kxlcluster");
+    ASSERT_FALSE(temp_.empty());
+    world_ = temp_ + "/world";
+    ASSERT_EQ(runKxlsim({"create", world_, "--scenario", "cluster", "--command", KXL_COMMAND}), "");
+    std::string error;
+    ASSERT_TRUE(kxlsim::selectWorld(world_, error)) << error;
+  }
+
+  void TearDown() override {
+    std::error_code ignored;
+    if (!HasFailure())
+      fs::remove_all(temp_, ignored);
+    else
+      std::cerr << "world kept in " << temp_ << '\n';
+  }
+
+  // kxlsim's standard output and error.
+  std::string runKxlsim(const std::vector<std::string> &args) {
+    CommandRun run{KXL_KXLSIM, args, {}, "", temp_ + "/kxlsim.out", temp_ + "/kxlsim.out"};
+    kxltestsupport::runCommand(run);
+    return readHostFile(run.outFile);
+  }
+
+  std::string snapshot() {
+    std::string copy = temp_ + "/snapshot" + std::to_string(++snapshots_);
+    EXPECT_EQ(runKxlsim({"snapshot", world_, copy}), "");
+    return copy;
+  }
+
+  Outcome upgrade(const std::vector<std::string> &args, const std::string &faults = "") {
+    std::string trace = temp_ + "/trace" + std::to_string(++runs_);
+    std::vector<std::string> settings = {"KXLSIM_ROOT=" + world_, "KXLTRACE=" + trace};
+    if (!faults.empty())
+      settings.push_back("KXLSIM_FAIL=" + faults);
+    CommandRun run{kxltestsupport::drivePath(world_, std::string("C:\\") + kCommand),
+                   args,
+                   settings,
+                   world_,
+                   temp_ + "/out",
+                   temp_ + "/err"};
+    Outcome result;
+    result.exitCode = kxltestsupport::runCommand(run);
+    result.out = readHostFile(run.outFile) + readHostFile(run.errFile);
+    result.trace = readHostFile(trace);
+    return result;
+  }
+
+  std::string show() { return runKxlsim({"show", world_}); }
+
+public: // for the cases' set-up
+  kxlsim::WorldWriter world;
+  std::string world_;
+
+private:
+  std::string temp_;
+  int snapshots_ = 0;
+  int runs_ = 0;
+};
+
+// Everything the upgrade of CINST1 changes in the registry: its profile key
+// moved on both nodes, its registration and both nodes' services re-pointed,
+// "KXL Server" registered and its one resource re-created under it (same
+// group, same dependencies: no line for them). It stays on E: though -p names
+// another path; the other resources are untouched.
+const char kSingleChanges[] = R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST1
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST1 "SeparateMonitor": dword:0 -> dword:1
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST1 "Type": "KXL" -> "KXL Server"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\CINST1 "Copy": "KXL95" -> "KXL101"
+registry - [WINSRV2] HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST1
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST1 "DisplayName": "KXL - KXL95 - CINST1" -> "KXL - KXL101 - CINST1"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST1 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST1 "DisplayName": "KXL - KXL95 - CINST1" -> "KXL - KXL101 - CINST1"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST1 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry + HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST1
+registry + HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\ResourceTypes\KXL Server
+registry + [WINSRV2] HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST1
+)";
+
+TEST_F(ClusterE2eTest, ClusteredInstanceUpgradesAndASecondRunConvertsNothing) {
+  std::string before = snapshot();
+  Outcome first = upgrade(kSingle.args);
+  EXPECT_EQ(first.exitCode, 0) << first.out;
+  EXPECT_EQ(first.out.rfind("KXL1000I", 0), 0u) << first.out;
+  std::string diff = runKxlsim({"diff", before, world_});
+  EXPECT_EQ(registryChanges(diff), kSingleChanges);
+  EXPECT_TRUE(hasLine(diff,
+                      "file ~ E:\\KXLPROF\\CINST1\\kxlsystm (16384 bytes, fnv 635b0f9ae34d87ac -> 16384 "
+                      "bytes, fnv 3920934884e75c52)"))
+      << diff;
+  EXPECT_TRUE(hasLine(show(), kCinst1Converted));
+
+  std::string converted = snapshot();
+  Outcome second = upgrade({"-install", "CINST1"});
+  EXPECT_EQ(second.exitCode, 0) << second.out;
+  EXPECT_NE(second.trace.find("exit 0x18780509 rc=0"), std::string::npos)
+      << "the step ran and converted nothing";
+  EXPECT_EQ(runKxlsim({"diff", converted, world_}).find("Cluster"), std::string::npos);
+}
+
+// CINST2's partitions run on both nodes, which are also its cluster's
+// machines: each machine's profile key moves once; every partition's service
+// is re-pointed on every node, under the account given; the other node's
+// cluster profile is made the local one again. Partition 2's resource is of another type
+// and stays, and so do the other instance's CINST3 and CINST3-0.
+const char kPartitionedChanges[] = R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST2
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-0 "SeparateMonitor": dword:0 -> dword:1
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-0 "Type": "KXL" -> "KXL Server"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-1 "SeparateMonitor": dword:0 -> dword:1
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-1 "Type": "KXL" -> "KXL Server"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\CINST2 "Copy": "KXL95" -> "KXL101"
+registry ~ [WINSRV2] HKLM\Cluster\ZAV\KXL\PROFILES\CINST2 "KXLINSTPROF": "X:\OLD" -> "F:\KXLPROF"
+registry - [WINSRV2] HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST2
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "DisplayName": "KXL - KXL95 - CINST2-0" -> "KXL - KXL101 - CINST2-0"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "ObjectName": ".\kxlsvc" -> "kxlsvc"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "DisplayName": "KXL - KXL95 - CINST2-1" -> "KXL - KXL101 - CINST2-1"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "ObjectName": ".\kxlsvc" -> "kxlsvc"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "DisplayName": "KXL - KXL95 - CINST2-2" -> "KXL - KXL101 - CINST2-2"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "ObjectName": ".\kxlsvc" -> "kxlsvc"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "DisplayName": "KXL - KXL95 - CINST2-0" -> "KXL - KXL101 - CINST2-0"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "ObjectName": ".\kxlsvc" -> "kxlsvc"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "DisplayName": "KXL - KXL95 - CINST2-1" -> "KXL - KXL101 - CINST2-1"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "ObjectName": ".\kxlsvc" -> "kxlsvc"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "DisplayName": "KXL - KXL95 - CINST2-2" -> "KXL - KXL101 - CINST2-2"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "ObjectName": ".\kxlsvc" -> "kxlsvc"
+registry + HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST2
+registry + HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\ResourceTypes\KXL Server
+registry + [WINSRV2] HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST2
+)";
+
+TEST_F(ClusterE2eTest, ClusteredPartitionedInstanceUpgradesOnEveryNode) {
+  world.setString(kxlsim::remoteMachine("WINSRV2"), "Cluster\\ZAV\\KXL\\PROFILES\\CINST2", "KXLINSTPROF",
+                  "X:\\OLD");
+  std::string before = snapshot();
+  Outcome run = upgrade(kPartitioned.args);
+  EXPECT_EQ(run.exitCode, 0) << run.out;
+  EXPECT_EQ(registryChanges(runKxlsim({"diff", before, world_})), kPartitionedChanges);
+  std::string cluster = show();
+  for (const char *line : {"    CINST2-0       KXL Server       offline  depends on Disk F:",
+                           "    CINST2-1       KXL Server       offline  depends on Disk G:, CINST2 IP",
+                           "    CINST2-2       Generic Service  offline  depends on Disk G:",
+                           "    CINST3         KXL              offline  depends on Disk K:",
+                           "    CINST3-0       KXL              offline  depends on Disk K:"})
+    EXPECT_TRUE(hasLine(cluster, line)) << line << "\n" << cluster;
+}
+
+// One way the cluster step can end, driven through the command: the world's
+// change and the faults before the run, what the step reports, what the
+// cluster holds afterwards, and the repair after which a plain run succeeds.
+struct StepCase {
+  const char *name;
+  const ClusterUpgrade *upgrade;
+  std::function<void(ClusterE2eTest &)> prepare; // may be empty
+  std::string faults;
+  int result;                      // the step's, and so the run's
+  std::vector<std::string> errors; // the step's error lines
+  bool typeRegistered;
+  std::vector<std::string> afterwards;          // lines of kxlsim show
+  std::function<void(ClusterE2eTest &)> repair; // before the plain run; may be empty
+  std::vector<std::string> rerun;               // lines of kxlsim show after the plain run
+};
+
+void setDword(ClusterE2eTest &t, const kxlsim::RegTarget &machine, const std::string &key, const char *name,
+              DWORD value) {
+  t.world.setDword(machine, key, name, value);
+}
+
+// CINST1's group owned by the other node, where its service runs.
+void runOnOtherNode(ClusterE2eTest &t, DWORD serviceState) {
+  t.world.setString(kxlsim::localMachine(), std::string(kGroups) + "CINST1 Group", "OwnerNode", "WINSRV2");
+  setDword(t, kxlsim::remoteMachine("WINSRV2"), "SOFTWARE\\ZAV\\KXLSIM\\Services\\CINST1", "State",
+           serviceState);
+}
+
+void setDependsOn(ClusterE2eTest &t, const std::string &resource, const std::vector<std::string> &names) {
+  t.world.setMultiString(kxlsim::localMachine(), kResources + resource, "DependsOn", names);
+}
+
+const StepCase kStepCases[] = {
+    {"ClusterLibraryMissing",
+     &kSingle,
+     [](ClusterE2eTest &t) {
+       fs::remove(kxltestsupport::drivePath(t.world_, "C:\\windows\\system32\\clusapi.dll"));
+     },
+     "",
+     -1251,
+     {"probe=10 rc=-1251"},
+     false,
+     {kCinst1Unchanged},
+     [](ClusterE2eTest &t) {
+       t.world.writeText("C:\\windows\\system32\\clusapi.dll",
+                         "MZ simulated run-time module clusapi.dll\r\n");
+     },
+     {kCinst1Converted}},
+    {"EntryPointMissing",
+     &kSingle,
+     {},
+     "GetProcAddress:37",
+     -1251,
+     {"probe=10 rc=-1251"},
+     false,
+     {kCinst1Unchanged},
+     {},
+     {kCinst1Converted}},
+    {"LocalClusterServiceStopped",
+     &kSingle,
+     [](ClusterE2eTest &t) {
+       setDword(t, kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", 3);
+     },
+     "",
+     -1252,
+     {"probe=20 rc=-1252"},
+     false,
+     {kCinst1Unchanged},
+     [](ClusterE2eTest &t) {
+       setDword(t, kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", 19);
+     },
+     {kCinst1Converted}},
+    {"TypeRegistrationRefused",
+     &kSingle,
+     {},
+     "CreateClusterResourceType:1",
+     -1252,
+     {"probe=20 rc=-1252"},
+     false,
+     {kCinst1Unchanged},
+     {},
+     {kCinst1Converted}},
+    {"PutBackWithItsDependencies",
+     &kSingle,
+     {},
+     "CreateClusterResource:1",
+     -1252,
+     {"probe=70 rc=-1252"},
+     true,
+     {kCinst1Unchanged},
+     {},
+     {kCinst1Converted}},
+    {"NewResourceWithoutAllDependencies",
+     &kSingle,
+     {},
+     "AddClusterResourceDependency:1",
+     -1252,
+     {"probe=80 rc=-1252"},
+     true,
+     {"    CINST1         KXL Server       offline  depends on Disk H:"},
+     {},
+     {"    CINST1         KXL Server       offline  depends on Disk H:"}},
+    {"PutBackWithoutAllDependencies",
+     &kSingle,
+     {},
+     "CreateClusterResource:1,AddClusterResourceDependency:1",
+     -1253,
+     {"probe=65 rc=-1253"},
+     true,
+     {"    CINST1         KXL              offline  depends on Disk H:"},
+     {},
+     {"    CINST1         KXL Server       offline  depends on Disk H:"}},
+    {"ResourceGone",
+     &kSingle,
+     {},
+     "CreateClusterResource:1,CreateClusterResource:2",
+     -1253,
+     {"probe=60 rc=-1253"},
+     true,
+     {"    Disk E:        Physical Disk    online"},
+     {},
+     {}},
+    {"OnlineOnTheOtherNode",
+     &kSingle,
+     [](ClusterE2eTest &t) { runOnOtherNode(t, 4); },
+     "",
+     -1254,
+     {"probe=47 rc=-1", "probe=50 rc=-1254"},
+     true,
+     {"    CINST1         KXL              online   depends on Disk E:, Disk H:"},
+     [](ClusterE2eTest &t) { runOnOtherNode(t, 1); },
+     {kCinst1Converted}},
+    {"AnotherResourceDependsOnIt",
+     &kSingle,
+     [](ClusterE2eTest &t) {
+       kxlsim::addClusterResource(t.world, {"CINST1 App", "Generic Service", "CINST1 Group", {"CINST1"}});
+     },
+     "",
+     -1254,
+     {"probe=47 rc=-1", "probe=50 rc=-1254"},
+     true,
+     {kCinst1Unchanged},
+     [](ClusterE2eTest &t) { setDependsOn(t, "CINST1 App", {}); },
+     {kCinst1Converted}},
+    {"LaterPartitionNotDeleted",
+     &kPartitioned,
+     {},
+     "DeleteClusterResource:2",
+     -1254,
+     {"probe=47 rc=-1", "probe=50 rc=-1254"},
+     true,
+     {"    CINST2-0       KXL Server       offline  depends on Disk F:",
+      "    CINST2-1       KXL              offline  depends on Disk G:, CINST2 IP"},
+     {},
+     {"    CINST2-1       KXL Server       offline  depends on Disk G:, CINST2 IP"}},
+    // Not failures: a name in another letter case, a dependency that is gone,
+    // a nodes file the step cannot read (nothing is the instance's).
+    {"NameInAnotherCase",
+     &kSingle,
+     [](ClusterE2eTest &t) {
+       SHDeleteKeyA(HKEY_LOCAL_MACHINE, (std::string(kResources) + "CINST1").c_str());
+       kxlsim::addClusterResource(t.world, {"cinst1", "KXL", "CINST1 Group", {"Disk E:", "Disk H:"}});
+     },
+     "",
+     0,
+     {},
+     true,
+     {"    cinst1         KXL Server       offline  depends on Disk E:, Disk H:"},
+     {},
+     {}},
+    {"DependencyGone",
+     &kSingle,
+     [](ClusterE2eTest &t) {
+       setDependsOn(t, "CINST1", {"Disk E:", "Disk Z:", "Disk H:"});
+     },
+     "",
+     0,
+     {},
+     true,
+     {kCinst1Converted},
+     {},
+     {}},
+    // The run's own reads of the nodes file come first and must succeed; the
+    // step's are every later one (one per resource tested).
+    {"NodesFileUnreadable",
+     &kPartitioned,
+     {},
+     "sqloReadKxlnodes:3,sqloReadKxlnodes:4,sqloReadKxlnodes:5,sqloReadKxlnodes:6,sqloReadKxlnodes:7,"
+     "sqloReadKxlnodes:8,sqloReadKxlnodes:9,sqloReadKxlnodes:10",
+     0,
+     {},
+     true,
+     {"    CINST2-0       KXL              offline  depends on Disk F:",
+      "    CINST2-1       KXL              offline  depends on Disk G:, CINST2 IP"},
+     {},
+     {}},
+};
+
+void PrintTo(const StepCase &c, std::ostream *out) {
+  *out << c.name;
+}
+
+class ClusterStepCase : public ClusterE2eTest, public ::testing::WithParamInterface<StepCase> {};
+
+TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
+  const StepCase &c = GetParam();
+  if (c.prepare)
+    c.prepare(*this);
+  Outcome run = upgrade(c.upgrade->args, c.faults);
+  EXPECT_NE(run.trace.find("exit 0x18780509 rc=" + std::to_string(c.result) + "\n"), std::string::npos)
+      << run.trace;
+  EXPECT_EQ(stepErrors(run.trace), c.errors);
+  EXPECT_EQ(run.out.find("SQLCODE=0"), std::string::npos) << run.out;
+  if (c.result != 0) {
+    EXPECT_NE(run.trace.find("error 0x18780502 probe=200 rc=" + std::to_string(c.result)), std::string::npos);
+    EXPECT_EQ(run.out.rfind("KXL" + std::to_string(-c.result) + "E", 0), 0u) << run.out;
+  } else {
+    EXPECT_EQ(run.exitCode, 0) << run.out;
+  }
+  std::string cluster = show();
+  EXPECT_EQ(hasLine(cluster, kServerType), c.typeRegistered) << cluster;
+  for (const std::string &line : c.afterwards)
+    EXPECT_TRUE(hasLine(cluster, line)) << line << "\n" << cluster;
+  if (c.result == 0)
+    return;
+
+  if (c.repair)
+    c.repair(*this);
+  Outcome again = upgrade(c.upgrade->args);
+  EXPECT_EQ(again.exitCode, 0) << again.out;
+  cluster = show();
+  for (const std::string &line : c.rerun)
+    EXPECT_TRUE(hasLine(cluster, line)) << line << "\n" << cluster;
+}
+
+INSTANTIATE_TEST_SUITE_P(Cluster, ClusterStepCase, ::testing::ValuesIn(kStepCases),
+                         [](const ::testing::TestParamInfo<StepCase> &info) { return info.param.name; });
+
+} // namespace
