@@ -457,24 +457,81 @@ void repointService(const UpgradeContext &context, const char *service, const ch
                             nullptr, nullptr, nullptr, account, password, display, &out);
 }
 
-void repointPartitionService(MachineWalk &walk, const unsigned char *entry, uint8_t force,
-                             const char *localHost) {
+bool forceCopyName(const UpgradeOptions &options) {
+  return (options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) != 0;
+}
+
+// How the undo points one partition's service at the owning copy again.
+struct OwnedService {
+  const char *machine = nullptr; // null: this machine
+  bool remoteProgram = false;    // the program of that machine's recorded installation
+  bool keepProgram = false;      // a forced partition keeps the program it has
+};
+
+// The service's program and display name as the owning copy gives them. The
+// account given with -u only when the services were re-pointed under it (the
+// instance was re-created); without a user name the service keeps its account.
+void repointOwnedService(MachineWalk &walk, const char *service, const OwnedService &how) {
   char program[kProgramPathSize];
   ownerProgramPath(walk.context, program);
-  const char *machine = sqloNodeMachine(entry);
-  if ((walk.options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) == 0 &&
-      !sameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ))
-    remoteProgramPath(walk, machine, program);
-  char service[kServiceNameSize];
+  if (how.remoteProgram)
+    remoteProgramPath(walk, how.machine, program);
   char display[kDisplayNameSize];
-  std::snprintf(service, sizeof service, "%s-%d", walk.options.instanceName, sqloNodeNumber(entry));
   serviceDisplayName(*walk.keys, service, display);
-  // Without a user name the service keeps its account, and so it does when
-  // the services were never re-pointed with that name (the instance was not
-  // re-created): the undo then changes no account.
   const char *account = walk.context.recreatedNodeType != 0 ? textOrNull(walk.options.userName) : nullptr;
-  repointService(walk.context, service, machine, force != 0 ? nullptr : textOrNull(program), account,
+  repointService(walk.context, service, how.machine, how.keepProgram ? nullptr : textOrNull(program), account,
                  account != nullptr ? walk.options.password : nullptr, display);
+}
+
+void partitionServiceName(const MachineWalk &walk, const unsigned char *entry,
+                          char (&service)[kServiceNameSize]) {
+  std::snprintf(service, sizeof service, "%s-%d", walk.options.instanceName, sqloNodeNumber(entry));
+}
+
+void repointPartitionService(MachineWalk &walk, const unsigned char *entry, uint8_t force,
+                             const char *localHost) {
+  OwnedService how;
+  how.machine = sqloNodeMachine(entry);
+  how.remoteProgram =
+      !forceCopyName(walk.options) && !sameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
+  how.keepProgram = force != 0;
+  char service[kServiceNameSize];
+  partitionServiceName(walk, entry, service);
+  repointOwnedService(walk, service, how);
+}
+
+// The services that the services step re-pointed on the machines of the
+// instance's cluster: every partition's on every machine, the local one
+// included; for a single-partition instance the other machines' (the local
+// service is the local pass's).
+void repointClusterServices(MachineWalk &walk) {
+  char computer[SQLO_COMPUTERNAME_SZ] = {};
+  uint32_t size = sizeof computer;
+  if (sqloGetComputerNameA(computer, &size) == 0)
+    computer[0] = '\0';
+  computer[sizeof computer - 1] = '\0';
+  char list[kRegValueBuffer];
+  readClusterList(walk.options.instanceName, list);
+  bool partitioned = walk.options.partitionedInstance == 1;
+  for (char *name = std::strtok(list, " "); name != nullptr; name = std::strtok(nullptr, " ")) {
+    bool local = computer[0] != '\0' && sameText(name, computer, SQLO_COMPUTERNAME_SZ);
+    OwnedService how;
+    how.machine = local ? nullptr : name;
+    if (!partitioned) {
+      how.remoteProgram = !local;
+      if (!local)
+        repointOwnedService(walk, walk.options.instanceName, how);
+      continue;
+    }
+    how.remoteProgram = !local && !forceCopyName(walk.options);
+    how.keepProgram = forceCopyName(walk.options);
+    NodeCursor nodes(walk.context.nodeList);
+    for (const unsigned char *entry = nodes.next(); entry != nullptr; entry = nodes.next()) {
+      char service[kServiceNameSize];
+      partitionServiceName(walk, entry, service);
+      repointOwnedService(walk, service, how);
+    }
+  }
 }
 
 void repointLocalService(MachineWalk &walk) {
@@ -581,6 +638,8 @@ int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options) 
     rc = revertMachines(walk);
     int32_t clusterRc = isClustered(context) ? walkCluster(walk) : 0;
     rc = rc != 0 ? rc : clusterRc;
+    if (isClustered(context) && context.recreatedNodeType != 0)
+      repointClusterServices(walk);
   }
   walk.release();
   pdtExit(KXL_FN_REVERT_INSTANCE_PROFILE, rc, 0);

@@ -167,6 +167,25 @@ TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
   }
 }
 
+// Clustered instances: the services of every machine of the cluster come
+// back to the owning copy with the profile keys.
+TEST_F(DriverFailureTest, ClusteredInstancesAreUndoneOnEveryMachine) {
+  const std::vector<std::string> clustered[] = {{"CINST1"}, {"-u", ".\\kxlsvc,secret", "CINST2"}};
+  for (const std::vector<std::string> &args : clustered) {
+    for (const char *fault : {"sqleInitApplicationEnvironment:1", "sqlfusys:1"}) {
+      SCOPED_TRACE(args.back() + " " + fault);
+      resetWorld("cluster");
+      keepWorld();
+      std::vector<std::string> withAuth = withArgs({"-a", "SERVER"}, args);
+      Outcome outcome = run(withAuth, fault);
+      ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+      expectUndone();
+      EXPECT_NE(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
+      expectRerunUpgrades(withAuth, args.back());
+    }
+  }
+}
+
 TEST_F(DriverFailureTest, NewProfilePathThatExistedStaysAndTheCopyGoes) {
   world.makeDirectory("C:\\Profiles");
   world.writeText("C:\\Profiles\\other\\keep.txt", "someone else's\n");
@@ -314,4 +333,3 @@ TEST_F(DriverFailureTest, ClusteredInstanceWithoutTheClusterApi) {
 
 } // namespace
 } // namespace drivertest
-

@@ -19,15 +19,16 @@ namespace {
 
 constexpr const char *kDriverId = "0x18780502";
 
-// The demo world with the command installed, built once for the program and
-// copied for every case.
+// The demo and the cluster world with the command installed, built once for
+// the program and copied for every case.
 class DemoWorld : public ::testing::Environment {
 public:
   void SetUp() override {
     fs::path dir = kxltestsupport::newTempDir("kxldrv-demo");
     kxlsim::InstallSources sources{KXL_TOOLS, KXL_COMMAND, KXL_MESSAGES};
     std::vector<std::string> errors;
-    if (!dir.empty() && kxlsim::createWorld((dir / "world").string(), "demo", sources, errors))
+    if (!dir.empty() && kxlsim::createWorld((dir / "world").string(), "demo", sources, errors) &&
+        kxlsim::createWorld((dir / "cluster").string(), "cluster", sources, errors))
       built = dir;
   }
   void TearDown() override {
@@ -86,10 +87,11 @@ void DriverTest::SetUp() {
   resetWorld();
 }
 
-void DriverTest::resetWorld() {
+void DriverTest::resetWorld(const char *scenario) {
   std::error_code failure;
   fs::remove_all(root_, failure);
-  fs::copy(DemoWorld::built / "world", root_, fs::copy_options::recursive, failure);
+  fs::copy(DemoWorld::built / (std::string(scenario) == "demo" ? "world" : scenario), root_,
+           fs::copy_options::recursive, failure);
   ASSERT_FALSE(failure) << failure.message();
   std::string reason;
   ASSERT_TRUE(kxlsim::selectWorld(root_, reason)) << reason;

@@ -56,8 +56,8 @@ protected:
   // Entries of the world's temporary directory.
   std::vector<std::string> tempEntries() const;
 
-  // The demo world afresh.
-  void resetWorld();
+  // The demo world afresh, or the world of another scenario ("cluster").
+  void resetWorld(const char *scenario = "demo");
   // Keeps a copy of the world as it is now, for worldChanges.
   void keepWorld();
   // What differs between the kept world and the world now, as `kxlsim diff`
