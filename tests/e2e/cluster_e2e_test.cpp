@@ -66,6 +66,16 @@ std::string registryChanges(const std::string &diff) {
   return out;
 }
 
+// The lines of a diff that change a service, its account aside (the one
+// given with -u is written as given).
+std::string serviceChanges(const std::string &diff) {
+  std::string out;
+  for (const std::string &line : lines(diff))
+    if (line.find("\\Services\\") != std::string::npos && line.find("\"ObjectName\"") == std::string::npos)
+      out += line + "\n";
+  return out;
+}
+
 // The step's error lines, "probe=N rc=M" each.
 std::vector<std::string> stepErrors(const std::string &trace) {
   std::vector<std::string> out;
@@ -437,6 +447,7 @@ TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
   const StepCase &c = GetParam();
   if (c.prepare)
     c.prepare(*this);
+  std::string before = snapshot();
   Outcome run = upgrade(c.upgrade->args, c.faults);
   EXPECT_NE(run.trace.find("exit 0x18780509 rc=" + std::to_string(c.result) + "\n"), std::string::npos)
       << run.trace;
@@ -445,6 +456,7 @@ TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
   if (c.result != 0) {
     EXPECT_NE(run.trace.find("error 0x18780502 probe=200 rc=" + std::to_string(c.result)), std::string::npos);
     EXPECT_EQ(run.out.rfind("KXL" + std::to_string(-c.result) + "E", 0), 0u) << run.out;
+    EXPECT_EQ(serviceChanges(runKxlsim({"diff", before, world_})), "") << "every node's services are back";
   } else {
     EXPECT_EQ(run.exitCode, 0) << run.out;
   }
