@@ -1,10 +1,11 @@
 #!/usr/bin/env bash
 # Installs the Debian packages the build needs, when they are missing.
-# Usage: scripts/deps.sh [--windows]   (--windows adds the cross compiler and Wine)
+# Usage: scripts/deps.sh [--windows]   (--windows adds the cross compiler and Wine,
+# and the host's unixODBC library, without which Wine's odbc32 fails every call)
 set -euo pipefail
 pkgs=(cmake ninja-build g++ libgtest-dev libgmock-dev googletest nlohmann-json3-dev gettext libbenchmark-dev)
 if [ "${1:-}" = "--windows" ]; then
-  pkgs+=(g++-mingw-w64-x86-64 wine64)
+  pkgs+=(g++-mingw-w64-x86-64 wine64 libodbc2)
 fi
 missing=()
 for p in "${pkgs[@]}"; do
