@@ -2,6 +2,7 @@
 
 #include "NT/environment.h"
 #include "NT/errortrace.h"
+#include "NT/kxliutil.h"
 #include "NT/localhost.h"
 #include "NT/nodetypechoice.h"
 #include "NT/pathjoin.h"
@@ -26,6 +27,7 @@ constexpr const char kClusterList[] = "KXLCLUSTERLIST";
 constexpr const char kClusterInstanceProfile[] = "KXLINSTPROF";
 
 enum Probe : uint32_t {
+  kProbeCopyName = 5,
   kProbeClusterName = 10,
   kProbeSaveNodes = 20,
   kProbeServiceConfig = 30,
@@ -465,8 +467,18 @@ int32_t repointSingleService(ServicesStep &step) {
   });
 }
 
+// The current copy's name names the re-pointed services: read before
+// anything is changed, and never taken as empty when the read fails.
+int32_t readCopyName(ServicesStep &step) {
+  if (sqloGetCurrentInstallationName(step.copyName, sizeof step.copyName) != 0 || step.copyName[0] == '\0')
+    return traced(kProbeCopyName, UPGRADE_RC_COPY_NOT_FOUND);
+  return 0;
+}
+
 int32_t runServicesStep(ServicesStep &step) {
   UpgradeContext &context = step.context;
+  if (int32_t rc = readCopyName(step); rc != 0)
+    return rc;
   uint32_t workstationFlag = workstationProfileFlag();
   int32_t newNodeType = chooseNodeType(context, step.options, context.nodeType);
   prepareEnvironment(step);
@@ -482,7 +494,6 @@ int32_t runServicesStep(ServicesStep &step) {
   if ((rc = recreateInstance(step, newNodeType, workstationFlag)) != 0)
     return rc;
   context.recreatedNodeType = static_cast<uint32_t>(newNodeType);
-  sqloGetCurrentInstallationName(step.copyName, sizeof step.copyName);
   if (newNodeType == 4 && step.partitioned())
     return repointPartitions(step);
   if (newNodeType == 2)

@@ -49,10 +49,34 @@ int32_t existingServiceKey(const char *serviceName, const char *machine, std::st
   return 0;
 }
 
-void readText(const std::string &key, const char *name, char *buffer, size_t size) {
+// A value that is absent keeps its default; any other failed read is the
+// query's failure, never an absent value.
+bool readable(LONG rc) {
+  return rc == ERROR_SUCCESS || rc == ERROR_FILE_NOT_FOUND;
+}
+
+LONG readText(const std::string &key, const char *name, char *buffer, size_t size) {
   std::string value;
-  kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, name, value);
+  LONG rc = kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, name, value);
   kxlprod::copyBounded(value, buffer, size);
+  return rc;
+}
+
+LONG readConfig(const std::string &key, SQLO_SVC_CONFIG &config) {
+  DWORD start = SQLO_SVC_DEMAND_START;
+  LONG rc = kxlprod::readRegDword(HKEY_LOCAL_MACHINE, key, "Start", start);
+  config.startType = static_cast<int32_t>(start);
+  struct TextField {
+    const char *name;
+    char *buffer;
+    size_t size;
+  } texts[] = {{"ImagePath", config.programPath, sizeof config.programPath},
+               {"ObjectName", config.account, sizeof config.account},
+               {"DisplayName", config.displayName, sizeof config.displayName}};
+  for (const TextField &text : texts)
+    if (readable(rc))
+      rc = readText(key, text.name, text.buffer, text.size);
+  return readable(rc) ? ERROR_SUCCESS : rc;
 }
 
 // Writes the settings that are given; 0 or the first registry failure.
@@ -95,14 +119,8 @@ int32_t sqloQueryNTServiceConfig(const char *serviceName, const char *machine, S
   std::memset(config, 0, sizeof *config);
   config->serviceType = kOwnProcessService;
   config->errorControl = kErrorControlNormal;
-  DWORD start = SQLO_SVC_DEMAND_START;
-  kxlprod::readRegDword(HKEY_LOCAL_MACHINE, key, "Start", start);
-  config->startType = static_cast<int32_t>(start);
-  readText(key, "ImagePath", config->programPath, sizeof config->programPath);
-  readText(key, "ObjectName", config->account, sizeof config->account);
-  readText(key, "DisplayName", config->displayName, sizeof config->displayName);
   report(out, 0);
-  return 0;
+  return codeForRegistry(readConfig(key, *config), out);
 }
 
 int32_t sqloChangeNTServiceConfig(const char *serviceName, const char *machine, uint32_t serviceType,

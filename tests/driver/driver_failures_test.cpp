@@ -261,6 +261,32 @@ TEST_F(DriverFailureTest, PartitionedInstanceWithoutAReadableNodeListIsRefused) 
   }
 }
 
+// The node list read again by the driver fails: refused before anything
+// changes, instead of leaving the partitions of the other machine on the old
+// copy behind a success.
+TEST_F(DriverFailureTest, NodeListUnreadableOnTheSecondReadIsRefused) {
+  Outcome outcome = run(kPartitioned, "sqloReadKxlnodes:2");
+  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+  EXPECT_EQ(outcome.failures[0].probe, 11);
+  EXPECT_EQ(outcome.driverResult, -1960);
+  expectUndone();
+  expectRerunUpgrades(kPartitioned, "INST2");
+}
+
+// A start type that cannot be read is never taken for an absent one (which
+// would make an automatic service start on demand after the upgrade).
+TEST_F(DriverFailureTest, UnreadableStartTypeFailsTheServicesStep) {
+  const std::string service = "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1";
+  world.setString(kxlsim::localMachine(), service, "Start", "2");
+  keepWorld();
+  Outcome outcome = run({"INST1"});
+  expectFailure(outcome, 90, -1925);
+  expectUndone();
+  world.setDword(kxlsim::localMachine(), service, "Start", 2);
+  expectRerunUpgrades({"INST1"});
+  EXPECT_EQ(dwordValue(service, "Start"), 2u);
+}
+
 // The message never claims a restore that failed: it names the backup, which
 // is kept with the instance's files.
 TEST_F(DriverFailureTest, FailedRestoreKeepsTheBackupAndSaysWhere) {
