@@ -10,6 +10,7 @@
 #include "NT/functiondir.h"
 #include "NT/instfiles.h"
 #include "NT/profilereg.h"
+#include "NT/readnodetype.h"
 #include "NT/services.h"
 #include "NT/tools_run.h"
 #include "cluster/clusterstep.h"
@@ -80,13 +81,13 @@ StepResult findCurrentCopy(DriverState &state) {
   return stepDone();
 }
 
-// The node type from the instance's own kxlsystm; when that cannot be read
-// the run's value stands.
+// The node type from the instance's own kxlsystm; when that cannot be read,
+// or gives no node type, the value the run bound the instance with stands.
 StepResult readInstanceNodeType(DriverState &state) {
   state.context.instance->GetInstanceDir(state.instanceDir, sizeof state.instanceDir);
   IKXLINSTANCE snapshot;
   state.nodeType = state.context.nodeType;
-  if (snapshot.ReloadDbmCfg(state.instanceDir) == 0)
+  if (snapshot.ReloadDbmCfg(state.instanceDir) == 0 && isKnownNodeType(snapshot.GetNodeType()))
     state.nodeType = snapshot.GetNodeType();
   return stepDone();
 }

@@ -45,6 +45,16 @@ int32_t readImage(SQLO_FHANDLE file, unsigned char *image, uint32_t &filled) {
 
 } // namespace
 
+bool nodeTypeFilePath(const IKXLINSTANCE *instance, char *path, size_t size) {
+  if (path == nullptr || size == 0)
+    return false;
+  path[0] = '\0';
+  if (instance != nullptr && configFilePath(*instance, path, size))
+    return true;
+  path[0] = '\0';
+  return false;
+}
+
 int32_t readNodeType(const IKXLINSTANCE *instance, uint32_t *nodeType) {
   pdtEntry(KXL_FN_READ_NODE_TYPE);
   char path[SQLO_PATH_SZ + 16];

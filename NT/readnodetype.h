@@ -2,6 +2,7 @@
 // file kxlsystm: the unsigned 16-bit word at byte 40.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 class IKXLINSTANCE;
@@ -15,3 +16,11 @@ inline constexpr uint32_t KXL_FN_READ_NODE_TYPE = 0x1878052Eu;
 // or read, or SQLO_RC_INVALID_ARGUMENT for null arguments, a path that does not
 // fit, or a file too short to hold the word; *nodeType then keeps its value.
 int32_t readNodeType(const IKXLINSTANCE *instance, uint32_t *nodeType);
+
+// The file readNodeType reads; false (and "") when it cannot be formed.
+bool nodeTypeFilePath(const IKXLINSTANCE *instance, char *path, size_t size);
+
+// Node types an instance can have: 1 to 5.
+inline bool isKnownNodeType(uint32_t nodeType) {
+  return nodeType >= 1 && nodeType <= 5;
+}

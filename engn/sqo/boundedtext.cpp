@@ -23,11 +23,15 @@ TextBuilder::TextBuilder(char *buffer, std::size_t size) : buffer_(buffer), size
 }
 
 void TextBuilder::append(const char *text, std::size_t length) {
-  if (size_ == 0 || text == nullptr)
+  if (text == nullptr)
     return;
-  std::size_t room = size_ - 1 - used_;
-  if (length > room)
+  std::size_t room = size_ > 0 ? size_ - 1 - used_ : 0;
+  if (length > room) {
+    whole_ = false;
     length = room;
+  }
+  if (size_ == 0)
+    return;
   std::memcpy(buffer_ + used_, text, length);
   used_ += length;
   buffer_[used_] = '\0';

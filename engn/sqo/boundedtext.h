@@ -21,9 +21,12 @@ public:
   void append(char c);
   const char *text() const { return buffer_; }
   std::size_t length() const { return used_; }
+  // False once any character had to be dropped.
+  bool whole() const { return whole_; }
 
 private:
   char *buffer_;
   std::size_t size_;
   std::size_t used_ = 0;
+  bool whole_ = true;
 };

@@ -51,16 +51,12 @@ std::size_t textLength(const char *text) {
 }
 
 // "dir\name" without doubling the backslash of a drive root.
-void pathIn(char *buffer, std::size_t size, const char *directory, const char *name) {
+void appendPathIn(TextBuilder &out, const char *directory, const char *name) {
   std::size_t length = textLength(directory);
-  const char *separator = length > 0 && directory[length - 1] == '\\' ? "" : "\\";
-  ossSnprintf(buffer, size, "%s%s%s", directory, separator, name);
-}
-
-void currentDirectory(char *buffer) {
-  DWORD length = GetCurrentDirectoryA(kDirectorySize, buffer);
-  if (length == 0 || length >= kDirectorySize)
-    buffer[0] = '\0';
+  out.append(directory);
+  if (length == 0 || directory[length - 1] != '\\')
+    out.append('\\');
+  out.append(name);
 }
 
 // The directory in double quotes; a drive root loses its backslash so that the
@@ -105,33 +101,55 @@ int exitCodeResult(uint32_t exitCode, UpgradeOptions &options, const char *logPa
   }
 }
 
+// Where the check works: the current directory and the paths formed in it.
+struct CheckPlace {
+  char directory[kDirectorySize + 1] = {};
+  char quoted[SQLO_PATH_SZ] = {};
+  char messageCopy[SQLO_PATH_SZ] = {};
+  char logPath[SQLO_PATH_SZ] = {}; // in double quotes
+};
+
+// False when the current directory cannot be had or a path formed in it does
+// not fit whole: a cut log-file argument would lose its closing quote and the
+// file name, and an empty directory would send the tool elsewhere.
+bool findCheckPlace(CheckPlace &place) {
+  DWORD length = GetCurrentDirectoryA(kDirectorySize, place.directory);
+  if (length == 0 || length >= kDirectorySize)
+    return false;
+  quotedDirectory(place.quoted, sizeof place.quoted, place.directory);
+  TextBuilder copy(place.messageCopy, sizeof place.messageCopy);
+  appendPathIn(copy, place.directory, "KXLDBMIG.TXT");
+  TextBuilder log(place.logPath, sizeof place.logPath);
+  log.append('"');
+  appendPathIn(log, place.directory, "upgrade.log");
+  log.append('"');
+  return copy.whole() && log.whole();
+}
+
 int runCheckTool(UpgradeContext &context, UpgradeOptions &options) {
-  char source[SQLO_PATH_SZ], target[SQLO_PATH_SZ], directory[kDirectorySize + 1];
-  char quoted[SQLO_PATH_SZ], logPath[SQLO_PATH_SZ], logFile[SQLO_PATH_SZ];
+  CheckPlace place;
+  if (!findCheckPlace(place))
+    return UPGRADE_RC_CHECK_DIRECTORY;
+  char source[SQLO_PATH_SZ];
   messageFile(source, sizeof source, options.currentInstallPath);
-  currentDirectory(directory);
-  quotedDirectory(quoted, sizeof quoted, directory);
-  pathIn(target, sizeof target, directory, "KXLDBMIG.TXT");
-  sqlocopy(source, target, 0);
+  sqlocopy(source, place.messageCopy, 0);
 
   char program[SQLO_PATH_SZ];
   ossSnprintf(source, sizeof source, "%s\\misc\\kxlckupgrade.exe", options.currentInstallPath);
   ossSnprintf(program, sizeof program, "%s\\bin\\kxlckupgrade.exe", context.copyPath);
   sqlocopy(source, program, 0);
 
-  currentDirectory(directory);
-  pathIn(logFile, sizeof logFile, directory, "upgrade.log");
-  ossSnprintf(logPath, sizeof logPath, "\"%s\"", logFile);
   ArgumentBlock block;
-  for (const char *argument : {static_cast<const char *>(program), "-h", "-m", "-not1", "-l",
-                               static_cast<const char *>(logPath), "-t", static_cast<const char *>(quoted)})
+  for (const char *argument :
+       {static_cast<const char *>(program), "-h", "-m", "-not1", "-l",
+        static_cast<const char *>(place.logPath), "-t", static_cast<const char *>(place.quoted)})
     block.add(argument);
   uint32_t processId = 0;
   SQLO_EXEC_RESULT result{};
   int32_t rc = sqloexec2(program, block.data(), 0, SQLO_EXEC_WAIT, &processId, &result, 0, 0);
   if (rc != 0)
     return rc;
-  return exitCodeResult(result.exitCode, options, logPath);
+  return exitCodeResult(result.exitCode, options, place.logPath);
 }
 
 bool describesProductDriver(const SQLCHAR *description, const char *driverText) {
@@ -227,8 +245,14 @@ int runDatabaseCheck(UpgradeContext &context, UpgradeOptions &options) {
   int rc = UPGRADE_RC_INSTANCE_ACTIVE;
   if (!isInstanceActive(context, options)) {
     InstallationSwitch inCopy(context.instance);
-    putInstanceEnvironment(options.instanceName);
-    rc = runCheckTool(context, options);
+    rc = inCopy.result();
+    if (rc == 0) {
+      putInstanceEnvironment(options.instanceName);
+      rc = runCheckTool(context, options);
+    }
+    int32_t back = inCopy.end();
+    if (rc == 0)
+      rc = back;
   }
   pdtExit(KXL_FN_RUN_DATABASE_CHECK, rc, 0);
   return rc;

@@ -14,6 +14,8 @@ inline constexpr uint32_t KXL_FN_FIND_ODBC_SOURCES = 0x187805C2u;
 
 inline constexpr int32_t UPGRADE_RC_CHECK_PROBLEMS = -1205;
 inline constexpr int32_t UPGRADE_RC_CHECK_FAILED = -1069;
+// The current directory cannot hold the check's files under paths that fit.
+inline constexpr int32_t UPGRADE_RC_CHECK_DIRECTORY = -1927;
 inline constexpr int32_t UPGRADE_ODBC_NOT_AVAILABLE = 1168;
 
 // 0 when the user may upgrade; -1 with the reason in `status` (SQLCODE -1403:
@@ -24,7 +26,9 @@ int checkLocalAdmin(sqlca *status);
 // Refuses an active instance (-1953), then runs the database check tool of the
 // instance's copy over its databases from the current directory: 0 to go on
 // (warnings print message 1225), -1205 or -1069 with the record's tokens set,
-// or the program start's own failure.
+// -1927 when the current directory is too long to work in, -1918 when the
+// instance's installation cannot be switched to and back, or the program
+// start's own failure.
 int runDatabaseCheck(UpgradeContext &context, UpgradeOptions &options);
 
 // True when an ODBC data source uses the product's driver (of copy `copyName`,

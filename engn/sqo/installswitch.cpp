@@ -1,12 +1,13 @@
 #include "engn/sqo/installswitch.h"
 
+#include "engn/sqo/options.h"
 #include "install/kxlinstance.h"
 
 namespace {
 
-void makeCurrent(const char *copyName) {
-  sqloSwitchToInstallationName(copyName);
-  sqloPRegProfilePE(SQLO_PREG_REFRESH, nullptr, SQLO_PREG_ANY_NODE);
+bool makeCurrent(const char *copyName) {
+  return sqloSwitchToInstallationName(copyName) == 0 &&
+         sqloPRegProfilePE(SQLO_PREG_REFRESH, nullptr, SQLO_PREG_ANY_NODE) == 0;
 }
 
 } // namespace
@@ -18,18 +19,30 @@ bool currentInstallationName(char *name, uint32_t size) {
 
 InstallationSwitch::InstallationSwitch(const IKXLINSTANCE *instance) {
   char owner[SQLO_COPY_NAME_SZ] = {};
-  if (instance == nullptr || instance->GetCopyName(owner, sizeof owner) != 0)
+  if (instance == nullptr || instance->GetCopyName(owner, sizeof owner) != 0 ||
+      !currentInstallationName(current_, sizeof current_)) {
+    result_ = UPGRADE_RC_NO_COPY;
     return;
-  currentInstallationName(current_, sizeof current_);
+  }
   if (sqlomcpi(current_, owner, SQLO_COPY_NAME_SZ) == 0)
     return;
-  makeCurrent(owner);
+  // Marked before the attempt: a switch that failed half way is put back too.
   switched_ = true;
+  if (!makeCurrent(owner))
+    result_ = UPGRADE_RC_NO_COPY;
+}
+
+int32_t InstallationSwitch::end() {
+  if (switched_) {
+    switched_ = false;
+    if (!makeCurrent(current_))
+      result_ = UPGRADE_RC_NO_COPY;
+  }
+  return result_;
 }
 
 InstallationSwitch::~InstallationSwitch() {
-  if (switched_)
-    makeCurrent(current_);
+  end();
 }
 
 void putInstanceEnvironment(const char *instanceName) {

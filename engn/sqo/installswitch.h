@@ -7,7 +7,10 @@
 class IKXLINSTANCE;
 
 // Switches the library to the installation that owns `instance` when that is
-// not the current one, and back when it goes out of scope.
+// not the current one, and back with end() or when it goes out of scope.
+// When the current installation or the instance's own cannot be named, or a
+// switch fails, result() is -1918: profile reads would then be made in the
+// wrong installation, so the caller stops before it reads anything.
 class InstallationSwitch {
 public:
   explicit InstallationSwitch(const IKXLINSTANCE *instance);
@@ -15,11 +18,14 @@ public:
   InstallationSwitch(const InstallationSwitch &) = delete;
   InstallationSwitch &operator=(const InstallationSwitch &) = delete;
 
-  bool switched() const { return switched_; }
+  int32_t result() const { return result_; }
+  // Switches back now; result(), or -1918 when switching back failed.
+  int32_t end();
 
 private:
   char current_[SQLO_COPY_NAME_SZ] = {};
   bool switched_ = false;
+  int32_t result_ = 0;
 };
 
 // The name of the current installation; false when it cannot be had or is empty.

@@ -5,6 +5,7 @@
 #include "engn/sqo/boundedtext.h"
 #include "platform/kxlsys.h"
 
+#include <cctype>
 #include <cstdio>
 #include <cstring>
 
@@ -78,38 +79,45 @@ void fillCodePlaceholders(char *message, const char *prefix, int code, const Upg
   }
 }
 
-// The next non-empty piece of `text` between double quotes, from `*cursor`.
-bool nextPiece(const char *&cursor, const char *&piece, std::size_t &length) {
-  while (*cursor == '"')
-    ++cursor;
-  if (*cursor == '\0')
-    return false;
-  piece = cursor;
-  length = std::strcspn(cursor, "\"");
-  cursor += length;
-  return true;
+bool isPlaceholderNameCharacter(char c) {
+  return std::isalnum(static_cast<unsigned char>(c)) || c == '-' || c == '_';
 }
 
-// Each record token goes, in double quotes, where the next quoted piece stood.
-void spliceTokens(const char *message, const UpgradeOptions &options, TextBuilder &out) {
-  const char *cursor = message;
-  const char *piece = nullptr;
-  std::size_t length = 0;
-  uint32_t count = options.tokenCount < UPGRADE_MAX_TOKENS ? options.tokenCount : UPGRADE_MAX_TOKENS;
-  for (uint32_t i = 0; i < count; ++i) {
-    if (!nextPiece(cursor, piece, length))
-      return;
-    out.append(piece, length);
-    out.append('"');
-    out.append(orEmpty(options.tokens[i]));
-    out.append('"');
-    nextPiece(cursor, piece, length); // the placeholder's name
+// The next quoted placeholder ("<name>", quotes included) at or after `from`;
+// null when there is none. `end` gets the character after it.
+const char *nextQuotedPlaceholder(const char *from, const char *&end) {
+  for (const char *open = std::strstr(from, "\"<"); open != nullptr; open = std::strstr(open + 1, "\"<")) {
+    const char *name = open + 2;
+    const char *close = name;
+    while (isPlaceholderNameCharacter(*close))
+      ++close;
+    if (close != name && close[0] == '>' && close[1] == '"') {
+      end = close + 2;
+      return open;
+    }
   }
-  while (nextPiece(cursor, piece, length))
-    out.append(piece, length);
+  return nullptr;
 }
 
 } // namespace
+
+void spliceRecordTokens(const char *message, const UpgradeOptions &options, char *out, std::size_t size) {
+  TextBuilder text(out, size);
+  const char *cursor = orEmpty(message);
+  uint32_t count = options.tokenCount < UPGRADE_MAX_TOKENS ? options.tokenCount : UPGRADE_MAX_TOKENS;
+  for (uint32_t i = 0; i < count; ++i) {
+    const char *end = nullptr;
+    const char *open = nextQuotedPlaceholder(cursor, end);
+    if (open == nullptr)
+      break;
+    text.append(cursor, std::size_t(open - cursor));
+    text.append('"');
+    text.append(orEmpty(options.tokens[i]));
+    text.append('"');
+    cursor = end;
+  }
+  text.append(cursor);
+}
 
 const char *instanceTypeWord(uint32_t nodeType) {
   if (nodeType >= 1 && nodeType <= sizeof kInstanceTypeWords / sizeof kInstanceTypeWords[0])
@@ -159,9 +167,8 @@ void printInstanceMessage(const char *prefix, int code, const char *text, const 
       printInstanceFallback(prefix, text, code);
   } else {
     char spliced[SQLO_MSG_BUFFER_SZ];
-    TextBuilder out(spliced, sizeof spliced);
-    spliceTokens(message, *options, out);
-    writeText(out.text());
+    spliceRecordTokens(message, *options, spliced, sizeof spliced);
+    writeText(spliced);
   }
   pdtExit(kTraceInstanceMessage, 0, 0);
 }

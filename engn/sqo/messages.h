@@ -24,5 +24,11 @@ void printSuccessMessage(const char *prefix, int code);
 // it, ignoring case. Placeholders are therefore replaced in text order.
 void replaceMessageToken(char *message, std::size_t size, const char *placeholder, const char *value);
 
+// `message` with each of the record's tokens, in double quotes, where the
+// next quoted placeholder ("<name>") stands, wherever that is in the text;
+// the rest of the text stays as written. Tokens beyond the placeholders have
+// no place and are left out. The result is cut to `size` - 1 characters.
+void spliceRecordTokens(const char *message, const UpgradeOptions &options, char *out, std::size_t size);
+
 // The display word of a node type in message 1231; "" for an unknown type.
 const char *instanceTypeWord(uint32_t nodeType);

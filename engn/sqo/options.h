@@ -64,6 +64,8 @@ inline constexpr int32_t UPGRADE_RC_RESERVED_INSTANCE = -1139;
 inline constexpr int32_t UPGRADE_RC_BAD_VERSION = -1949;
 inline constexpr int32_t UPGRADE_RC_ALREADY_UPGRADED = 1950;
 inline constexpr int32_t UPGRADE_RC_SQLCA = -1; // the status block holds the reason
+inline constexpr int32_t UPGRADE_RC_NODE_TYPE_UNKNOWN =
+    -1926; // kxlsystm gives no node type (token: the file)
 
 // The instance-creation block that the services step hands to the instance
 // environment step. The front end writes only the text search fields.

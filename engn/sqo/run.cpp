@@ -54,6 +54,7 @@ enum CheckPoint : uint32_t {
   kCheckDatabases = 10,
   kCheckDriver = 11,
   kCheckNoInstance = 12,
+  kCheckNodeType = 13,
 };
 
 bool sameText(const char *a, const char *b, uint32_t length) {
@@ -116,16 +117,22 @@ InstallCopy *findInstance(UpgradeContext &context, const char *name, IKXLINSTANC
   return nullptr;
 }
 
-// True when the global profile of the instance's copy reserves its name.
-bool reservedByGlobalProfile(const IKXLINSTANCE *instance) {
+// -1139 when the global profile of the instance's copy reserves its name;
+// -1918 when that profile cannot be reached.
+int checkGlobalProfile(const IKXLINSTANCE *instance) {
   InstallationSwitch inCopy(instance);
+  if (inCopy.result() != 0)
+    return checkFailed(kCheckInstallationNames, inCopy.result());
   uint32_t variable = KXL_VAR_KXLRESERVEDINST;
   char value[SQLO_INSTANCE_NAME_SZ] = {};
   char name[SQLO_INSTANCE_NAME_SZ] = {};
   instance->GetName(name, sizeof name);
-  return sqloPRegValuePE(SQLO_PREG_GET, &variable, 0, value, KXL_GLOBAL_PROFILE_NAME, SQLO_PREG_ANY_NODE,
-                         sizeof value) == 0 &&
-         sameText(value, name, SQLO_INSTANCE_NAME_SZ);
+  bool reserved = sqloPRegValuePE(SQLO_PREG_GET, &variable, 0, value, KXL_GLOBAL_PROFILE_NAME,
+                                  SQLO_PREG_ANY_NODE, sizeof value) == 0 &&
+                  sameText(value, name, SQLO_INSTANCE_NAME_SZ);
+  if (inCopy.end() != 0)
+    return checkFailed(kCheckInstallationNames, inCopy.result());
+  return reserved ? checkFailed(kCheckGlobalProfile, UPGRADE_RC_RESERVED_INSTANCE) : 0;
 }
 
 int checkInstanceCopyVersion(InstallCopy *owner, UpgradeOptions &options) {
@@ -189,7 +196,23 @@ int checkAccount(UpgradeContext &context, UpgradeOptions &options) {
 struct RunState {
   char auditInstance[SQLO_INSTANCE_NAME_SZ] = {}; // the instance handed to the driver
   bool odbcSourceFound = false;
+  char tokenText[SQLO_PATH_SZ + 16] = {}; // a message token the options record points at
 };
+
+// The configuration file whose node type could not be read names itself in
+// the message, without the quotes of a quoted directory.
+int refuseUnknownNodeType(const IKXLINSTANCE *instance, UpgradeOptions &options, RunState &state) {
+  char path[sizeof state.tokenText] = {};
+  nodeTypeFilePath(instance, path, sizeof path);
+  const char *start = path[0] == '"' ? path + 1 : path;
+  std::size_t length = std::strlen(start);
+  if (length > 0 && start[length - 1] == '"')
+    --length;
+  copyTextCut(state.tokenText, sizeof state.tokenText, start, length);
+  options.tokenCount = 1;
+  options.tokens[0] = state.tokenText;
+  return checkFailed(kCheckNodeType, UPGRADE_RC_NODE_TYPE_UNKNOWN);
+}
 
 void lookForOdbcSources(RunState &state) {
   int32_t status = 0;
@@ -203,8 +226,12 @@ int upgradeFoundInstance(UpgradeContext &context, IKXLINSTANCE *instance, Upgrad
                          UpgradeDriver driver, RunState &state) {
   if (sqloIsContentExtenderInstalled(options.currentInstallPath) != 0)
     options.flags |= UPGRADE_FLAG_CONTENT_EXTENDER;
-  bindInstance(context, instance);
-  int rc = checkAccount(context, options);
+  int rc = bindInstance(context, instance);
+  if (rc == UPGRADE_RC_NODE_TYPE_UNKNOWN)
+    return refuseUnknownNodeType(instance, options, state);
+  if (rc != 0)
+    return checkFailed(kCheckInstallationNames, rc);
+  rc = checkAccount(context, options);
   if (rc == 0 && !isInstallerMode(options)) {
     rc = runDatabaseCheck(context, options);
     if (rc != 0)
@@ -231,8 +258,8 @@ int checkAndUpgrade(UpgradeContext &context, UpgradeOptions &options, UpgradeDri
   int rc = 0;
   if (owner == nullptr)
     rc = checkFailed(kCheckInstanceKnown, withInstanceToken(options, UPGRADE_RC_INSTANCE_UNKNOWN));
-  else if (reservedByGlobalProfile(instance))
-    rc = checkFailed(kCheckGlobalProfile, UPGRADE_RC_RESERVED_INSTANCE);
+  else
+    rc = checkGlobalProfile(instance);
   if (rc == 0) {
     setOwningCopy(context, owner);
     rc = checkLocalAdmin(&options.status);
@@ -438,22 +465,32 @@ void splitVar159(UpgradeContext &context, const char *value) {
 
 } // namespace
 
-void bindInstance(UpgradeContext &context, IKXLINSTANCE *instance) {
+int bindInstance(UpgradeContext &context, IKXLINSTANCE *instance) {
   pdtEntry(KXL_FN_BIND_INSTANCE);
   context.instance = instance;
   InstallationSwitch inCopy(instance);
-  char name[SQLO_INSTANCE_NAME_SZ] = {};
-  instance->GetName(name, sizeof name);
-  putInstanceEnvironment(name);
-  int32_t rc = readNodeType(instance, &context.nodeType);
-  if (rc != 0)
-    pdtError(KXL_FN_BIND_INSTANCE, 1, rc);
+  int rc = inCopy.result();
+  if (rc == 0) {
+    char name[SQLO_INSTANCE_NAME_SZ] = {};
+    instance->GetName(name, sizeof name);
+    putInstanceEnvironment(name);
+    int32_t readRc = readNodeType(instance, &context.nodeType);
+    if (readRc != 0 || !isKnownNodeType(context.nodeType)) {
+      pdtError(KXL_FN_BIND_INSTANCE, 1, readRc);
+      rc = UPGRADE_RC_NODE_TYPE_UNKNOWN;
+    }
+  }
   uint32_t variable = KXL_VAR_KXLPORTRANGE;
   char value[kVar159Size] = {};
-  if (sqloPRegValuePE(SQLO_PREG_GET, &variable, 0, value, nullptr, SQLO_PREG_ANY_NODE, sizeof value) == 0 &&
+  if (rc == 0 &&
+      sqloPRegValuePE(SQLO_PREG_GET, &variable, 0, value, nullptr, SQLO_PREG_ANY_NODE, sizeof value) == 0 &&
       value[0] != '\0')
     splitVar159(context, value);
-  pdtExit(KXL_FN_BIND_INSTANCE, 0, 0);
+  int32_t back = inCopy.end();
+  if (rc == 0)
+    rc = back;
+  pdtExit(KXL_FN_BIND_INSTANCE, rc, 0);
+  return rc;
 }
 
 void expandLongPath(const char *path, char *output, std::size_t size) {

@@ -63,8 +63,10 @@ int runUpgrade(int argc, const char *const *argv, UpgradeDriver driver);
 void setOwningCopy(UpgradeContext &context, InstallCopy *copy);
 
 // Binds the run to `instance`: KXLINSTANCE, node type, the two halves of
-// profile variable 159 (read in the instance's own installation).
-void bindInstance(UpgradeContext &context, IKXLINSTANCE *instance);
+// profile variable 159 (read in the instance's own installation). 0;
+// UPGRADE_RC_NODE_TYPE_UNKNOWN when kxlsystm gives no node type from 1 to 5;
+// -1918 when the instance's installation cannot be switched to and back.
+int bindInstance(UpgradeContext &context, IKXLINSTANCE *instance);
 
 // `path` with every existing component spelled as the file system has it
 // (drive prefix and \\server kept); the rest from the first missing component

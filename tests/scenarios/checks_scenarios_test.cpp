@@ -2,6 +2,8 @@
 #include "expected_texts.h"
 #include "scenario_fixture.h"
 
+#include "sim/kxlsim/world_reader.h"
+
 namespace {
 
 using kxlsim::localMachine;
@@ -154,6 +156,121 @@ TEST_F(CheckScenario, MessageFileFallsBackToEnglish) {
   run({"INST1"}, inDir);
   EXPECT_EQ(kxltest::readFile(copied),
             kxltest::readFile(std::string(KXL_MESSAGE_SOURCES) + "/de_DE/KXLDBMIG.TXT"));
+}
+
+// A failed read of which installation is current, or a switch between the
+// installations that fails either way, ends the run before anything changes:
+// profile reads in the wrong installation would otherwise take the old copy
+// for the current one.
+TEST_F(CheckScenario, InstallationThatCannotBeNamedOrSwitchedEndsTheRunUnchanged) {
+  struct Case {
+    const char *faults;
+    bool checkToolRan; // the switch back after the database check failed
+  } cases[] = {
+      {"sqloGetCurrentInstallationName:2", false}, // global profile check
+      {"sqloGetCurrentInstallationName:4", false}, // binding the instance
+      {"sqloGetCurrentInstallationName:5", false}, // database check
+      {"sqloSwitchToInstallationName:1", false},
+      {"sqloSwitchToInstallationName:2", false},
+      {"sqloSwitchToInstallationName:3", false},
+      {"sqloSwitchToInstallationName:4", false},
+      {"sqloPRegProfilePE:5", false},
+      {"sqloSwitchToInstallationName:6", true},
+  };
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.faults);
+    RunSetup setup;
+    setup.faults = c.faults;
+    RunResult r = run({"INST1"}, setup);
+    EXPECT_EQ(r.result, -1918);
+    EXPECT_EQ(r.out, "KXL1918E  The installed copies of the product, or the copy this command belongs to, "
+                     "cannot be found.\n");
+    std::string changed = changes(r);
+    if (c.checkToolRan)
+      EXPECT_EQ(changed.find("registry"), std::string::npos) << changed;
+    else
+      EXPECT_EQ(changed, "");
+    EXPECT_TRUE(kxltest::eventsOf(r, "audit").empty()) << "nothing was upgraded";
+  }
+  EXPECT_EQ(run({"INST1"}).result, 0);
+}
+
+// The node type decides which services the instance gets; an instance whose
+// kxlsystm gives none is refused before anything changes, naming the file.
+TEST_F(CheckScenario, InstanceWithoutAReadableNodeTypeIsRefusedNamingTheFile) {
+  const std::string file = std::string(kOldCopy) + "\\INST1\\kxlsystm";
+  std::vector<uint8_t> image;
+  ASSERT_TRUE(kxlsim::readFileHead(file, 1 << 20, image));
+  auto withNodeType = [&](uint8_t type) {
+    std::vector<uint8_t> changed = image;
+    changed[40] = type;
+    changed[41] = 0;
+    return changed;
+  };
+  struct Case {
+    const char *what;
+    std::vector<uint8_t> content;
+    const char *faults;
+  } cases[] = {
+      {"empty file", {}, ""},
+      {"cut before the node type", std::vector<uint8_t>(image.begin(), image.begin() + 41), ""},
+      {"node type 0", withNodeType(0), ""},
+      {"node type 6", withNodeType(6), ""},
+      {"failed open", image, "sqloopenp:4"},
+      {"failed read", image, "sqloread:5"},
+  };
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.what);
+    world.writeFile(file, c.content);
+    RunSetup setup;
+    setup.faults = c.faults;
+    RunResult r = run({"INST1"}, setup);
+    EXPECT_EQ(r.result, -1926);
+    EXPECT_EQ(r.out, "KXL1926E  The node type of the instance cannot be read from its database manager "
+                     "configuration file \"" +
+                         file + "\". The instance was not changed.\n");
+    EXPECT_EQ(changes(r), "");
+  }
+  EXPECT_EQ(run({"INST1"}).result, 0) << "the file as it was upgrades";
+}
+
+// The check tool works in the current directory: its log-file argument and
+// the copy of its explanation must be whole paths there, or the run stops
+// before the tool starts.
+TEST_F(CheckScenario, CurrentDirectoryTooLongForTheCheckIsRefused) {
+  setToolExit(7);
+  auto directoryOf = [](std::size_t length) {
+    std::string path = "C:";
+    while (path.size() < length) {
+      std::size_t part = std::min<std::size_t>(length - path.size() - 1, 100);
+      path += "\\" + std::string(part, 'd');
+    }
+    return path;
+  };
+  struct Case {
+    std::size_t length;
+    bool refused;
+  } cases[] = {{246, false}, {247, true}, {250, true}, {254, true}, {300, true}};
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.length);
+    RunSetup setup;
+    setup.cwd = directoryOf(c.length);
+    ASSERT_EQ(setup.cwd.size(), c.length);
+    RunResult r = run({"INST1"}, setup);
+    if (!c.refused) {
+      EXPECT_EQ(r.result, -1069);
+      ASSERT_EQ(kxltest::eventsOf(r, "program").size(), 1u);
+      EXPECT_NE(kxltest::eventsOf(r, "program")[0].find("\\\\upgrade.log -t "), std::string::npos);
+      continue;
+    }
+    EXPECT_EQ(r.result, -1927);
+    EXPECT_EQ(r.out, "KXL1927E  The current directory is too long to hold the files of the database check. "
+                     "Run the command from a directory with a shorter path. The instance was not "
+                     "changed.\n");
+    EXPECT_EQ(changes(r), "");
+  }
+  setToolExit(0);
+  EXPECT_EQ(run({"INST1"}).result, 0);
 }
 
 } // namespace

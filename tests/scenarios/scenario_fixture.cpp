@@ -133,6 +133,8 @@ RunResult ScenarioTest::run(const std::vector<std::string> &args, const RunSetup
     command.settings.push_back(std::string("KXLINSTANCE=") + setup.kxlinstance);
   if (!setup.driver.empty())
     command.settings.push_back("KXLTEST_DRIVER=" + setup.driver);
+  if (!setup.faults.empty())
+    command.settings.push_back("KXLSIM_FAIL=" + setup.faults);
   command.cwd = hostPath(setup.cwd);
   command.outFile = out;
   command.errFile = err;

@@ -26,6 +26,7 @@ struct RunSetup {
   const char *kxlinstance = nullptr;       // KXLINSTANCE at start; null: unset
   std::string program = "kxliupgrade.exe"; // name in the current copy's bin
   std::string driver;                      // KXLTEST_DRIVER for the stand-in driver
+  std::string faults;                      // KXLSIM_FAIL for the command ("" none)
 };
 
 class ScenarioTest : public ::testing::Test {

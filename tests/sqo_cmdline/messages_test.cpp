@@ -152,19 +152,35 @@ TEST_F(MessageWorld, RecordTokensAreSplicedInQuotes) {
             two);
 }
 
-TEST_F(MessageWorld, TokensBeyondThePlaceholdersStopTheSplice) {
-  installCatalogs();
-  options.tokenCount = 2;
-  options.tokens[0] = "INST1";
-  options.tokens[1] = "EXTRA";
-  std::string out =
-      captured([&] { printInstanceMessage("KXLIMIGR", 1950, "processing complete", &options); });
-  EXPECT_EQ(0u, out.find("KXL1950W  The instance \"INST1\" already belongs")) << out;
-  EXPECT_NE(std::string::npos, out.find("\"EXTRA\"")) << out;
-
-  options.tokenCount = 200; // never read past the two token slots
-  out = captured([&] { printInstanceMessage("KXLIMIGR", 1950, "processing complete", &options); });
-  EXPECT_EQ(0u, out.find("KXL1950W")) << out;
+TEST(SpliceRecordTokens, EachTokenStandsWhereItsPlaceholderStands) {
+  struct Case {
+    const char *text;
+    uint8_t count;
+    const char *expected;
+  } cases[] = {
+      {"\"<log-file>\" holds the details.\n", 1, "\"A\" holds the details.\n"},
+      {"See \"<log-file>\"", 1, "See \"A\""},
+      {"\"<a>\"\"<b>\" and more", 2, "\"A\"\"B\" and more"},
+      {"Program \"<p>\" ended with \"<c>\".", 2, "Program \"A\" ended with \"B\"."},
+      {"A \"quoted\" word, then \"<v>\".", 1, "A \"quoted\" word, then \"A\"."},
+      {"Only \"<v>\" here.", 2, "Only \"A\" here."},
+      {"Two \"<v>\" and \"<w>\".", 1, "Two \"A\" and \"<w>\"."},
+      {"Nothing to fill.", 200, "Nothing to fill."},
+  };
+  UpgradeOptions options{};
+  options.tokens[0] = "A";
+  options.tokens[1] = "B";
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.text);
+    options.tokenCount = c.count;
+    char out[128];
+    spliceRecordTokens(c.text, options, out, sizeof out);
+    EXPECT_STREQ(c.expected, out);
+  }
+  char small[8];
+  options.tokenCount = 1;
+  spliceRecordTokens("\"<v>\" is long", options, small, sizeof small);
+  EXPECT_STREQ("\"A\" is ", small);
 }
 
 TEST_F(MessageWorld, InstanceTypeMessageNamesBothTypes) {
