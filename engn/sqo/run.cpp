@@ -83,13 +83,15 @@ void dropTrailingBackslash(char *path) {
     path[length - 1] = '\0';
 }
 
-// Version and release of a copy; 0, 0 when its version cannot be read.
-void copyVersion(InstallCopy *copy, int32_t &version, int32_t &release) {
+// Version and release of a copy; false when its version cannot be read,
+// which is never taken for a version 0.
+bool copyVersion(InstallCopy *copy, int32_t &version, int32_t &release) {
   CopyVersion *record = nullptr;
-  copy->GetVersion(&record);
-  version = record != nullptr ? record->version : 0;
-  release = record != nullptr ? record->release : 0;
+  bool read = copy->GetVersion(&record) == 0 && record != nullptr;
+  version = read ? record->version : 0;
+  release = read ? record->release : 0;
   delete record;
+  return read;
 }
 
 // Any executable whose path lacks the tool's name counts as the legacy command.
@@ -139,7 +141,8 @@ int checkInstanceCopyVersion(InstallCopy *owner, UpgradeOptions &options) {
   if (isInstallerMode(options))
     return 0;
   int32_t version = 0, release = 0;
-  copyVersion(owner, version, release);
+  if (!copyVersion(owner, version, release))
+    return checkFailed(kCheckInstanceVersion, UPGRADE_RC_NO_COPY);
   if (version > 9 || (version == 9 && release >= 7))
     return checkFailed(kCheckInstanceVersion, withInstanceToken(options, UPGRADE_RC_BAD_VERSION));
   return 0;
@@ -156,7 +159,8 @@ int checkCopies(UpgradeContext &context, const IKXLINSTANCE *instance, UpgradeOp
   if (context.copies->Find(current, &currentCopy) != 0)
     return checkFailed(kCheckCurrentCopy, UPGRADE_RC_NO_COPY);
   int32_t version = 0, release = 0;
-  copyVersion(currentCopy, version, release);
+  if (!copyVersion(currentCopy, version, release))
+    return checkFailed(kCheckCurrentVersion, UPGRADE_RC_NO_COPY);
   if (version < 9)
     return checkFailed(kCheckCurrentVersion, withInstanceToken(options, UPGRADE_RC_BAD_VERSION));
   return 0;

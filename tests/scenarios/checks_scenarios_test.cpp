@@ -59,6 +59,25 @@ TEST_F(CheckScenario, CopyVersionsOutsideTheUpgradeRangeAreRefused) {
   EXPECT_EQ(installer.result, 2);
 }
 
+// A copy's version that cannot be read is never taken for version 0, which
+// would let an instance of a newer copy through or refuse the current copy.
+TEST_F(CheckScenario, CopyVersionThatCannotBeReadEndsTheRunUnchanged) {
+  struct Case {
+    const char *copy;
+    const char *release;
+  } cases[] = {{"KXL95", "5"}, {"KXL101", "1"}};
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.copy);
+    std::string key = std::string("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\") + c.copy + "\\CurrentVersion";
+    world.setString(localMachine(), key, "Release", std::string(300, '7'));
+    RunResult r = run({"INST1"});
+    EXPECT_EQ(r.result, -1918);
+    EXPECT_EQ(changes(r), "");
+    world.setString(localMachine(), key, "Release", c.release);
+  }
+  EXPECT_EQ(run({"INST1"}).result, 0);
+}
+
 TEST_F(CheckScenario, InstanceReservedByTheGlobalProfileIsRefused) {
   world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\GLOBAL_PROFILE",
                   "KXLRESERVEDINST", "inst1");
