@@ -40,8 +40,9 @@ constexpr uint32_t kProbeDbmConfig = 130;
 constexpr uint32_t kProbeAuthType = 140;
 constexpr uint32_t kProbeFunctionDir = 190;
 constexpr uint32_t kProbeCluster = 200;
-constexpr uint32_t kProbeForcedKeys = 210; // diagnostic log only
-constexpr uint32_t kProbeDropFailed = 310; // diagnostic log only
+constexpr uint32_t kProbeForcedKeys = 210;     // diagnostic log only
+constexpr uint32_t kProbeDropFailed = 310;     // diagnostic log only
+constexpr uint32_t kProbeUndoIncomplete = 320; // diagnostic log only
 
 bool isPartitioned(const DriverState &state) {
   return state.options.partitionedInstance == 1 || state.context.nodeType == kPartitionedNodeType;
@@ -224,16 +225,33 @@ StepResult cleanProfileRegistry(DriverState &) {
 using Step = StepResult (*)(DriverState &);
 
 // The upgrade, in order.
+// clang-format off
 constexpr Step kSteps[] = {
-    takeInstanceName,   refuseActiveInstance, requireNodeList,
-    findCurrentCopy,    readInstanceNodeType, checkCurrentEdition,
-    makeBackup,         copyToNewProfilePath, moveProfile,
-    keepAudit,          upgradeServices,      upgradeAudit,
-    upgradeSsl,         rereadCopies,         findUpgradedInstance,
-    prepareEnvironment, convertConfiguration, applyAuthenticationType,
-    carryFiles,         copyFunctions,        upgradeCluster,
-    dropForcedKeys,     cleanProfileRegistry,
+    takeInstanceName,
+    refuseActiveInstance,
+    requireNodeList,
+    findCurrentCopy,
+    readInstanceNodeType,
+    checkCurrentEdition,
+    makeBackup,
+    copyToNewProfilePath,
+    moveProfile,
+    keepAudit,
+    upgradeServices,
+    upgradeAudit,
+    upgradeSsl,
+    rereadCopies,
+    findUpgradedInstance,
+    prepareEnvironment,
+    convertConfiguration,
+    applyAuthenticationType,
+    carryFiles,
+    copyFunctions,
+    upgradeCluster,
+    dropForcedKeys,
+    cleanProfileRegistry,
 };
+// clang-format on
 
 void releaseCopies(DriverState &state) {
   delete state.rereadCopies;
@@ -274,6 +292,9 @@ void reportUndo(DriverState &state, bool changed, bool complete) {
     std::memcpy(options.keptBackupDir, state.backupDir, sizeof options.keptBackupDir);
     options.keptBackupDir[sizeof options.keptBackupDir - 1] = '\0';
     state.backupChosen = false;
+    pdLog(PD_LEVEL_SEVERE, KXL_FN_UPGRADE_INSTANCE, kProbeUndoIncomplete, 0,
+          "instance %s not restored completely; the backup of its directory is kept in %s",
+          state.instanceName, options.keptBackupDir);
   } else if (!complete) {
     options.undoOutcome = UPGRADE_UNDO_INCOMPLETE;
   } else if (changed) {

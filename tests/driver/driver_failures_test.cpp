@@ -300,6 +300,7 @@ TEST_F(DriverFailureTest, FailedRestoreKeepsTheBackupAndSaysWhere) {
   ASSERT_NE(open, std::string::npos) << outcome.out;
   std::string backup = outcome.out.substr(open + 1, outcome.out.find('"', open + 1) - open - 1);
   EXPECT_EQ(treeDifferences(before, tree(backup)), "");
+  EXPECT_NE(diagnosticLog().find("kept in " + backup), std::string::npos) << diagnosticLog();
   expectRerunUpgrades({"-p", kOldCopy, "INST1"});
 }
 
