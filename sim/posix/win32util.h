@@ -29,7 +29,21 @@ DWORD copyStringOut(std::string_view text, LPSTR buffer, DWORD capacity);
 DWORD win32ErrorFromErrno(int err, const std::string &host);
 
 // ASCII case-insensitive equality, as Windows compares names.
-bool equalsIgnoringCase(std::string_view a, std::string_view b);
+inline bool equalsIgnoringCase(std::string_view a, std::string_view b) {
+  if (a.size() != b.size())
+    return false;
+  for (size_t i = 0; i < a.size(); ++i) {
+    unsigned char x = static_cast<unsigned char>(a[i]);
+    unsigned char y = static_cast<unsigned char>(b[i]);
+    if (x >= 'A' && x <= 'Z')
+      x = static_cast<unsigned char>(x - 'A' + 'a');
+    if (y >= 'A' && y <= 'Z')
+      y = static_cast<unsigned char>(y - 'A' + 'a');
+    if (x != y)
+      return false;
+  }
+  return true;
+}
 
 // Maps a Windows path into the world; sets ERROR_PATH_NOT_FOUND when it
 // cannot lie there.

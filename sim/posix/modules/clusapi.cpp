@@ -217,7 +217,7 @@ DWORD controlText(const std::string &text, LPVOID out, DWORD capacity, LPDWORD r
 
 } // namespace
 
-namespace kxlsim::posix::clusapi {
+KXL_MODULE_ENTRY_POINTS(clusapi)
 
 DWORD WINAPI MoveClusterGroup(HGROUP hGroup, HNODE hDestinationNode) {
   if (kxlsim::shouldFail("MoveClusterGroup"))
@@ -634,7 +634,7 @@ DWORD WINAPI GetNodeClusterState(LPCWSTR lpszNodeName, LPDWORD pdwClusterState) 
   return ERROR_SUCCESS;
 }
 
-} // namespace kxlsim::posix::clusapi
+KXL_MODULE_ENTRY_POINTS_END
 
 namespace kxlsim::posix {
 

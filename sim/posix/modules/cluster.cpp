@@ -48,6 +48,12 @@ ResourceObject *liveResource(HRESOURCE handle) {
 }
 
 std::string localComputerName() {
+  // The machine identity first, as the product library does: on Windows the
+  // system's name is not the name the world gives the machine.
+  std::string identity;
+  if (reg::readString(HKEY_LOCAL_MACHINE, "SOFTWARE\\ZAV\\KXLSIM\\Identity", "ComputerName", identity) &&
+      !identity.empty())
+    return identity;
   char name[256];
   DWORD size = sizeof name;
   return GetComputerNameA(name, &size) ? std::string(name, size) : std::string();

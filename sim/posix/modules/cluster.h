@@ -13,6 +13,18 @@
 #include <string>
 #include <vector>
 
+// The entry points of a module: in the simulated machine's own namespace, or,
+// in the Windows build where each module is a DLL, the DLL's exports.
+#ifdef _WIN32
+#define KXL_MODULE_ENTRY_POINTS(module)                                                                      \
+  namespace kxlsim::posix::module {}                                                                         \
+  extern "C" {
+#define KXL_MODULE_ENTRY_POINTS_END }
+#else
+#define KXL_MODULE_ENTRY_POINTS(module) namespace kxlsim::posix::module {
+#define KXL_MODULE_ENTRY_POINTS_END }
+#endif
+
 namespace kxlsim::posix::cluster {
 
 constexpr const char *kClusterKey = "SOFTWARE\\ZAV\\KXLSIM\\Cluster";

@@ -26,9 +26,30 @@ bool serviceKey(LPCWSTR wide, std::string &key) {
   return true;
 }
 
+// The type of a resource opened through the cluster API.
+#ifdef _WIN32
+// In the Windows build the handle belongs to clusapi.dll, a module of its own:
+// the type is asked of it, as the system's resource utility library does.
+bool resourceType(HRESOURCE resource, std::string &type) {
+  WCHAR wide[256] = {};
+  DWORD bytes = 0;
+  if (resource == nullptr ||
+      ClusterResourceControl(resource, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, wide,
+                             sizeof wide - sizeof wide[0], &bytes) != ERROR_SUCCESS)
+    return false;
+  return narrowName(wide, type);
+}
+#else
+bool resourceType(HRESOURCE handle, std::string &type) {
+  ResourceObject *resource = liveResource(handle);
+  return resource != nullptr &&
+         reg::readString(HKEY_LOCAL_MACHINE, resourceKey(resource->name), "Type", type);
+}
+#endif
+
 } // namespace
 
-namespace kxlsim::posix::resutils {
+KXL_MODULE_ENTRY_POINTS(resutils)
 
 // Services of the world have no service-manager handles: the handle out, when
 // asked for, is null and needs no closing.
@@ -60,14 +81,12 @@ BOOL WINAPI ResUtilResourceTypesEqual(LPCWSTR lpszResourceTypeName, HRESOURCE hR
   if (kxlsim::shouldFail("ResUtilResourceTypesEqual"))
     return FALSE;
   std::string wanted, actual;
-  ResourceObject *resource = liveResource(hResource);
-  if (resource == nullptr || !narrowName(lpszResourceTypeName, wanted) ||
-      !reg::readString(HKEY_LOCAL_MACHINE, resourceKey(resource->name), "Type", actual))
+  if (!narrowName(lpszResourceTypeName, wanted) || !resourceType(hResource, actual))
     return FALSE;
   return equalsIgnoringCase(wanted, actual) ? TRUE : FALSE;
 }
 
-} // namespace kxlsim::posix::resutils
+KXL_MODULE_ENTRY_POINTS_END
 
 namespace kxlsim::posix {
 
