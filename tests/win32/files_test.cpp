@@ -126,6 +126,11 @@ TEST_F(FilesTest, WildcardsMatchIgnoringCaseAndListFolders) {
   Found all = findAll(at("*"));
   EXPECT_EQ((std::set<string>{".", "..", "a.txt", "b.TXT", "c.log", "sub"}), all.names);
   EXPECT_EQ((std::set<string>{".", "..", "sub"}), all.folders);
+
+  // An empty one lists those two as well: finding nothing there is a failure.
+  Found empty = findAll(at("sub\\*"));
+  EXPECT_EQ((std::set<string>{".", ".."}), empty.names);
+  EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), empty.end);
 }
 
 TEST_F(FilesTest, FindWithoutMatchTellsFileFromPath) {
