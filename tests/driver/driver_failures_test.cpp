@@ -134,6 +134,7 @@ TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
   } cases[] = {
       {{"INST1"}, "sqlocopydir:2", 60, -1969},
       {{"INST1"}, "sqloQueryNTServiceConfig:1", 90, -1925},
+      {{"INST1"}, "sqloGetCurrentInstallationName:8", 90, -1918}, // in the services step
       {{"INST1"}, "sqlo_instance_create_extended:1", 90, 0},
       {{"-install", "INST1"}, "sqloexec2:1", 95, kExecFailed},
       {{"-install", "INST1"}, "sqloexec2:2", 97, kExecFailed},
