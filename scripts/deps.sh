@@ -1,11 +1,12 @@
 #!/usr/bin/env bash
 # Installs the Debian packages the build needs, when they are missing.
 # Usage: scripts/deps.sh [--windows]   (--windows adds the cross compiler and Wine,
-# and the host's unixODBC library, without which Wine's odbc32 fails every call)
+# the host's unixODBC library, without which Wine's odbc32 fails every call, and
+# wixl, which builds the Windows Installer packages of the parity suite)
 set -euo pipefail
 pkgs=(cmake ninja-build g++ libgtest-dev libgmock-dev googletest nlohmann-json3-dev gettext libbenchmark-dev)
 if [ "${1:-}" = "--windows" ]; then
-  pkgs+=(g++-mingw-w64-x86-64 wine64 libodbc2)
+  pkgs+=(g++-mingw-w64-x86-64 wine64 libodbc2 wixl)
 fi
 missing=()
 for p in "${pkgs[@]}"; do
