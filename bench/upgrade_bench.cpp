@@ -262,7 +262,7 @@ public:
                  const std::string &fail = "") {
     fs::path work = scratch_ / "work";
     run({"/bin/rm", "-rf", work.string()});
-    if (!run({"/bin/cp", "-a", pristine.string(), work.string()}))
+    if (!run({"/bin/cp", "-a", pristine.string(), work.string()}) || !run({"/bin/sync"}))
       return -1;
     return command(work, args, expected, fail);
   }
@@ -283,6 +283,7 @@ public:
     for (int i = 0; i < times; ++i) {
       fs::path target = scratch_ / "cpa";
       run({"/bin/rm", "-rf", target.string()});
+      run({"/bin/sync"}); // what the last round wrote does not slow this one
       double t = runTimed({"/bin/cp", "-a", dir.string(), target.string()}, {}, 0);
       if (t < 0)
         return -1;

@@ -24,15 +24,22 @@ bool isDirectory(const std::string &host) {
   return stat(host.c_str(), &info) == 0 && S_ISDIR(info.st_mode);
 }
 
+bool makeDirectory(const std::string &host) {
+  if (mkdir(host.c_str(), 0777) != 0)
+    return false;
+  noteEntryAdded(host);
+  return true;
+}
+
 // Creates every missing directory of `host` below the world root.
 bool makeDirectories(const std::string &host) {
   for (size_t cut = host.find('/', worldRoot().size() + 1); cut != std::string::npos;
        cut = host.find('/', cut + 1)) {
     std::string prefix = host.substr(0, cut);
-    if (!prefix.empty() && !isDirectory(prefix) && mkdir(prefix.c_str(), 0777) != 0 && errno != EEXIST)
+    if (!prefix.empty() && !isDirectory(prefix) && !makeDirectory(prefix) && errno != EEXIST)
       return false;
   }
-  return isDirectory(host) || (mkdir(host.c_str(), 0777) == 0);
+  return isDirectory(host) || makeDirectory(host);
 }
 
 // Windows writes directories without a trailing backslash except roots.

@@ -4,6 +4,7 @@
 #include "platform/win32.h"
 #include "sim/common/simfail.h"
 #include "sim/posix/win32util.h"
+#include "sim/posix/world.h"
 
 #include <cerrno>
 #include <fcntl.h>
@@ -87,6 +88,8 @@ HANDLE CreateFileA(LPCSTR lpFileName, DWORD dwDesiredAccess, DWORD, LPSECURITY_A
   if (fd < 0)
     return failWith(errno == EEXIST ? ERROR_FILE_EXISTS : win32ErrorFromErrno(errno, host),
                     INVALID_HANDLE_VALUE);
+  if (!existed)
+    noteEntryAdded(host);
   auto file = std::make_unique<FileObject>();
   file->fd = fd;
   bool reportsExisting = dwCreationDisposition == CREATE_ALWAYS || dwCreationDisposition == OPEN_ALWAYS;

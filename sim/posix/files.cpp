@@ -13,7 +13,9 @@
 #include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
+#include <linux/fs.h>
 #include <string>
+#include <sys/ioctl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <vector>
@@ -174,16 +176,34 @@ bool startTransfer(const char *function, LPCSTR from, LPCSTR to, std::string &so
   return startOnExisting(function, from, source, info) && mapPath(to, target);
 }
 
+// Shares the source's blocks where the file system can (FICLONE), else lets
+// the kernel copy (copy_file_range), else reads and writes large blocks.
 bool copyFileContents(int from, int to) {
-  char chunk[65536];
+  if (ioctl(to, FICLONE, from) == 0)
+    return true;
+  bool started = false;
   for (;;) {
-    ssize_t got = read(from, chunk, sizeof chunk);
+    ssize_t got = copy_file_range(from, nullptr, to, nullptr, size_t(1) << 30, 0);
+    if (got < 0 && errno == EINTR)
+      continue;
+    if (got == 0)
+      return true;
+    if (got < 0) {
+      if (started || (errno != EXDEV && errno != EINVAL && errno != ENOSYS && errno != EOPNOTSUPP))
+        return false;
+      break; // not offered here: copy by hand
+    }
+    started = true;
+  }
+  std::vector<char> chunk(size_t(1) << 20);
+  for (;;) {
+    ssize_t got = read(from, chunk.data(), chunk.size());
     if (got < 0 && errno == EINTR)
       continue;
     if (got <= 0)
       return got == 0;
     for (ssize_t done = 0; done < got;) {
-      ssize_t put = write(to, chunk + done, static_cast<size_t>(got - done));
+      ssize_t put = write(to, chunk.data() + done, static_cast<size_t>(got - done));
       if (put < 0 && errno == EINTR)
         continue;
       if (put <= 0)
@@ -191,6 +211,18 @@ bool copyFileContents(int from, int to) {
       done += put;
     }
   }
+}
+
+// What `cp -a` keeps of a copied file: its permission bits exactly (not
+// narrowed by the umask), owner and group where this process may set them,
+// and its access and modification times.
+bool keepMetadata(int to, const struct stat &source) {
+  // Giving a file away needs privilege; without it the copy stays this
+  // process's (its group kept where allowed), as with cp -a.
+  if (fchown(to, source.st_uid, source.st_gid) != 0)
+    (void)!fchown(to, static_cast<uid_t>(-1), source.st_gid);
+  struct timespec times[2] = {source.st_atim, source.st_mtim};
+  return fchmod(to, source.st_mode & 07777) == 0 && futimens(to, times) == 0;
 }
 
 // The host target of a rename: the mapped path, except that renaming a name to
@@ -276,6 +308,7 @@ BOOL CreateDirectoryA(LPCSTR lpPathName, LPSECURITY_ATTRIBUTES) {
     return FALSE;
   if (mkdir(host.c_str(), 0777) != 0)
     return failWith(win32ErrorFromErrno(errno, host), FALSE);
+  noteEntryAdded(host);
   return TRUE;
 }
 
@@ -288,6 +321,7 @@ BOOL RemoveDirectoryA(LPCSTR lpPathName) {
     return failWith(kErrorDirectory, FALSE);
   if (rmdir(host.c_str()) != 0)
     return failWith(errno == EEXIST ? ERROR_DIR_NOT_EMPTY : win32ErrorFromErrno(errno, host), FALSE);
+  noteEntryRemoved(host);
   return TRUE;
 }
 
@@ -300,6 +334,7 @@ BOOL DeleteFileA(LPCSTR lpFileName) {
     return failWith(ERROR_ACCESS_DENIED, FALSE);
   if (unlink(host.c_str()) != 0)
     return failWith(win32ErrorFromErrno(errno, host), FALSE);
+  noteEntryRemoved(host);
   return TRUE;
 }
 
@@ -326,12 +361,12 @@ BOOL CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, BOOL bFailIfExis
     close(from);
     return failWith(code, FALSE);
   }
-  bool copied = copyFileContents(from, to);
-  struct timespec times[2] = {info.st_atim, info.st_mtim};
-  futimens(to, times);
+  noteEntryAdded(target);
+  bool copied = copyFileContents(from, to) && keepMetadata(to, info);
   close(from);
   if (close(to) != 0 || !copied) {
     unlink(target.c_str());
+    noteEntryRemoved(target);
     return failWith(ERROR_WRITE_FAULT, FALSE);
   }
   return TRUE;
@@ -352,6 +387,8 @@ BOOL MoveFileExA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, DWORD dwFlags)
   }
   if (rename(source.c_str(), target.c_str()) != 0)
     return failWith(win32ErrorFromErrno(errno, target), FALSE);
+  noteEntryRemoved(source);
+  noteEntryAdded(target);
   return TRUE;
 }
 

@@ -11,7 +11,7 @@
 #include <cstring>
 #include <fstream>
 #include <mutex>
-#include <strings.h>
+#include <unordered_map>
 #include <vector>
 
 namespace kxlsim::posix {
@@ -165,10 +165,10 @@ std::string currentWindowsDirectory() {
 std::string absoluteWindowsPath(std::string_view p) {
   if (p.size() >= 2 && isSep(p[0]) && isSep(p[1]))
     return std::string(p);
+  if (hasDrive(p) && p.size() > 2 && isSep(p[2]))
+    return std::string(p); // absolute already: the current directory is not needed
   std::string current = currentWindowsDirectory();
   if (hasDrive(p)) {
-    if (p.size() > 2 && isSep(p[2]))
-      return std::string(p);
     // "X:name" is relative to the current directory when that is on drive X.
     if (upperDrive(p[0]) == upperDrive(current[0]) && current[1] == ':')
       return current + "\\" + std::string(p.substr(2));
@@ -198,35 +198,110 @@ bool splitWindowsPath(std::string_view absolute, SplitPath &out) {
   return out.parts[0] != "?" && out.parts[0] != ".";
 }
 
+// A folder's names by their ASCII-lower-cased spelling (the smallest spelling
+// of each), from one listing, kept while the folder's change times stay as they
+// were when it was listed, or changed only by this process's own entries.
+struct Listing {
+  struct timespec mtime {
+  }, ctime{};
+  dev_t dev = 0;
+  ino_t ino = 0;
+  std::unordered_map<std::string, std::string> names;
+};
+
+constexpr size_t kMaxListings = 64;
+std::mutex listingMutex;
+std::unordered_map<std::string, Listing> listings; // by host folder
+
+bool sameTime(const struct timespec &a, const struct timespec &b) {
+  return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec;
+}
+
+bool listingCurrent(const Listing &listing, const struct stat &st) {
+  return listing.dev == st.st_dev && listing.ino == st.st_ino && sameTime(listing.mtime, st.st_mtim) &&
+         sameTime(listing.ctime, st.st_ctim);
+}
+
+void stampListing(Listing &listing, const struct stat &st) {
+  listing.dev = st.st_dev;
+  listing.ino = st.st_ino;
+  listing.mtime = st.st_mtim;
+  listing.ctime = st.st_ctim;
+}
+
+std::string folded(std::string name) {
+  for (char &c : name)
+    if (c >= 'A' && c <= 'Z')
+      c = static_cast<char>(c - 'A' + 'a');
+  return name;
+}
+
+void addName(Listing &listing, const std::string &name) {
+  auto [it, inserted] = listing.names.try_emplace(folded(name), name);
+  if (!inserted && name < it->second)
+    it->second = name;
+}
+
+// The listing of `dir` as it is now: the kept one, or a new one. Null when the
+// folder cannot be read. The caller holds listingMutex.
+const Listing *currentListing(const std::string &dir) {
+  struct stat st {};
+  if (stat(dir.c_str(), &st) != 0)
+    return nullptr;
+  auto kept = listings.find(dir);
+  if (kept != listings.end() && listingCurrent(kept->second, st))
+    return &kept->second;
+  // The times are taken before the listing: a change made while it is read
+  // gives the folder later times, so the listing is not kept past it.
+  Listing fresh;
+  stampListing(fresh, st);
+  DIR *d = opendir(dir.c_str());
+  if (d == nullptr)
+    return nullptr;
+  while (const dirent *entry = readdir(d))
+    addName(fresh, entry->d_name);
+  closedir(d);
+  if (listings.size() >= kMaxListings)
+    listings.clear();
+  return &(listings[dir] = std::move(fresh));
+}
+
+// What lies at `path` (following links): 1 a folder, 0 something else, -1 nothing.
+int entryKind(const std::string &path) {
+  struct stat st {};
+  if (stat(path.c_str(), &st) == 0)
+    return S_ISDIR(st.st_mode) ? 1 : 0;
+  return lstat(path.c_str(), &st) == 0 ? 0 : -1; // a dangling link is an entry too
+}
+
 // The existing entry of `dir` that equals `name` ignoring case; the exact name
 // wins, then the smallest one so the choice does not depend on listing order.
-bool matchEntry(const std::string &dir, const std::string &name, std::string &found) {
-  struct stat st {};
-  if (lstat((dir + "/" + name).c_str(), &st) == 0) {
+bool matchEntry(const std::string &dir, const std::string &name, std::string &found, int &kind) {
+  kind = entryKind(dir + "/" + name);
+  if (kind >= 0) {
     found = name;
     return true;
   }
-  DIR *d = opendir(dir.c_str());
-  if (d == nullptr)
+  std::lock_guard<std::mutex> lock(listingMutex);
+  const Listing *listing = currentListing(dir);
+  if (listing == nullptr)
     return false;
-  bool any = false;
-  while (const dirent *entry = readdir(d)) {
-    if (strcasecmp(entry->d_name, name.c_str()) == 0 && (!any || found > entry->d_name)) {
-      found = entry->d_name;
-      any = true;
-    }
-  }
-  closedir(d);
-  return any;
+  auto it = listing->names.find(folded(name));
+  if (it == listing->names.end())
+    return false;
+  found = it->second;
+  kind = entryKind(dir + "/" + found);
+  return true;
 }
 
 std::string joinMatched(std::string base, const std::vector<std::string> &parts) {
   bool matching = isDirectory(base);
   for (const std::string &part : parts) {
     std::string found;
-    if (matching && matchEntry(base, part, found)) {
+    int kind = -1;
+    if (matching && matchEntry(base, part, found, kind)) {
       base += "/" + found;
-      matching = isDirectory(base);
+      matching = kind == 1;
     } else {
       base += "/" + part;
       matching = false;
@@ -296,6 +371,26 @@ bool hostPath(std::string_view windowsPathText, std::string &out) {
     base += "/unc";
   out = joinMatched(base, split.parts);
   return true;
+}
+
+void noteEntryAdded(const std::string &hostPathText) {
+  std::string dir = parentDirectory(hostPathText);
+  std::lock_guard<std::mutex> lock(listingMutex);
+  auto kept = listings.find(dir);
+  if (kept == listings.end())
+    return;
+  struct stat st {};
+  if (stat(dir.c_str(), &st) != 0) {
+    listings.erase(kept);
+    return;
+  }
+  addName(kept->second, hostPathText.substr(dir.size() + 1));
+  stampListing(kept->second, st);
+}
+
+void noteEntryRemoved(const std::string &hostPathText) {
+  std::lock_guard<std::mutex> lock(listingMutex);
+  listings.erase(parentDirectory(hostPathText));
 }
 
 std::string windowsPath(std::string_view hostPathText) {

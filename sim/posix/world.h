@@ -24,6 +24,14 @@ void requireWorld();
 // kept as written. Returns false for a path that cannot lie in the world.
 bool hostPath(std::string_view windowsPath, std::string &out);
 
+// Names are matched against a listing of each folder kept per process for as
+// long as the folder's change times are unchanged. The file calls of this
+// process report the entries they add or remove, so that their own changes
+// do not make the listing be read again (an added name is put in; a removal
+// drops the folder's listing).
+void noteEntryAdded(const std::string &hostPath);
+void noteEntryRemoved(const std::string &hostPath);
+
 // The Windows path of a host path inside the world ("" when outside it).
 std::string windowsPath(std::string_view hostPath);
 

@@ -5,6 +5,7 @@
 
 #include <cerrno>
 #include <cstdlib>
+#include <fcntl.h>
 #include <set>
 #include <string>
 #include <sys/stat.h>
@@ -140,6 +141,37 @@ TEST_F(FilesTest, CopyAndMoveRespectExistingTargets) {
   EXPECT_TRUE(MoveFileExA("C:\\M\\dst.txt", "C:\\M\\DST.TXT", 0)) << "a rename in another letter case";
   EXPECT_TRUE(exists("drive_c/M/DST.TXT"));
   EXPECT_FALSE(exists("drive_c/M/dst.txt"));
+}
+
+// A copy keeps what cp -a keeps: exact permission bits (whatever the umask)
+// and times; the content whole, small or spanning many blocks.
+TEST_F(FilesTest, CopiesKeepContentPermissionsAndTimes) {
+  std::string large(3 * 1024 * 1024 + 17, '\0');
+  for (size_t i = 0; i < large.size(); ++i)
+    large[i] = static_cast<char>(i * 7 + i / 4096);
+  struct Case {
+    const char *name;
+    std::string content;
+    mode_t mode;
+  };
+  const std::vector<Case> cases = {{"empty", "", 0640}, {"small", "payload", 0755}, {"large", large, 0604}};
+  mode_t previous = umask(077);
+  for (const Case &c : cases) {
+    std::string source = std::string("drive_c/C/") + c.name;
+    makeFile(source, c.content);
+    ASSERT_EQ(chmod(host(source).c_str(), c.mode), 0);
+    struct timespec times[2] = {{1000000000, 5}, {1200000000, 123456789}};
+    ASSERT_EQ(utimensat(AT_FDCWD, host(source).c_str(), times, 0), 0);
+    std::string target = std::string("C:\\C\\") + c.name + ".copy";
+    ASSERT_TRUE(CopyFileA((std::string("C:\\C\\") + c.name).c_str(), target.c_str(), FALSE)) << c.name;
+    struct stat copied {};
+    ASSERT_EQ(stat(host(source + ".copy").c_str(), &copied), 0);
+    EXPECT_EQ(readFile(host(source + ".copy")), c.content) << c.name;
+    EXPECT_EQ(copied.st_mode & 07777, c.mode) << c.name;
+    EXPECT_EQ(copied.st_mtim.tv_sec, 1200000000) << c.name;
+    EXPECT_EQ(copied.st_mtim.tv_nsec, 123456789) << c.name;
+  }
+  umask(previous);
 }
 
 TEST_F(FilesTest, AccessFollowsTheReadOnlyAttribute) {

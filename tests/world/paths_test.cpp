@@ -1,4 +1,5 @@
 // Windows paths onto the world's folders, and finding the world at all.
+#include "platform/win32.h"
 #include "world_fixture.h"
 
 #include <fcntl.h>
@@ -6,6 +7,8 @@
 #include <unistd.h>
 
 #include <climits>
+#include <filesystem>
+#include <fstream>
 #include <vector>
 
 namespace kxlsim::testing {
@@ -50,6 +53,39 @@ TEST_F(PathTest, ExistingNamesWinIgnoringCase) {
   EXPECT_EQ(mapped("C:\\program files\\New\\Bin"), root + "/drive_c/Program Files/New/Bin");
   // Windows drops trailing dots and spaces of a name.
   EXPECT_EQ(mapped("C:\\Program Files.\\kxl  \\bin"), root + "/drive_c/Program Files/KXL/bin");
+}
+
+// A folder's listing is kept between lookups: changes by other processes (and
+// by hand) are still seen at once, and so are this process's own.
+TEST_F(PathTest, KeptListingsFollowEveryChangeOfTheFolder) {
+  const std::string bin = root + "/drive_c/Program Files/KXL/bin";
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\Tool.exe"), bin + "/Tool.exe") << "listed, not there";
+  pid_t child = fork();
+  if (child == 0)
+    _exit(std::ofstream(bin + "/TOOL.EXE") ? 0 : 1);
+  int status = 0;
+  ASSERT_EQ(waitpid(child, &status, 0), child);
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\Tool.exe"), bin + "/TOOL.EXE") << "another process's file";
+  std::filesystem::remove(bin + "/TOOL.EXE");
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\tool.exe"), bin + "/tool.exe") << "removed by hand";
+
+  // This process's own changes through the file calls.
+  ASSERT_TRUE(CreateDirectoryA("C:\\Program Files\\KXL\\bin\\Sub", nullptr));
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\BIN\\sub\\x"), bin + "/Sub/x");
+  HANDLE file = CreateFileA("C:\\Program Files\\KXL\\bin\\Made.txt", GENERIC_WRITE, 0, nullptr, CREATE_NEW,
+                            FILE_ATTRIBUTE_NORMAL, nullptr);
+  ASSERT_NE(file, INVALID_HANDLE_VALUE);
+  CloseHandle(file);
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\MADE.TXT"), bin + "/Made.txt");
+  ASSERT_TRUE(
+      CopyFileA("C:\\Program Files\\KXL\\bin\\made.txt", "C:\\Program Files\\KXL\\bin\\Copy.txt", TRUE));
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\COPY.txt"), bin + "/Copy.txt");
+  ASSERT_TRUE(
+      MoveFileExA("C:\\Program Files\\KXL\\bin\\copy.txt", "C:\\Program Files\\KXL\\bin\\Moved.txt", 0));
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\copy.txt"), bin + "/copy.txt");
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\moved.TXT"), bin + "/Moved.txt");
+  ASSERT_TRUE(DeleteFileA("C:\\Program Files\\KXL\\bin\\MOVED.txt"));
+  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\moved.txt"), bin + "/moved.txt");
 }
 
 TEST_F(PathTest, DotsNeverClimbOutOfTheDriveOrShare) {
