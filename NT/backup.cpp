@@ -45,6 +45,11 @@ StepResult chooseBackupName(DriverState &state) {
   return stepDone();
 }
 
+// The instance directory's copies show their progress unless the run is quiet.
+uint32_t copyFlags(const DriverState &state) {
+  return state.options.quiet ? 0 : SQLO_COPYDIR_SHOW_PROGRESS;
+}
+
 bool pathExists(const char *path) {
   OSSPathParam param = {OSS_PATH_PARAM_VERSION, path, 1, 0};
   return ossPathTest(&param) != OSS_RC_PATH_NOT_FOUND;
@@ -66,7 +71,7 @@ StepResult makeBackup(DriverState &state) {
   if (!CreateDirectoryA(state.backupDir, nullptr))
     return failedWithSystemError(kProbeBackupCreate, UPGRADE_RC_BACKUP_FAILED);
   state.backupChosen = true;
-  if (sqlocopydir(state.backupDir, state.instanceDir, 0) != 0)
+  if (sqlocopydir(state.backupDir, state.instanceDir, copyFlags(state)) != 0)
     return failedWithSystemError(kProbeBackupCopy, UPGRADE_RC_BACKUP_FAILED);
   state.backupComplete = true;
   return stepDone();
@@ -87,7 +92,7 @@ StepResult copyToNewProfilePath(DriverState &state) {
     return stepFailed(kProbeInstanceDirExists, UPGRADE_RC_PROFILE_PATH_FAILED);
   // From here on the directory is this run's, even when the copy stops half way.
   std::memcpy(state.profileCopyDir, target, sizeof state.profileCopyDir);
-  if (sqlocopydir(target, state.instanceDir, 0) != 0)
+  if (sqlocopydir(target, state.instanceDir, copyFlags(state)) != 0)
     return stepFailed(kProbeProfileCopy, UPGRADE_RC_BACKUP_FAILED);
   return stepDone();
 }
@@ -116,7 +121,7 @@ bool removeProfileCopies(DriverState &state) {
 }
 
 bool restoreBackup(DriverState &state) {
-  int32_t rc = sqlocopydir(state.savedInstanceDir, state.backupDir, 0);
+  int32_t rc = sqlocopydir(state.savedInstanceDir, state.backupDir, copyFlags(state));
   if (rc == 0)
     return true;
   pdLog(PD_LEVEL_SEVERE, KXL_FN_UPGRADE_INSTANCE, kProbeRestoreFailed, rc,

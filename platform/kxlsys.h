@@ -52,6 +52,7 @@ inline constexpr int32_t SQLO_RC_SYSTEM_ERROR = sqloCode(0x870F0006u);     // an
 inline constexpr int32_t SQLO_RC_FILE_NOT_FOUND = sqloCode(0x860F000Au);   // copy: source file missing
 inline constexpr int32_t SQLO_RC_FILE_NOT_FOUND_W = sqloCode(0x870F000Au); // same, reported as warning
 inline constexpr int32_t SQLO_RC_PATH_NOT_FOUND = sqloCode(0x870F0011u);   // a directory is missing
+inline constexpr int32_t SQLO_RC_DISK_FULL = sqloCode(0x870F0012u);        // no room on the target's drive
 inline constexpr int32_t SQLO_RC_FILE_EXISTED = sqloCode(0x070F00CBu);     // open: existing file replaced
 inline constexpr int32_t SQLO_RC_PREG_END = sqloCode(0x870F0105u);         // profile enumeration ended
 inline constexpr int32_t SQLO_RC_PREG_NOT_SET = sqloCode(0x870F0106u);     // variable has no value
@@ -531,6 +532,12 @@ int32_t sqloclose(SQLO_FHANDLE handle);
 // of the target are created.
 int32_t sqlocopy(const char *source, const char *target, uint32_t flags);
 // Copies a directory tree into `target` (created when missing). Note the order.
+// Before writing anything it checks that the target's drive has room for the
+// tree: SQLO_RC_DISK_FULL when it has not, SQLO_RC_IO_ERROR when the free
+// space cannot be read. With SQLO_COPYDIR_SHOW_PROGRESS a copy that runs
+// longer than a second shows its progress on standard error when that is a
+// console.
+inline constexpr uint32_t SQLO_COPYDIR_SHOW_PROGRESS = 0x1;
 int32_t sqlocopydir(const char *target, const char *source, uint32_t flags);
 int32_t sqlodelete(const char *path, uint32_t flags);
 int32_t sqlodeletedir(const char *path);

@@ -36,6 +36,13 @@ typedef char CHAR;
 typedef char16_t WCHAR;
 typedef uint64_t ULONGLONG;
 typedef int64_t LONGLONG;
+typedef union _ULARGE_INTEGER {
+  struct {
+    uint32_t LowPart;
+    uint32_t HighPart;
+  } u;
+  uint64_t QuadPart;
+} ULARGE_INTEGER, *PULARGE_INTEGER;
 typedef uintptr_t ULONG_PTR;
 typedef intptr_t LONG_PTR;
 typedef ULONG_PTR DWORD_PTR;
@@ -266,6 +273,8 @@ LONG SHDeleteKeyA(HKEY hkey, LPCSTR pszSubKey);
 
 // Files and directories
 DWORD GetFileAttributesA(LPCSTR lpFileName);
+BOOL GetDiskFreeSpaceExA(LPCSTR lpDirectoryName, PULARGE_INTEGER lpFreeBytesAvailableToCaller,
+                         PULARGE_INTEGER lpTotalNumberOfBytes, PULARGE_INTEGER lpTotalNumberOfFreeBytes);
 HANDLE FindFirstFileA(LPCSTR lpFileName, LPWIN32_FIND_DATAA lpFindFileData);
 BOOL FindNextFileA(HANDLE hFindFile, LPWIN32_FIND_DATAA lpFindFileData);
 BOOL FindClose(HANDLE hFindFile);

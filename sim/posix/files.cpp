@@ -3,6 +3,7 @@
 #include "platform/win32.h"
 #include "sim/common/simfail.h"
 #include "sim/posix/handles.h"
+#include "sim/posix/reghelp.h"
 #include "sim/posix/win32util.h"
 #include "sim/posix/world.h"
 
@@ -10,6 +11,7 @@
 #include <cctype>
 #include <cerrno>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
@@ -17,6 +19,7 @@
 #include <string>
 #include <sys/ioctl.h>
 #include <sys/stat.h>
+#include <sys/statvfs.h>
 #include <unistd.h>
 #include <vector>
 
@@ -237,9 +240,53 @@ std::string renameTarget(const std::string &sourceHost, const std::string &targe
   return targetHost.substr(0, slash + 1) + last;
 }
 
+// Free bytes the world gives drive `letter`: "FreeBytes" (decimal text) of
+// HKLM\SOFTWARE\ZAV\KXLSIM\Drives\<letter>, so a world can be set up with a
+// drive that is nearly full; false when it sets none.
+bool worldFreeBytes(char letter, ULONGLONG &bytes) {
+  std::string text;
+  if (letter == 0 ||
+      !reg::readString(HKEY_LOCAL_MACHINE, std::string("SOFTWARE\\ZAV\\KXLSIM\\Drives\\") + letter,
+                       "FreeBytes", text))
+    return false;
+  char *end = nullptr;
+  bytes = std::strtoull(text.c_str(), &end, 10);
+  return end != text.c_str();
+}
+
 } // namespace
 
 extern "C" {
+
+BOOL GetDiskFreeSpaceExA(LPCSTR lpDirectoryName, PULARGE_INTEGER lpFreeBytesAvailableToCaller,
+                         PULARGE_INTEGER lpTotalNumberOfBytes, PULARGE_INTEGER lpTotalNumberOfFreeBytes) {
+  std::string host;
+  struct stat info {};
+  if (!startOnExisting("GetDiskFreeSpaceExA", lpDirectoryName == nullptr ? "\\" : lpDirectoryName, host,
+                       info))
+    return FALSE;
+  if (!S_ISDIR(info.st_mode))
+    return failWith(kErrorDirectory, FALSE);
+  struct statvfs volume {};
+  if (statvfs(host.c_str(), &volume) != 0)
+    return failWith(win32ErrorFromErrno(errno, host), FALSE);
+  ULONGLONG available = static_cast<ULONGLONG>(volume.f_bavail) * volume.f_frsize;
+  ULONGLONG total = static_cast<ULONGLONG>(volume.f_blocks) * volume.f_frsize;
+  ULONGLONG free = static_cast<ULONGLONG>(volume.f_bfree) * volume.f_frsize;
+  std::string windows = windowsPath(host);
+  ULONGLONG limit = 0;
+  if (windows.size() >= 2 && windows[1] == ':' && worldFreeBytes(windows[0], limit)) {
+    available = std::min(available, limit);
+    free = std::min(free, limit);
+  }
+  if (lpFreeBytesAvailableToCaller != nullptr)
+    lpFreeBytesAvailableToCaller->QuadPart = available;
+  if (lpTotalNumberOfBytes != nullptr)
+    lpTotalNumberOfBytes->QuadPart = total;
+  if (lpTotalNumberOfFreeBytes != nullptr)
+    lpTotalNumberOfFreeBytes->QuadPart = free;
+  return TRUE;
+}
 
 DWORD GetFileAttributesA(LPCSTR lpFileName) {
   std::string host;

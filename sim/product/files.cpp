@@ -5,6 +5,8 @@
 #include "sim/common/simfail.h"
 #include "sim/product/winpath.h"
 
+#include <algorithm>
+#include <chrono>
 #include <cstdarg>
 #include <cstdio>
 #include <new>
@@ -103,7 +105,8 @@ template <typename Visit> int32_t forEachEntry(const std::string &dir, Visit vis
   do {
     data.cFileName[sizeof data.cFileName - 1] = '\0';
     if (!isDotEntry(data.cFileName)) {
-      rc = visit(std::string(data.cFileName), (data.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY) != 0);
+      ULONGLONG size = static_cast<ULONGLONG>(data.nFileSizeHigh) << 32 | data.nFileSizeLow;
+      rc = visit(std::string(data.cFileName), (data.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY) != 0, size);
     }
   } while (rc == 0 && FindNextFileA(search, &data));
   if (rc == 0 && GetLastError() != ERROR_NO_MORE_FILES)
@@ -112,26 +115,116 @@ template <typename Visit> int32_t forEachEntry(const std::string &dir, Visit vis
   return rc;
 }
 
-int32_t copyTree(const std::string &target, const std::string &source, int depth) {
+// What a tree takes on a drive, as the room check counts it: each file
+// rounded up to whole 4 KiB blocks, and a block for each folder.
+constexpr ULONGLONG kBlock = 4096;
+
+ULONGLONG blocksOf(ULONGLONG size) {
+  return (size + kBlock - 1) / kBlock * kBlock;
+}
+
+int32_t treeBytes(const std::string &dir, int depth, ULONGLONG &total) {
+  if (depth > kMaxTreeDepth)
+    return SQLO_RC_IO_ERROR;
+  total += kBlock;
+  return forEachEntry(dir, [&](const std::string &name, bool directory, ULONGLONG size) -> int32_t {
+    if (directory)
+      return treeBytes(joinPath(dir, name), depth + 1, total);
+    total += blocksOf(size);
+    return 0;
+  });
+}
+
+// 0 when the drive of `target` (or of its nearest existing folder) has room
+// for `needed` bytes; SQLO_RC_DISK_FULL when it has not, SQLO_RC_IO_ERROR when
+// its free space cannot be read (never taken for room).
+int32_t checkRoom(const std::string &target, ULONGLONG needed) {
+  std::string dir = target;
+  while (!dir.empty() && !isDirectoryPath(dir))
+    dir = parentPath(dir);
+  ULARGE_INTEGER available{};
+  if (dir.empty() || !GetDiskFreeSpaceExA(dir.c_str(), &available, nullptr, nullptr))
+    return SQLO_RC_IO_ERROR;
+  return available.QuadPart >= needed ? 0 : SQLO_RC_DISK_FULL;
+}
+
+// The progress of a long tree copy on standard error: one line rewritten in
+// place, shown once the copy has run for a second, only when asked for and
+// standard error is a console. Standard output never sees it.
+class CopyProgress {
+public:
+  CopyProgress(const std::string &target, ULONGLONG total, bool wanted)
+      : target_(target), total_(total), enabled_(wanted && errorIsConsole()),
+        start_(std::chrono::steady_clock::now()) {}
+  ~CopyProgress() {
+    if (shown_) {
+      show();
+      std::fputc('\n', stderr);
+      std::fflush(stderr);
+    }
+  }
+  CopyProgress(const CopyProgress &) = delete;
+  CopyProgress &operator=(const CopyProgress &) = delete;
+
+  void copied(ULONGLONG bytes) {
+    done_ += bytes;
+    if (!enabled_)
+      return;
+    auto now = std::chrono::steady_clock::now();
+    if (now - start_ < std::chrono::seconds(1) || (shown_ && now - last_ < std::chrono::milliseconds(250)))
+      return;
+    last_ = now;
+    shown_ = true;
+    show();
+  }
+
+private:
+  static bool errorIsConsole() {
+    DWORD mode = 0;
+    return GetConsoleMode(GetStdHandle(STD_ERROR_HANDLE), &mode) != 0;
+  }
+  void show() {
+    const ULONGLONG mib = 1024 * 1024;
+    unsigned percent =
+        total_ == 0 ? 100u : static_cast<unsigned>(std::min<ULONGLONG>(100, done_ * 100 / total_));
+    std::fprintf(stderr, "\rcopying to %s: %llu of %llu MiB (%u%%)", target_.c_str(),
+                 static_cast<unsigned long long>(done_ / mib), static_cast<unsigned long long>(total_ / mib),
+                 percent);
+    std::fflush(stderr);
+  }
+
+  std::string target_;
+  ULONGLONG total_;
+  ULONGLONG done_ = 0;
+  bool enabled_;
+  bool shown_ = false;
+  std::chrono::steady_clock::time_point start_, last_;
+};
+
+int32_t copyTree(const std::string &target, const std::string &source, int depth, CopyProgress &progress) {
   if (depth > kMaxTreeDepth)
     return SQLO_RC_IO_ERROR;
   if (!createDirectoryTree(target, true))
     return SQLO_RC_PATH_NOT_FOUND;
-  return forEachEntry(source, [&](const std::string &name, bool directory) -> int32_t {
+  progress.copied(kBlock); // counted as the room check counts
+  return forEachEntry(source, [&](const std::string &name, bool directory, ULONGLONG size) -> int32_t {
     std::string from = joinPath(source, name);
     std::string to = joinPath(target, name);
     if (!fitsPath(from) || !fitsPath(to))
       return SQLO_RC_IO_ERROR;
     if (directory)
-      return copyTree(to, from, depth + 1);
-    return CopyFileA(from.c_str(), to.c_str(), FALSE) ? 0 : codeForLastError(SQLO_RC_FILE_NOT_FOUND);
+      return copyTree(to, from, depth + 1, progress);
+    if (!CopyFileA(from.c_str(), to.c_str(), FALSE))
+      return codeForLastError(SQLO_RC_FILE_NOT_FOUND);
+    progress.copied(blocksOf(size));
+    return 0;
   });
 }
 
 int32_t deleteTree(const std::string &dir, int depth) {
   if (depth > kMaxTreeDepth)
     return SQLO_RC_IO_ERROR;
-  int32_t rc = forEachEntry(dir, [&](const std::string &name, bool directory) -> int32_t {
+  int32_t rc = forEachEntry(dir, [&](const std::string &name, bool directory, ULONGLONG) -> int32_t {
     std::string path = joinPath(dir, name);
     if (!fitsPath(path))
       return SQLO_RC_IO_ERROR;
@@ -259,7 +352,7 @@ int32_t sqlocopy(const char *source, const char *target, uint32_t flags) {
 }
 
 int32_t sqlocopydir(const char *target, const char *source, uint32_t flags) {
-  (void)flags; // 0: the whole tree, files of the target replaced
+  // The whole tree is copied, files of the target replaced.
   if (kxlsim::shouldFail("sqlocopydir"))
     return SQLO_RC_IO_ERROR;
   if (source == nullptr || target == nullptr)
@@ -271,7 +364,18 @@ int32_t sqlocopydir(const char *target, const char *source, uint32_t flags) {
   // A target inside the source would be copied into itself without end.
   if (isWithin(to, from))
     return SQLO_RC_INVALID_ARGUMENT;
-  return copyTree(to, from, 0);
+  // Room for the tree, less what the target holds already (its files are
+  // replaced), before anything is written.
+  ULONGLONG needed = 0, present = 0;
+  int32_t rc = treeBytes(from, 0, needed);
+  if (rc == 0 && isDirectoryPath(to))
+    rc = treeBytes(to, 0, present);
+  if (rc == 0)
+    rc = checkRoom(to, needed > present ? needed - present : 0);
+  if (rc != 0)
+    return rc;
+  CopyProgress progress(to, needed, (flags & SQLO_COPYDIR_SHOW_PROGRESS) != 0);
+  return copyTree(to, from, 0, progress);
 }
 
 int32_t sqlodelete(const char *path, uint32_t flags) {

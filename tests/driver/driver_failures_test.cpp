@@ -90,8 +90,9 @@ TEST_F(DriverFailureTest, BackupFailuresEndWith1969AndLeaveNoDirectory) {
   struct Case {
     const char *fault;
     long long probe;
-  } cases[] = {{"GetTempPathA:1", 20}, {"_tempnam:1", 30},      {"CreateDirectoryA:1", 40},
-               {"sqlocopydir:1", 50},  {"FindNextFileA:1", 50}, {"FindNextFileA:6", 50}};
+  } cases[] = {{"GetTempPathA:1", 20},       {"_tempnam:1", 30},      {"CreateDirectoryA:1", 40},
+               {"sqlocopydir:1", 50},        {"FindNextFileA:1", 50}, {"FindNextFileA:6", 50},
+               {"GetDiskFreeSpaceExA:1", 50}};
   for (const Case &c : cases) {
     SCOPED_TRACE(c.fault);
     Outcome outcome = run({"INST1"}, c.fault);
@@ -99,6 +100,19 @@ TEST_F(DriverFailureTest, BackupFailuresEndWith1969AndLeaveNoDirectory) {
     expectUndone();
     EXPECT_EQ(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
   }
+  expectRerunUpgrades({"INST1"});
+}
+
+// A drive without room for the backup fails the run before anything is
+// copied; with room made, the same command upgrades.
+TEST_F(DriverFailureTest, NoRoomForTheBackupChangesNothing) {
+  const std::string drive = "SOFTWARE\\ZAV\\KXLSIM\\Drives\\C";
+  world.setString(kxlsim::localMachine(), drive, "FreeBytes", "8192");
+  keepWorld();
+  Outcome outcome = run({"INST1"});
+  expectFailure(outcome, 50, -1969);
+  expectUndone();
+  world.setString(kxlsim::localMachine(), drive, "FreeBytes", "1099511627776");
   expectRerunUpgrades({"INST1"});
 }
 

@@ -115,6 +115,37 @@ TEST_F(Files, DirectoryTreesAreCopiedWholeAndDeletedWhole) {
   EXPECT_TRUE(exists("C:\\inst"));
 }
 
+// A tree copy checks the target's drive for room first and writes nothing
+// when there is too little, or when the free space cannot be read; what the
+// target holds already counts as room, since its files are replaced.
+TEST_F(Files, TreeCopiesNeedRoomForTheTreeBeforeWritingAnything) {
+  makeTree("C:\\inst\\INST1"); // three files, five folders: 8 blocks of 4 KiB
+  const std::string drive = "SOFTWARE\\ZAV\\KXLSIM\\Drives\\C";
+  struct Case {
+    const char *freeBytes;
+    const char *fault;
+    int32_t rc;
+  } cases[] = {{"32767", nullptr, SQLO_RC_DISK_FULL},
+               {"32768", nullptr, 0},
+               {"1000000", "GetDiskFreeSpaceExA:1", SQLO_RC_IO_ERROR}};
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.freeBytes);
+    setString(drive, "FreeBytes", c.freeBytes);
+    kxltest::setProcessVariable("KXLSIM_FAIL", c.fault);
+    kxlsim::resetFaults();
+    EXPECT_EQ(c.rc, sqlocopydir("C:\\copy", "C:\\inst\\INST1", 0));
+    EXPECT_EQ(c.rc == 0, exists("C:\\copy")) << "nothing written when it fails";
+    kxltest::setProcessVariable("KXLSIM_FAIL", nullptr);
+    kxlsim::resetFaults();
+    sqlodeletedir("C:\\copy");
+  }
+  // Copied back over itself (a restore) it needs no room beyond what is there.
+  ASSERT_EQ(0, sqlocopydir("C:\\copy", "C:\\inst\\INST1", 0));
+  setString(drive, "FreeBytes", "0");
+  EXPECT_EQ(0, sqlocopydir("C:\\copy", "C:\\inst\\INST1", 0));
+  EXPECT_EQ(SQLO_RC_DISK_FULL, sqlocopydir("C:\\other", "C:\\inst\\INST1", 0));
+}
+
 TEST_F(Files, DeleteRemovesFilesOnly) {
   writeFile("C:\\d\\f.txt", "x");
   EXPECT_EQ(SQLO_RC_ACCESS_DENIED, sqlodelete("C:\\d", 0));
