@@ -1,27 +1,44 @@
-// KXLSIM_FAIL: which calls of which platform functions are made to fail.
+// KXLSIM_FAIL, KXLSIM_KILL, KXLSIM_COUNT: which calls fail, where the process
+// is killed, and how often each function was called.
 #include "sim/common/simfail.h"
 
+#include <atomic>
+#include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <map>
 #include <mutex>
 #include <set>
 #include <string>
 
+#ifdef _WIN32
+#include <windows.h>
+#endif
+
 namespace kxlsim {
 
 namespace {
 
+using CallPlan = std::map<std::string, std::set<unsigned long>, std::less<>>; // name -> call numbers
+
+constexpr const char *kOwnSettings[] = {"KXLSIM_FAIL", "KXLSIM_KILL", "KXLSIM_COUNT", "KXLSIM_CHILD_FAIL"};
+
 struct FaultPlan {
   bool loaded = false;
-  std::map<std::string, std::set<unsigned long>, std::less<>> failing; // name -> call numbers
+  bool counting = false;
+  CallPlan failing;
+  CallPlan killing;
+  std::string countFile;
+  std::string childPlan;
   std::map<std::string, unsigned long, std::less<>> calls;
 };
 
 std::mutex planMutex;
 FaultPlan plan;
+std::atomic<bool> inactive{false}; // loaded, and nothing to fail, kill or count
 
 // One "name:n" entry; malformed entries (no name, n not a positive number) are ignored.
-void addEntry(const std::string &entry, FaultPlan &into) {
+void addEntry(const std::string &entry, CallPlan &into) {
   size_t colon = entry.rfind(':');
   if (colon == std::string::npos || colon == 0 || colon + 1 >= entry.size())
     return;
@@ -30,13 +47,11 @@ void addEntry(const std::string &entry, FaultPlan &into) {
     return;
   unsigned long n = std::strtoul(count.c_str(), nullptr, 10);
   if (n > 0)
-    into.failing[entry.substr(0, colon)].insert(n);
+    into[entry.substr(0, colon)].insert(n);
 }
 
-void loadPlan(FaultPlan &into) {
-  into = FaultPlan{};
-  into.loaded = true;
-  const char *env = std::getenv("KXLSIM_FAIL");
+void readCallPlan(const char *variable, CallPlan &into) {
+  const char *env = std::getenv(variable);
   if (env == nullptr)
     return;
   std::string text = env;
@@ -50,24 +65,103 @@ void loadPlan(FaultPlan &into) {
   }
 }
 
-} // namespace
+std::string variableText(const char *variable) {
+  const char *value = std::getenv(variable);
+  return value != nullptr ? value : "";
+}
 
-bool shouldFail(const char *functionName) {
-  if (functionName == nullptr)
+void writeCounts() {
+  std::lock_guard<std::mutex> lock(planMutex);
+  if (plan.countFile.empty())
+    return;
+  std::FILE *file = std::fopen(plan.countFile.c_str(), "w");
+  if (file == nullptr)
+    return;
+  for (const auto &[name, count] : plan.calls)
+    std::fprintf(file, "%s %lu\n", name.c_str(), count);
+  std::fclose(file);
+}
+
+// Programs started by this process inherit its environment block; on a POSIX
+// host the simulated CreateProcessA leaves these settings out, on Windows they
+// are taken out of the block (the C run time's copy, which resetFaults reads,
+// keeps them).
+void keepSettingsFromChildren() {
+#ifdef _WIN32
+  for (const char *name : kOwnSettings)
+    SetEnvironmentVariableA(name, nullptr);
+  if (!plan.childPlan.empty())
+    SetEnvironmentVariableA("KXLSIM_FAIL", plan.childPlan.c_str());
+#endif
+}
+
+void loadPlan(FaultPlan &into) {
+  into = FaultPlan{};
+  into.loaded = true;
+  readCallPlan("KXLSIM_FAIL", into.failing);
+  readCallPlan("KXLSIM_KILL", into.killing);
+  into.countFile = variableText("KXLSIM_COUNT");
+  into.childPlan = variableText("KXLSIM_CHILD_FAIL");
+  into.counting = !into.failing.empty() || !into.killing.empty() || !into.countFile.empty();
+  if (!into.countFile.empty()) {
+    static bool registered = false;
+    if (!registered)
+      registered = std::atexit(writeCounts) == 0;
+  }
+  keepSettingsFromChildren();
+  inactive = !into.counting;
+}
+
+bool planned(const CallPlan &calls, const char *name, unsigned long call) {
+  auto it = calls.find(std::string_view(name));
+  return it != calls.end() && it->second.count(call) != 0;
+}
+
+// Counts the call; true when it is to fail. Ends the process when it is to be killed.
+bool countCall(const char *name) {
+  if (inactive)
     return false;
   std::lock_guard<std::mutex> lock(planMutex);
   if (!plan.loaded)
     loadPlan(plan);
-  if (plan.failing.empty())
+  if (!plan.counting)
     return false;
-  unsigned long call = ++plan.calls[functionName];
-  auto it = plan.failing.find(std::string_view(functionName));
-  return it != plan.failing.end() && it->second.count(call) != 0;
+  unsigned long call = ++plan.calls[name];
+  if (planned(plan.killing, name, call))
+    std::_Exit(kKilledExitCode);
+  return planned(plan.failing, name, call);
+}
+
+} // namespace
+
+bool shouldFail(const char *functionName) {
+  return functionName != nullptr && countCall(functionName);
+}
+
+void killPoint(const char *hookName) {
+  if (hookName != nullptr)
+    countCall(hookName);
 }
 
 void resetFaults() {
   std::lock_guard<std::mutex> lock(planMutex);
   loadPlan(plan);
+}
+
+bool isOwnProcessSetting(const char *entry) {
+  for (const char *name : kOwnSettings) {
+    std::size_t length = std::strlen(name);
+    if (std::strncmp(entry, name, length) == 0 && entry[length] == '=')
+      return true;
+  }
+  return false;
+}
+
+const char *childFaultPlan() {
+  std::lock_guard<std::mutex> lock(planMutex);
+  if (!plan.loaded)
+    loadPlan(plan);
+  return plan.childPlan.c_str();
 }
 
 } // namespace kxlsim

@@ -1,6 +1,8 @@
 // REGEDIT4 hive files: text form, parsing, locking and atomic write-through.
 #include "sim/posix/regfile.h"
 
+#include "sim/common/simfail.h"
+
 #include <algorithm>
 
 #include <fcntl.h>
@@ -771,6 +773,8 @@ bool HiveFile::writeThrough() {
     return false;
   bool ok = writeAll(fd, text);
   ok = close(fd) == 0 && ok;
+  if (ok)
+    kxlsim::killPoint("hivewrite"); // a kill here leaves the old hive whole beside a stray temporary file
   if (!ok || rename(temporary.c_str(), path_.c_str()) != 0) {
     unlink(temporary.c_str());
     return false;

@@ -138,8 +138,13 @@ bool locateProgram(std::string name, std::string &host) {
 std::vector<std::string> environmentFromBlock(const char *block) {
   std::vector<std::string> entries;
   if (block == nullptr) {
-    for (char **entry = environ; entry != nullptr && *entry != nullptr; ++entry)
-      entries.emplace_back(*entry);
+    // The fault plan, kill points and call counts are this process's own.
+    for (char **entry = environ; entry != nullptr && *entry != nullptr; ++entry) {
+      if (!kxlsim::isOwnProcessSetting(*entry))
+        entries.emplace_back(*entry);
+    }
+    if (*kxlsim::childFaultPlan() != '\0')
+      entries.push_back(std::string("KXLSIM_FAIL=") + kxlsim::childFaultPlan());
     return entries;
   }
   for (const char *entry = block; *entry != '\0'; entry += std::strlen(entry) + 1)

@@ -5,11 +5,14 @@
 #include <sys/wait.h>
 
 #include <algorithm>
+#include <chrono>
+#include <csignal>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <thread>
 
 extern char **environ;
 
@@ -18,8 +21,9 @@ namespace kxltestsupport {
 namespace {
 
 // Variables of the test's own environment that the command must not inherit.
-constexpr const char *kScrubbed[] = {"KXLSIM_ROOT",    "KXLTRACE", "KXLSIM_FAIL", "KXLINSTANCE",
-                                     "KXLTEST_DRIVER", "TMP",      "TEMP"};
+constexpr const char *kScrubbed[] = {
+    "KXLSIM_ROOT",       "KXLTRACE",    "KXLSIM_FAIL",    "KXLSIM_KILL", "KXLSIM_COUNT",
+    "KXLSIM_CHILD_FAIL", "KXLINSTANCE", "KXLTEST_DRIVER", "TMP",         "TEMP"};
 
 bool scrubbed(const char *entry) {
   return std::any_of(std::begin(kScrubbed), std::end(kScrubbed), [entry](const char *name) {
@@ -34,6 +38,28 @@ std::vector<char *> pointersTo(std::vector<std::string> &texts) {
     pointers.push_back(text.data());
   pointers.push_back(nullptr);
   return pointers;
+}
+
+// Waits for the child; false (and the child killed) when it is still running
+// after `seconds` (0: no limit).
+bool waitWithin(pid_t child, int seconds, int &status) {
+  if (seconds <= 0) {
+    if (waitpid(child, &status, 0) != child)
+      status = -1; // reads as not exited
+    return true;
+  }
+  auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(seconds);
+  auto pause = std::chrono::microseconds(500);
+  while (waitpid(child, &status, WNOHANG) == 0) {
+    if (std::chrono::steady_clock::now() >= deadline) {
+      kill(child, SIGKILL);
+      waitpid(child, &status, 0);
+      return false;
+    }
+    std::this_thread::sleep_for(pause);
+    pause = std::min(pause * 2, std::chrono::microseconds(20000));
+  }
+  return true;
 }
 
 } // namespace
@@ -63,11 +89,11 @@ int runCommand(const CommandRun &run) {
   int started = posix_spawn(&child, args[0], &actions, nullptr, args.data(), env.data());
   posix_spawn_file_actions_destroy(&actions);
   if (started != 0)
-    return -1;
+    return kRunNotExited;
   int status = 0;
-  if (waitpid(child, &status, 0) != child)
-    return -1;
-  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  if (!waitWithin(child, run.timeoutSeconds, status))
+    return kRunTimedOut;
+  return WIFEXITED(status) ? WEXITSTATUS(status) : kRunNotExited;
 }
 
 std::string readHostFile(const std::string &path) {

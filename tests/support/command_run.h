@@ -15,15 +15,19 @@ struct CommandRun {
   std::vector<std::string> settings; // NAME=value added to the scrubbed environment
   std::string cwd;                   // host directory to start in ("" keeps the test's)
   std::string outFile, errFile;      // where standard output and error go
+  int timeoutSeconds = 0;            // 0: wait as long as it takes
 };
 
-// Runs the program and waits for it: its exit code (the low 8 bits), -1 when
-// it could not be started or did not exit.
+inline constexpr int kRunNotExited = -1; // not started, or ended by a signal
+inline constexpr int kRunTimedOut = -2;  // still running after timeoutSeconds; killed
+
+// Runs the program and waits for it: its exit code (the low 8 bits), or one
+// of the two codes above.
 int runCommand(const CommandRun &run);
 
 // The test's environment without the variables the simulation or the command
-// reads (KXLSIM_ROOT, KXLTRACE, KXLSIM_FAIL, KXLINSTANCE, KXLTEST_DRIVER, TMP,
-// TEMP), followed by `settings`.
+// reads (KXLSIM_ROOT, KXLTRACE, KXLSIM_FAIL and the other fault settings,
+// KXLINSTANCE, KXLTEST_DRIVER, TMP, TEMP), followed by `settings`.
 std::vector<std::string> scrubbedEnvironment(const std::vector<std::string> &settings);
 
 // The whole content of a host file ("" when it cannot be read).

@@ -56,6 +56,68 @@ TEST_F(FaultTest, RegistryCallFailsAsWindowsWouldAndTheNextOneWorks) {
   RegCloseKey(key);
 }
 
+// A process killed between writing a hive's new text and putting it in place
+// leaves the old hive whole; the next writer goes on from it.
+TEST_F(FaultTest, KillAtAHiveWriteLeavesTheHiveWhole) {
+  auto createKey = [](const char *name) {
+    HKEY key = nullptr;
+    LONG rc =
+        RegCreateKeyExA(HKEY_LOCAL_MACHINE, name, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr);
+    if (key != nullptr)
+      RegCloseKey(key);
+    return rc;
+  };
+  EXPECT_EXIT(
+      {
+        setenv("KXLSIM_KILL", "hivewrite:2", 1);
+        resetFaults();
+        createKey("SOFTWARE\\A");
+        createKey("SOFTWARE\\B");
+        std::exit(0);
+      },
+      ::testing::ExitedWithCode(kKilledExitCode), "");
+  std::string hive = readText(root + "/system.reg");
+  EXPECT_NE(hive.find("[HKEY_LOCAL_MACHINE\\SOFTWARE\\A]"), std::string::npos) << hive;
+  EXPECT_EQ(hive.find("SOFTWARE\\B"), std::string::npos) << hive;
+  posix::resetWorldRoot();
+  EXPECT_EQ(createKey("SOFTWARE\\C"), ERROR_SUCCESS);
+  HKEY key = nullptr;
+  EXPECT_EQ(RegOpenKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE\\A", 0, KEY_READ, &key), ERROR_SUCCESS);
+  RegCloseKey(key);
+}
+
+TEST_F(FaultTest, CallsAreCountedIntoTheCountFileAtExit) {
+  std::string counts = root + "/counts";
+  EXPECT_EXIT(
+      {
+        setenv("KXLSIM_COUNT", counts.c_str(), 1);
+        resetFaults();
+        for (int call = 0; call < 3; ++call)
+          shouldFail("Open");
+        killPoint("trace");
+        std::exit(0);
+      },
+      ::testing::ExitedWithCode(0), "");
+  EXPECT_EQ(readText(counts), "Open 3\ntrace 1\n");
+}
+
+TEST_F(FaultTest, StartedProgramsDoNotInheritThePlan) {
+  struct Row {
+    const char *entry;
+    bool own;
+  } rows[] = {{"KXLSIM_FAIL=Open:1", true},    {"KXLSIM_KILL=trace:3", true}, {"KXLSIM_COUNT=/tmp/c", true},
+              {"KXLSIM_CHILD_FAIL=x:1", true}, {"KXLSIM_FAILX=1", false},     {"KXLSIM_ROOT=/w", false},
+              {"KXLSIM_FAIL", false}};
+  for (const Row &row : rows)
+    EXPECT_EQ(isOwnProcessSetting(row.entry), row.own) << row.entry;
+  setenv("KXLSIM_CHILD_FAIL", "sqlocopy:2", 1);
+  resetFaults();
+  EXPECT_STREQ(childFaultPlan(), "sqlocopy:2");
+  unsetenv("KXLSIM_CHILD_FAIL");
+  resetFaults();
+  EXPECT_STREQ(childFaultPlan(), "");
+}
+
 using EventTest = WorldTest;
 
 std::vector<nlohmann::json> readEvents(const std::string &path) {
