@@ -1,6 +1,7 @@
 #include "NT/backup.h"
 
 #include "NT/kxliutil.h"
+#include "NT/runrecord.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
 
@@ -67,6 +68,11 @@ StepResult makeBackup(DriverState &state) {
   StepResult named = chooseBackupName(state);
   if (failed(named))
     return named;
+  // Where the backup is, before anything is made: in the diagnostic log and in the run's record.
+  pdLog(PD_LEVEL_INFO, KXL_FN_UPGRADE_INSTANCE, kProbeBackupPlace, 0,
+        "instance directory %s is backed up in %s", state.instanceDir, state.backupDir);
+  if (!writeRunRecord(state))
+    return failedWithSystemError(kProbeRunRecord, UPGRADE_RC_BACKUP_FAILED);
   // Only a directory this call made is ever removed again.
   if (!CreateDirectoryA(state.backupDir, nullptr))
     return failedWithSystemError(kProbeBackupCreate, UPGRADE_RC_BACKUP_FAILED);
@@ -82,9 +88,14 @@ StepResult copyToNewProfilePath(DriverState &state) {
     return stepDone();
   const char *profilePath = state.options.profilePath;
   if (!pathExists(profilePath)) {
-    if (!createDirectory(profilePath))
-      return stepFailed(kProbeProfilePathCreate, UPGRADE_RC_PROFILE_PATH_FAILED);
+    // Recorded first: a kill right after the folder is made still removes it.
     state.profilePathCreated = true;
+    if (!writeRunRecord(state))
+      return failedWithSystemError(kProbeRunRecord, UPGRADE_RC_BACKUP_FAILED);
+    if (!createDirectory(profilePath)) {
+      state.profilePathCreated = false;
+      return stepFailed(kProbeProfilePathCreate, UPGRADE_RC_PROFILE_PATH_FAILED);
+    }
   }
   char target[KXL_JOINED_PATH_SZ];
   joinPath(target, profilePath, state.instanceName);
@@ -92,6 +103,8 @@ StepResult copyToNewProfilePath(DriverState &state) {
     return stepFailed(kProbeInstanceDirExists, UPGRADE_RC_PROFILE_PATH_FAILED);
   // From here on the directory is this run's, even when the copy stops half way.
   std::memcpy(state.profileCopyDir, target, sizeof state.profileCopyDir);
+  if (!writeRunRecord(state))
+    return failedWithSystemError(kProbeRunRecord, UPGRADE_RC_BACKUP_FAILED);
   if (sqlocopydir(target, state.instanceDir, copyFlags(state)) != 0)
     return stepFailed(kProbeProfileCopy, UPGRADE_RC_BACKUP_FAILED);
   return stepDone();
@@ -134,4 +147,11 @@ void removeBackup(DriverState &state) {
   if (state.backupChosen)
     sqlodeletedir(state.backupDir);
   state.backupChosen = false;
+}
+
+bool refreshFromBackup(DriverState &state) {
+  if (!state.backupComplete || sqlocopydir(state.savedInstanceDir, state.backupDir, copyFlags(state)) != 0)
+    return false;
+  return state.profileCopyDir[0] == '\0' ||
+         sqlocopydir(state.profileCopyDir, state.backupDir, copyFlags(state)) == 0;
 }

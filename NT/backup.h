@@ -44,3 +44,9 @@ bool restoreBackup(DriverState &state);
 
 // Deletes the backup directory when this call created it.
 void removeBackup(DriverState &state);
+
+// Copies the backup over the instance directory and over the copy this run
+// made under the new profile path, so that a step that was cut short starts
+// again from the instance's own files. False when the backup is incomplete or
+// a copy fails.
+bool refreshFromBackup(DriverState &state);

@@ -39,6 +39,12 @@ struct DriverState {
   InstallCopyList *rereadCopies = nullptr; // owned by the driver
   IKXLINSTANCE *newInstance = nullptr;     // borrowed from rereadCopies
 
+  char oldCopyName[SQLO_COPY_NAME_SZ] = {}; // the copy that owned the instance
+  char recordPath[KXL_JOINED_PATH_SZ] = {}; // the run's record, kept up to date before every change
+  uint32_t step = 0;                        // index of the step running
+  bool clustered = false;                   // as the instance was bound before the run
+  bool resumed = false;                     // finishing the upgrade of a killed run
+
   // The registry profile move was started: some or all machines may hold the
   // key under the current copy.
   bool profileMoved = false;

@@ -11,6 +11,7 @@
 #include "NT/instfiles.h"
 #include "NT/profilereg.h"
 #include "NT/readnodetype.h"
+#include "NT/runrecord.h"
 #include "NT/services.h"
 #include "NT/tools_run.h"
 #include "cluster/clusterstep.h"
@@ -224,34 +225,33 @@ StepResult cleanProfileRegistry(DriverState &) {
 
 using Step = StepResult (*)(DriverState &);
 
-// The upgrade, in order.
-// clang-format off
-constexpr Step kSteps[] = {
-    takeInstanceName,
-    refuseActiveInstance,
-    requireNodeList,
-    findCurrentCopy,
-    readInstanceNodeType,
-    checkCurrentEdition,
-    makeBackup,
-    copyToNewProfilePath,
-    moveProfile,
-    keepAudit,
-    upgradeServices,
-    upgradeAudit,
-    upgradeSsl,
-    rereadCopies,
-    findUpgradedInstance,
-    prepareEnvironment,
-    convertConfiguration,
-    applyAuthenticationType,
-    carryFiles,
-    copyFunctions,
-    upgradeCluster,
-    dropForcedKeys,
-    cleanProfileRegistry,
+struct DriverStep {
+  Step run;
+  bool changesMachine; // the run's record is written before it
 };
-// clang-format on
+
+// The upgrade, in order.
+constexpr DriverStep kSteps[] = {
+    {takeInstanceName, false},   {refuseActiveInstance, false}, {requireNodeList, false},
+    {findCurrentCopy, false},    {readInstanceNodeType, false}, {checkCurrentEdition, false},
+    {makeBackup, true},          {copyToNewProfilePath, true},  {moveProfile, true},
+    {keepAudit, true},           {upgradeServices, true},       {upgradeAudit, true},
+    {upgradeSsl, true},          {rereadCopies, false},         {findUpgradedInstance, false},
+    {prepareEnvironment, false}, {convertConfiguration, true},  {applyAuthenticationType, true},
+    {carryFiles, true},          {copyFunctions, true},         {upgradeCluster, true},
+    {dropForcedKeys, true},      {cleanProfileRegistry, true},
+};
+
+constexpr uint32_t stepIndex(Step step) {
+  for (uint32_t i = 0; i < std::size(kSteps); ++i)
+    if (kSteps[i].run == step)
+      return i;
+  return uint32_t(std::size(kSteps));
+}
+
+// A run killed before this step is put back; from it on, it is finished.
+constexpr uint32_t kFirstStepKept = stepIndex(upgradeServices);
+constexpr uint32_t kProfileMoveStep = stepIndex(moveProfile);
 
 void releaseCopies(DriverState &state) {
   delete state.rereadCopies;
@@ -320,18 +320,48 @@ int32_t undo(DriverState &state, const StepResult &failure) {
   releaseCopies(state);
   reportUndo(state, changed, complete);
   removeBackup(state);
+  removeRunRecord(state);
   return failure.rc;
 }
 
-int32_t runSteps(DriverState &state) {
-  for (Step step : kSteps) {
-    StepResult result = step(state);
+// A finishing run that fails cannot undo a re-creation made by another
+// process: it keeps its record and the backup, so the next run tries again.
+int32_t keepForNextRun(DriverState &state, const StepResult &failure) {
+  pdtError(KXL_FN_UPGRADE_INSTANCE, failure.probe, failure.rc);
+  releaseCopies(state);
+  state.options.undoOutcome = UPGRADE_UNDO_INCOMPLETE;
+  std::memcpy(state.options.keptBackupDir, state.backupDir, sizeof state.options.keptBackupDir);
+  state.options.keptBackupDir[sizeof state.options.keptBackupDir - 1] = '\0';
+  return failure.rc;
+}
+
+int32_t stop(DriverState &state, const StepResult &failure) {
+  return state.resumed ? keepForNextRun(state, failure) : undo(state, failure);
+}
+
+// Runs the steps from `from` on; the steps before it that change the machine
+// were done by a killed run, whose record holds what they left.
+int32_t runSteps(DriverState &state, uint32_t from) {
+  for (state.step = 0; state.step < std::size(kSteps); ++state.step) {
+    const DriverStep &step = kSteps[state.step];
+    if (step.changesMachine && state.step < from)
+      continue;
+    if (step.changesMachine && !writeRunRecord(state))
+      return stop(state, stepFailed(kProbeRunRecord, UPGRADE_RC_BACKUP_FAILED));
+    StepResult result = step.run(state);
     if (failed(result))
-      return undo(state, result);
+      return stop(state, result);
   }
   releaseCopies(state);
   removeBackup(state);
+  removeRunRecord(state);
   return 0;
+}
+
+void prepareRecord(DriverState &state) {
+  runRecordPath(state.recordPath, state.options.currentInstallPath, state.options.instanceName);
+  state.context.instance->GetCopyName(state.oldCopyName, sizeof state.oldCopyName);
+  state.clustered = state.context.instance->isClustered != 0;
 }
 
 } // namespace
@@ -339,7 +369,69 @@ int32_t runSteps(DriverState &state) {
 int upgradeInstance(UpgradeContext &context, UpgradeOptions &options) {
   pdtEntry(KXL_FN_UPGRADE_INSTANCE);
   DriverState state(context, options);
-  int32_t rc = context.instance != nullptr ? runSteps(state) : UPGRADE_RC_COPY_NOT_FOUND;
+  int32_t rc = UPGRADE_RC_COPY_NOT_FOUND;
+  if (context.instance != nullptr) {
+    prepareRecord(state);
+    rc = runSteps(state, 0);
+  }
+  pdtExit(KXL_FN_UPGRADE_INSTANCE, rc, 0);
+  return rc;
+}
+
+KilledRunFound findKilledRun(UpgradeContext &context, const UpgradeOptions &options, KilledRun &run) {
+  UpgradeContext scratchContext;
+  UpgradeOptions scratchOptions = options;
+  DriverState recorded(scratchContext, scratchOptions);
+  char path[KXL_JOINED_PATH_SZ];
+  runRecordPath(path, options.currentInstallPath, options.instanceName);
+  RecordRead read = readRunRecord(path, recorded);
+  if (read == RecordRead::none)
+    return KilledRunFound::none;
+  InstallCopy *oldCopy = nullptr;
+  bool usable = read == RecordRead::read && recorded.step < std::size(kSteps) &&
+                context.copies->Find(recorded.oldCopyName, &oldCopy) == 0 &&
+                sqlomcpi(recorded.instanceName, options.instanceName, 0) == 0;
+  if (!usable) {
+    pdLog(PD_LEVEL_WARNING, KXL_FN_UPGRADE_INSTANCE, kProbeRunRecord, 0,
+          "the record %s of an earlier run cannot be used; it is set aside", path);
+    setRunRecordAside(path);
+    return KilledRunFound::unusable;
+  }
+  std::memcpy(run.oldCopy, recorded.oldCopyName, sizeof recorded.oldCopyName);
+  std::memcpy(run.instanceDir, recorded.savedInstanceDir, sizeof recorded.savedInstanceDir);
+  run.clustered = recorded.clustered;
+  return KilledRunFound::found;
+}
+
+int recoverKilledRun(UpgradeContext &context, UpgradeOptions &options, bool *finished) {
+  pdtEntry(KXL_FN_UPGRADE_INSTANCE);
+  UpgradeOptions given = options;
+  DriverState state(context, options);
+  char path[KXL_JOINED_PATH_SZ];
+  runRecordPath(path, options.currentInstallPath, options.instanceName);
+  int32_t rc = 0;
+  *finished = false;
+  if (readRunRecord(path, state) == RecordRead::read) {
+    pdLog(PD_LEVEL_WARNING, KXL_FN_UPGRADE_INSTANCE, kProbeRunRecord, int32_t(state.step),
+          "an earlier run of the upgrade of %s ended at step %u; its backup is %s", state.instanceName,
+          unsigned(state.step), state.backupDir);
+    // A move that was under way may have moved some machines already.
+    state.profileMoved = state.profileMoved || state.step >= kProfileMoveStep;
+    state.backupChosen = state.backupDir[0] != '\0';
+    if (state.step < kFirstStepKept) {
+      isInstanceActive(context, options); // loads the node list: the machines whose keys go back
+      undo(state, stepFailed(kProbeRunRecord, UPGRADE_RC_BACKUP_FAILED));
+      options = given;
+    } else {
+      *finished = true;
+      state.resumed = true;
+      // The instance's re-creation rewrites its files: it starts again from the backup.
+      if (state.step == kFirstStepKept && !refreshFromBackup(state))
+        rc = stop(state, stepFailed(kProbeRunRecord, UPGRADE_RC_BACKUP_FAILED));
+      else
+        rc = runSteps(state, state.step);
+    }
+  }
   pdtExit(KXL_FN_UPGRADE_INSTANCE, rc, 0);
   return rc;
 }

@@ -27,3 +27,25 @@ inline constexpr int32_t UPGRADE_RC_NO_NODE_LIST = -1960;
 // backup is kept, in options.keptBackupDir, when not). Leaves KXLINSTANCE set
 // to the instance.
 int upgradeInstance(UpgradeContext &context, UpgradeOptions &options);
+
+// The record that a killed run of this command left for the options'
+// instance, as the run found it before binding anything.
+struct KilledRun {
+  char oldCopy[130] = {};     // the copy that owned the instance
+  char instanceDir[261] = {}; // the instance's directory before the run
+  bool clustered = false;
+};
+
+enum class KilledRunFound { none, found, unusable };
+
+// Looks for the record of a killed run of the options' instance under the
+// current copy (options.currentInstallPath). A record that cannot be read or
+// used is set aside and reported as unusable.
+KilledRunFound findKilledRun(UpgradeContext &context, const UpgradeOptions &options, KilledRun &run);
+
+// Takes the killed run up again, with the context bound to the instance as it
+// was before that run: when the run had not yet reached the instance's
+// re-creation, everything it did is undone (the options are left as given,
+// *finished false, result 0); otherwise the upgrade is finished from the step
+// the run was killed in (*finished true, the upgrade's result).
+int recoverKilledRun(UpgradeContext &context, UpgradeOptions &options, bool *finished);

@@ -3,6 +3,7 @@
 #include "engn/sqo/run.h"
 
 #include "NT/instfiles.h"
+#include "NT/kxliutil.h"
 #include "NT/readnodetype.h"
 #include "engn/sqo/boundedtext.h"
 #include "engn/sqo/checks.h"
@@ -253,13 +254,42 @@ int upgradeFoundInstance(UpgradeContext &context, IKXLINSTANCE *instance, Upgrad
   return 0;
 }
 
+// A run of this command for the instance that was killed before it ended is
+// taken up first, with the instance bound as it was before that run: it is
+// either put back (and the run goes on as usual) or finished (`finished`).
+int takeUpKilledRun(UpgradeContext &context, UpgradeOptions &options, RunState &state, bool &finished) {
+  finished = false;
+  KilledRun killed;
+  InstallCopy *oldCopy = nullptr;
+  if (findKilledRun(context, options, killed) != KilledRunFound::found ||
+      context.copies->Find(killed.oldCopy, &oldCopy) != 0)
+    return 0;
+  IKXLINSTANCE previous(options.instanceName, oldCopy, killed.instanceDir);
+  previous.isClustered = killed.clustered ? 1 : 0;
+  setOwningCopy(context, oldCopy);
+  bindInstance(context, &previous);
+  copyText(state.auditInstance, sizeof state.auditInstance, options.instanceName);
+  int rc = recoverKilledRun(context, options, &finished);
+  context.instance = nullptr;
+  if (finished && rc != 0)
+    return checkFailed(kCheckDriver, rc);
+  if (finished)
+    lookForOdbcSources(state);
+  return rc;
+}
+
 // Checks of caller, instance and copies, then the upgrade itself.
 int checkAndUpgrade(UpgradeContext &context, UpgradeOptions &options, UpgradeDriver driver, RunState &state) {
   pdtEntry(KXL_FN_RUN_CHECKS);
   context.copy->GetPath(options.currentInstallPath, sizeof options.currentInstallPath);
+  bool finished = false;
+  int rc = takeUpKilledRun(context, options, state, finished);
+  if (finished) {
+    pdtExit(KXL_FN_RUN_CHECKS, rc, 0);
+    return rc;
+  }
   IKXLINSTANCE *instance = nullptr;
   InstallCopy *owner = findInstance(context, options.instanceName, &instance);
-  int rc = 0;
   if (owner == nullptr)
     rc = checkFailed(kCheckInstanceKnown, withInstanceToken(options, UPGRADE_RC_INSTANCE_UNKNOWN));
   else

@@ -90,9 +90,10 @@ TEST_F(DriverFailureTest, BackupFailuresEndWith1969AndLeaveNoDirectory) {
   struct Case {
     const char *fault;
     long long probe;
-  } cases[] = {{"GetTempPathA:1", 20},       {"_tempnam:1", 30},      {"CreateDirectoryA:1", 40},
-               {"sqlocopydir:1", 50},        {"FindNextFileA:1", 50}, {"FindNextFileA:6", 50},
-               {"GetDiskFreeSpaceExA:1", 50}};
+  } cases[] = {
+      {"GetTempPathA:1", 20},        {"_tempnam:1", 30},      {"CreateDirectoryA:1", 40},
+      {"sqlocopydir:1", 50},         {"FindNextFileA:1", 50}, {"FindNextFileA:6", 50},
+      {"GetDiskFreeSpaceExA:1", 50}, {"MoveFileExA:1", 320}}; // the last: the run's record cannot be written
   for (const Case &c : cases) {
     SCOPED_TRACE(c.fault);
     Outcome outcome = run({"INST1"}, c.fault);
@@ -372,6 +373,56 @@ TEST_F(DriverFailureTest, ClusteredInstanceWithoutTheClusterApi) {
   EXPECT_EQ(treeDifferences(before, tree(kOldInstanceDir)), "");
   EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
 }
+
+// A run killed at some point leaves its record; the next plain run puts the
+// instance back or finishes the upgrade, and leaves nothing of the killed run.
+// A record that cannot be used is set aside and the run judged as usual.
+struct KilledRunCase {
+  const char *what;
+  const char *kill;
+  const char *recordEdit; // replaces "oldCopy=KXL95" in the record (null: none)
+  bool backupLeft;        // the killed run's backup stays (its record was not usable)
+};
+
+class KilledRunTest : public DriverTest, public ::testing::WithParamInterface<KilledRunCase> {};
+
+constexpr const char *kRecord = "C:\\Program Files\\ZAV\\KXL101\\CFG\\kxliupgrade-INST1.run";
+
+TEST_P(KilledRunTest, NextRunLeavesTheUpgradedInstance) {
+  const KilledRunCase &c = GetParam();
+  Outcome killed = run({"INST1"}, "", c.kill);
+  ASSERT_EQ(killed.exitCode, 137) << killed.out << killed.err;
+  ASSERT_TRUE(exists(kRecord));
+  if (c.recordEdit != nullptr) {
+    std::string record = fileContent(kRecord);
+    record.replace(record.find("oldCopy=KXL95"), 13, c.recordEdit);
+    world.writeText(kRecord, record);
+  }
+
+  Outcome rerun = run({"INST1"});
+  EXPECT_EQ(rerun.exitCode, 0) << rerun.out << rerun.trace;
+  EXPECT_EQ(stringValue("SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1", "Copy"), "KXL101");
+  EXPECT_EQ(stringValue("SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1", "ImagePath"),
+            std::string(kCurrentCopy) + "\\bin\\kxlsyscs.exe");
+  EXPECT_TRUE(keyExists(profileKey("KXL101", "INST1")));
+  EXPECT_FALSE(keyExists(profileKey("KXL95", "INST1")));
+  EXPECT_TRUE(exists(std::string(kNewInstanceDir) + "\\kxlmd_config.xml"));
+  EXPECT_FALSE(exists(kRecord));
+  EXPECT_EQ(exists(std::string(kRecord) + ".damaged"), c.recordEdit != nullptr);
+  EXPECT_EQ(hasBackup(tempEntries()), c.backupLeft);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Kills, KilledRunTest,
+    ::testing::Values(KilledRunCase{"BackupCopyPutBack", "sqlocopydir:1", nullptr, false},
+                      KilledRunCase{"ProfileMovePutBack", "SHCopyKeyA:1", nullptr, false},
+                      KilledRunCase{"RecreationFinished", "sqlo_instance_create_extended:1", nullptr, false},
+                      KilledRunCase{"SslToolFinished", "sqloexec2:3", nullptr, false},
+                      KilledRunCase{"RegistryWriteFinished", "hivewrite:4", nullptr, false},
+                      KilledRunCase{"DamagedRecordSetAside", "sqlocopydir:1", "oldCopy=KXL95\nbroken line",
+                                    true},
+                      KilledRunCase{"RecordOfAGoneCopySetAside", "sqlocopydir:1", "oldCopy=KXL77", true}),
+    [](const ::testing::TestParamInfo<KilledRunCase> &info) { return std::string(info.param.what); });
 
 } // namespace
 } // namespace drivertest

@@ -106,7 +106,8 @@ void DriverTest::TearDown() {
   fs::remove_all(temp_, ignored);
 }
 
-Outcome DriverTest::run(const std::vector<std::string> &args, const std::string &faults) {
+Outcome DriverTest::run(const std::vector<std::string> &args, const std::string &faults,
+                        const std::string &kill) {
   Outcome outcome;
   std::string tag = temp_ + "/run" + std::to_string(++runs_);
   std::string eventLog = root_ + "/events.jsonl";
@@ -119,6 +120,8 @@ Outcome DriverTest::run(const std::vector<std::string> &args, const std::string 
   command.settings = {"KXLSIM_ROOT=" + root_, "KXLTRACE=" + tag + ".trace"};
   if (!faults.empty())
     command.settings.push_back("KXLSIM_FAIL=" + faults);
+  if (!kill.empty())
+    command.settings.push_back("KXLSIM_KILL=" + kill);
   command.outFile = tag + ".out";
   command.errFile = tag + ".err";
   outcome.exitCode = kxltestsupport::runCommand(command);

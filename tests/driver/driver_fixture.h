@@ -42,8 +42,10 @@ protected:
   void SetUp() override;
   void TearDown() override;
 
-  // Runs the command with `args`; `faults` is the KXLSIM_FAIL value ("" none).
-  Outcome run(const std::vector<std::string> &args, const std::string &faults = "");
+  // Runs the command with `args`; `faults` is the KXLSIM_FAIL value ("" none),
+  // `kill` the KXLSIM_KILL value ("" none).
+  Outcome run(const std::vector<std::string> &args, const std::string &faults = "",
+              const std::string &kill = "");
 
   std::string hostPath(const std::string &windowsPath) const;
   Tree tree(const std::string &windowsPath) const;

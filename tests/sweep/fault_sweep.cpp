@@ -29,6 +29,7 @@ struct Options {
   std::vector<std::string> scenarios;
   std::string table; // where the table of outcomes is written ("" none)
   bool verbose = false;
+  bool safetyOnly = false; // the exit status speaks only of unsafe runs
 };
 
 bool parseOptions(int argc, char **argv, Options &options) {
@@ -39,12 +40,18 @@ bool parseOptions(int argc, char **argv, Options &options) {
       options.kill = true;
     else if (arg == "--verbose")
       options.verbose = true;
+    else if (arg == "--safety-only")
+      options.safetyOnly = true;
     else if (arg == "--sample" && hasValue)
       options.sample = std::strtoul(argv[++i], nullptr, 10);
     else if (arg == "--scenario" && hasValue)
       options.scenarios.push_back(argv[++i]);
     else if (arg == "--table" && hasValue)
       options.table = argv[++i];
+    else if (arg == "--command" && hasValue)
+      kxlsweep::programs().command = argv[++i];
+    else if (arg == "--kxlsim" && hasValue)
+      kxlsweep::programs().kxlsim = argv[++i];
     else
       return false;
   }
@@ -75,6 +82,7 @@ struct Figures {
   int promised = 0;
   int rerunsNeeded = 0;
   int rerunsSucceeded = 0;
+  int unsafe = 0;
 };
 
 int sweepScenario(const Scenario &scenario, const Options &options, SweepDir &dir, Figures &figures,
@@ -90,6 +98,7 @@ int sweepScenario(const Scenario &scenario, const Options &options, SweepDir &di
     PointOutcome outcome = tryPoint(scenario, worlds, point, options.kill, dir);
     ++figures.points;
     figures.promised += outcome.promised ? 1 : 0;
+    figures.unsafe += outcome.unsafe ? 1 : 0;
     figures.rerunsNeeded += outcome.rerunNeeded ? 1 : 0;
     figures.rerunsSucceeded += outcome.rerunNeeded && outcome.rerunSucceeded ? 1 : 0;
     if (!outcome.promised || (outcome.rerunNeeded && !outcome.rerunSucceeded) || options.verbose)
@@ -105,7 +114,7 @@ int main(int argc, char **argv) {
   Options options;
   if (!parseOptions(argc, argv, options)) {
     std::cerr << "usage: kxl_fault_sweep [--kill] [--sample N] [--scenario NAME]... [--table FILE] "
-                 "[--verbose]\n";
+                 "[--verbose] [--safety-only] [--command PATH] [--kxlsim PATH]\n";
     return 2;
   }
   SweepDir dir;
@@ -120,10 +129,13 @@ int main(int argc, char **argv) {
     problems += sweepScenario(scenario, options, dir, figures, outcomes);
   if (!options.table.empty() && !writeTable(options.table, options.kill, outcomes))
     ++problems;
-  std::printf("%s sweep: scenarios %d, points tried %d, outcomes as promised %d, reruns needed %d, reruns "
-              "that succeeded %d\n",
-              options.kill ? "kill" : "fault", figures.scenarios, figures.points, figures.promised,
-              figures.rerunsNeeded, figures.rerunsSucceeded);
+  std::printf(
+      "%s sweep: scenarios %d, points tried %d, outcomes as promised %d, unsafe runs %d, reruns needed "
+      "%d, reruns that succeeded %d\n",
+      options.kill ? "kill" : "fault", figures.scenarios, figures.points, figures.promised, figures.unsafe,
+      figures.rerunsNeeded, figures.rerunsSucceeded);
   bool allHeld = figures.promised == figures.points && figures.rerunsSucceeded == figures.rerunsNeeded;
+  if (options.safetyOnly)
+    allHeld = figures.unsafe == 0;
   return problems == 0 && allHeld ? 0 : 1;
 }

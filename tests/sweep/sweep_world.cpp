@@ -71,7 +71,7 @@ Run runProgram(const std::string &program, const std::vector<std::string> &args,
 }
 
 Run kxlsim(const std::vector<std::string> &args, SweepDir &dir) {
-  return runProgram(KXL_KXLSIM, args, {}, "", dir);
+  return runProgram(programs().kxlsim, args, {}, "", dir);
 }
 
 // The command in `world`, started from the world's folder (current directory C:\).
@@ -171,17 +171,20 @@ bool sanitizerReport(const std::string &err) {
   return err.find("Sanitizer") != std::string::npos || err.find("runtime error:") != std::string::npos;
 }
 
+void unsafeRun(PointOutcome &outcome, const std::string &problem) {
+  outcome.problems.push_back(problem);
+  outcome.unsafe = true;
+}
+
 void checkRun(const Run &run, bool killed, PointOutcome &outcome) {
   if (run.exitCode == kxltestsupport::kRunTimedOut)
-    outcome.problems.push_back("did not end");
+    unsafeRun(outcome, "did not end");
   else if (run.exitCode == kxltestsupport::kRunNotExited)
-    outcome.problems.push_back("crashed");
+    unsafeRun(outcome, "crashed");
   if (sanitizerReport(run.err))
-    outcome.problems.push_back("sanitizer report: " + firstLine(run.err));
-  if (killed)
-    return;
-  if (outcome.message.empty())
-    outcome.problems.push_back("no message");
+    unsafeRun(outcome, "sanitizer report: " + firstLine(run.err));
+  if (!killed && outcome.message.empty())
+    unsafeRun(outcome, "no message");
 }
 
 // The same command again without any fault: it must leave the world of a clean upgrade.
@@ -214,6 +217,11 @@ std::vector<Scenario> sweptScenarios(const std::vector<std::string> &only) {
   return chosen;
 }
 
+Programs &programs() {
+  static Programs chosen;
+  return chosen;
+}
+
 SweepDir::SweepDir() : path_(kxltestsupport::newTempDir("kxlsweep")) {}
 
 SweepDir::~SweepDir() {
@@ -235,8 +243,8 @@ bool prepareScenario(const Scenario &scenario, SweepDir &dir, ScenarioWorlds &wo
   worlds.before = base + "/before";
   worlds.clean = base + "/clean";
   fs::create_directories(base);
-  Run created =
-      kxlsim({"create", worlds.before, "--scenario", scenario.worldScenario, "--command", KXL_COMMAND}, dir);
+  Run created = kxlsim(
+      {"create", worlds.before, "--scenario", scenario.worldScenario, "--command", programs().command}, dir);
   if (created.exitCode != 0)
     return problem = "kxlsim create: " + created.err, false;
   if (!linkPrograms(worlds.before, base + "/programs") || !copyWorld(worlds.before, worlds.clean))
@@ -274,10 +282,12 @@ PointOutcome tryPoint(const Scenario &scenario, const ScenarioWorlds &worlds, co
   Comparison fromBefore = compare(worlds.before, world, dir);
   if (!fromBefore.readable) {
     outcome.kind = "registry damaged";
-    outcome.problems.push_back(fromBefore.differences.back());
+    unsafeRun(outcome, fromBefore.differences.back());
   } else if (killed) {
-    outcome.kind = "killed";
-    outcome.left = fromBefore.differences;
+    Comparison fromClean = compare(worlds.clean, world, dir);
+    bool complete = fromClean.differences.empty();
+    outcome.kind = complete ? "killed after the upgrade was complete" : "killed";
+    outcome.left = complete ? fromClean.differences : fromBefore.differences;
   } else if (run.exitCode == 0) {
     Comparison fromClean = compare(worlds.clean, world, dir);
     outcome.kind = fromClean.differences.empty() ? "completed" : "completed, differs from a clean upgrade";
@@ -287,7 +297,7 @@ PointOutcome tryPoint(const Scenario &scenario, const ScenarioWorlds &worlds, co
     outcome.left = fromBefore.differences;
   }
   if (kill && !killed)
-    outcome.problems.push_back("not killed: the run ended with " + std::to_string(run.exitCode));
+    unsafeRun(outcome, "not killed: the run ended with " + std::to_string(run.exitCode));
   if (!kill && run.exitCode == 0 && !outcome.left.empty())
     outcome.problems.push_back("exit 0 but not the world of a clean upgrade");
   if (!kill && run.exitCode != 0 && !outcome.left.empty())

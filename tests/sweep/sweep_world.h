@@ -8,6 +8,14 @@
 
 namespace kxlsweep {
 
+// The programs the sweeps run: the command installed into each world, and
+// kxlsim (which takes the tools program from beside itself when it is there).
+struct Programs {
+  std::string command = KXL_COMMAND;
+  std::string kxlsim = KXL_KXLSIM;
+};
+Programs &programs();
+
 struct Scenario {
   std::string name;
   std::string worldScenario; // the kxlsim scenario its world is built from
@@ -63,6 +71,7 @@ struct PointOutcome {
   std::string kind;              // what the run did: refused, completed, completed-ignoring, failed-left, ...
   std::vector<std::string> left; // differences the run left (against the world before, or the clean one)
   std::vector<std::string> problems;
+  bool unsafe = false; // a crash, a hang, a sanitizer report, no message, a damaged registry
   bool promised = false;
   bool rerunNeeded = false;
   bool rerunSucceeded = false;

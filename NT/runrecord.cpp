@@ -1,0 +1,212 @@
+#include "NT/runrecord.h"
+
+#include "NT/pathjoin.h"
+#include "engn/sqo/run.h"
+#include "install/kxlinstance.h"
+#include "platform/kxlsys.h"
+#include "platform/win32.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <map>
+#include <string>
+
+namespace {
+
+constexpr char kHeader[] = "KXLIUPGRADE run record 1";
+constexpr char kEnd[] = "end";
+constexpr uint32_t kMaxRecordSize = 16384;
+
+// A text of the record: where it lives in the run and how big its buffer is.
+struct TextField {
+  const char *key;
+  char *(*at)(DriverState &);
+  std::size_t size;
+};
+
+const TextField kTexts[] = {
+    {"instance", [](DriverState &s) { return s.instanceName; }, SQLO_INSTANCE_NAME_SZ},
+    {"oldCopy", [](DriverState &s) { return s.oldCopyName; }, SQLO_COPY_NAME_SZ},
+    {"currentCopy", [](DriverState &s) { return s.currentCopyName; }, SQLO_COPY_NAME_SZ},
+    {"instanceDir", [](DriverState &s) { return s.instanceDir; }, KXL_JOINED_PATH_SZ},
+    {"savedInstanceDir", [](DriverState &s) { return s.savedInstanceDir; }, KXL_JOINED_PATH_SZ},
+    {"backupDir", [](DriverState &s) { return s.backupDir; }, KXL_JOINED_PATH_SZ},
+    {"profileCopyDir", [](DriverState &s) { return s.profileCopyDir; }, KXL_JOINED_PATH_SZ},
+    {"newFunctionDir", [](DriverState &s) { return s.newFunctionDir; }, KXL_JOINED_PATH_SZ},
+    {"auditFile", [](DriverState &s) { return s.auditFile; }, KXL_JOINED_PATH_SZ},
+    {"auditCopyFile", [](DriverState &s) { return s.auditCopyFile; }, KXL_JOINED_PATH_SZ},
+    {"profilePath", [](DriverState &s) { return s.options.profilePath; },
+     sizeof(UpgradeOptions::profilePath)},
+    {"var159Head", [](DriverState &s) { return s.context.var159Head; }, UPGRADE_VAR159_SZ},
+    {"var159Tail", [](DriverState &s) { return s.context.var159Tail; }, UPGRADE_VAR159_SZ},
+};
+
+// A number of the record: read and set through the run's own field.
+struct NumberField {
+  const char *key;
+  uint32_t (*get)(const DriverState &);
+  void (*set)(DriverState &, uint32_t);
+};
+
+const NumberField kNumbers[] = {
+    {"nodeType", [](const DriverState &s) { return s.nodeType; },
+     [](DriverState &s, uint32_t v) { s.nodeType = v; }},
+    {"boundNodeType", [](const DriverState &s) { return s.context.nodeType; },
+     [](DriverState &s, uint32_t v) { s.context.nodeType = v; }},
+    {"flags", [](const DriverState &s) { return uint32_t(s.options.flags); },
+     [](DriverState &s, uint32_t v) { s.options.flags = uint16_t(v); }},
+    {"partitioned", [](const DriverState &s) { return uint32_t(s.options.partitionedInstance); },
+     [](DriverState &s, uint32_t v) { s.options.partitionedInstance = uint8_t(v); }},
+    {"clustered", [](const DriverState &s) { return uint32_t(s.context.instance->isClustered); },
+     [](DriverState &s, uint32_t v) { s.clustered = v != 0; }},
+    {"startType", [](const DriverState &s) { return uint32_t(s.context.serviceStartType); },
+     [](DriverState &s, uint32_t v) { s.context.serviceStartType = int32_t(v); }},
+    {"profilePathCreated", [](const DriverState &s) { return uint32_t(s.profilePathCreated); },
+     [](DriverState &s, uint32_t v) { s.profilePathCreated = v != 0; }},
+    {"profileMoved", [](const DriverState &s) { return uint32_t(s.profileMoved); },
+     [](DriverState &s, uint32_t v) { s.profileMoved = v != 0; }},
+    {"backupChosen", [](const DriverState &s) { return uint32_t(s.backupChosen); },
+     [](DriverState &s, uint32_t v) { s.backupChosen = v != 0; }},
+    {"backupComplete", [](const DriverState &s) { return uint32_t(s.backupComplete); },
+     [](DriverState &s, uint32_t v) { s.backupComplete = v != 0; }},
+};
+
+bool addLine(std::string &text, const char *key, const char *value) {
+  if (std::strpbrk(value, "\r\n") != nullptr)
+    return false;
+  text.append(key).append("=").append(value).append("\n");
+  return true;
+}
+
+bool recordText(DriverState &state, std::string &text) {
+  text = std::string(kHeader) + "\n";
+  bool ok = addLine(text, "step", std::to_string(state.step).c_str());
+  for (const TextField &field : kTexts)
+    ok = ok && addLine(text, field.key, field.at(state));
+  for (const NumberField &field : kNumbers)
+    ok = ok && addLine(text, field.key, std::to_string(field.get(state)).c_str());
+  text.append(kEnd).append("\n");
+  return ok;
+}
+
+bool writeWhole(const char *path, const std::string &text) {
+  HANDLE file = CreateFileA(path, GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS, FILE_ATTRIBUTE_NORMAL, nullptr);
+  if (file == INVALID_HANDLE_VALUE)
+    return false;
+  DWORD written = 0;
+  BOOL ok = WriteFile(file, text.data(), DWORD(text.size()), &written, nullptr);
+  ok = CloseHandle(file) && ok;
+  return ok && written == text.size();
+}
+
+bool readWhole(const char *path, std::string &text, bool &missing) {
+  missing = false;
+  HANDLE file = CreateFileA(path, GENERIC_READ, FILE_SHARE_READ, nullptr, OPEN_EXISTING,
+                            FILE_ATTRIBUTE_NORMAL, nullptr);
+  if (file == INVALID_HANDLE_VALUE) {
+    DWORD error = GetLastError();
+    missing = error == ERROR_FILE_NOT_FOUND || error == ERROR_PATH_NOT_FOUND;
+    return false;
+  }
+  char buffer[kMaxRecordSize];
+  DWORD got = 0;
+  BOOL ok = ReadFile(file, buffer, sizeof buffer, &got, nullptr);
+  CloseHandle(file);
+  if (!ok || got >= sizeof buffer)
+    return false;
+  text.assign(buffer, got);
+  return true;
+}
+
+// key -> value of a whole record; false when it is not one.
+bool parseRecord(const std::string &text, std::map<std::string, std::string> &values) {
+  std::size_t at = 0;
+  bool first = true, ended = false;
+  while (at < text.size()) {
+    std::size_t end = text.find('\n', at);
+    if (end == std::string::npos || ended)
+      return false;
+    std::string line = text.substr(at, end - at);
+    at = end + 1;
+    if (first) {
+      if (line != kHeader)
+        return false;
+      first = false;
+    } else if (line == kEnd) {
+      ended = true;
+    } else {
+      std::size_t equals = line.find('=');
+      if (equals == std::string::npos ||
+          !values.emplace(line.substr(0, equals), line.substr(equals + 1)).second)
+        return false;
+    }
+  }
+  return ended;
+}
+
+bool parseNumber(const std::string &text, uint32_t &value) {
+  if (text.empty() || text.size() > 10 || text.find_first_not_of("0123456789") != std::string::npos)
+    return false;
+  unsigned long long number = std::strtoull(text.c_str(), nullptr, 10);
+  value = uint32_t(number);
+  return number <= 0xFFFFFFFFull;
+}
+
+} // namespace
+
+void runRecordPath(char *buffer, const char *currentCopyPath, const char *instanceName) {
+  char name[64];
+  std::snprintf(name, sizeof name, "cfg\\kxliupgrade-%.8s.run", instanceName);
+  joinPath(buffer, currentCopyPath, name);
+}
+
+bool writeRunRecord(DriverState &state) {
+  std::string text;
+  char temporary[KXL_JOINED_PATH_SZ + 4];
+  std::snprintf(temporary, sizeof temporary, "%s.new", state.recordPath);
+  if (state.recordPath[0] == '\0' || std::strlen(temporary) >= KXL_JOINED_PATH_SZ ||
+      !recordText(state, text) || !writeWhole(temporary, text))
+    return false;
+  // The record is replaced whole or not at all.
+  if (MoveFileExA(temporary, state.recordPath, MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH))
+    return true;
+  DeleteFileA(temporary);
+  return false;
+}
+
+void removeRunRecord(const DriverState &state) {
+  if (state.recordPath[0] != '\0')
+    DeleteFileA(state.recordPath);
+}
+
+RecordRead readRunRecord(const char *path, DriverState &state) {
+  std::string text;
+  bool missing = false;
+  if (!readWhole(path, text, missing))
+    return missing ? RecordRead::none : RecordRead::damaged;
+  std::map<std::string, std::string> values;
+  if (!parseRecord(text, values) || !parseNumber(values["step"], state.step))
+    return RecordRead::damaged;
+  for (const TextField &field : kTexts) {
+    auto found = values.find(field.key);
+    if (found == values.end() || found->second.size() >= field.size)
+      return RecordRead::damaged;
+    std::memcpy(field.at(state), found->second.c_str(), found->second.size() + 1);
+  }
+  for (const NumberField &field : kNumbers) {
+    uint32_t value = 0;
+    if (!parseNumber(values[field.key], value))
+      return RecordRead::damaged;
+    field.set(state, value);
+  }
+  std::memcpy(state.recordPath, path, std::strlen(path) + 1);
+  return RecordRead::read;
+}
+
+void setRunRecordAside(const char *path) {
+  char aside[KXL_JOINED_PATH_SZ + 16];
+  std::snprintf(aside, sizeof aside, "%s.damaged", path);
+  if (!MoveFileExA(path, aside, MOVEFILE_REPLACE_EXISTING))
+    DeleteFileA(path);
+}

@@ -1,0 +1,35 @@
+// The record of an upgrade run that survives the run being killed: which step
+// it had reached, where its backup is, what it had created and the facts the
+// undo needs. It is written whole, before every step that changes the machine,
+// as "<current copy>\cfg\kxliupgrade-<INSTANCE>.run" (a new text beside it,
+// then moved over it), and removed when the run ends. The next run of the
+// command for the instance reads it before anything else and either puts the
+// instance back or finishes the upgrade (see docs/recovery.md).
+#pragma once
+
+#include "NT/driverstate.h"
+
+#include <cstdint>
+
+// Trace point of the record (written, read, set aside) and of the backup's place in the diagnostic log.
+inline constexpr uint32_t kProbeRunRecord = 320;
+inline constexpr uint32_t kProbeBackupPlace = 45;
+
+// The record's path for an instance, in a buffer of KXL_JOINED_PATH_SZ bytes.
+void runRecordPath(char *buffer, const char *currentCopyPath, const char *instanceName);
+
+// Writes the record of `state` at its step (an index of the driver's step
+// table); false when it could not be written whole (the old record stays).
+bool writeRunRecord(DriverState &state);
+
+// Removes the record of `state`'s run.
+void removeRunRecord(const DriverState &state);
+
+enum class RecordRead { none, read, damaged };
+
+// Reads the record at `path` into `state`: the run's facts and step, and the
+// values the run had bound into its context and options.
+RecordRead readRunRecord(const char *path, DriverState &state);
+
+// Moves a record that cannot be used out of the way ("<path>.damaged").
+void setRunRecordAside(const char *path);
