@@ -12,7 +12,7 @@
 #include <cstdint>
 
 // Trace point of the record (written, read, set aside) and of the backup's place in the diagnostic log.
-inline constexpr uint32_t kProbeRunRecord = 320;
+inline constexpr uint32_t kProbeRunRecord = 330;
 inline constexpr uint32_t kProbeBackupPlace = 45;
 
 // The record's path for an instance, in a buffer of KXL_JOINED_PATH_SZ bytes.

@@ -117,30 +117,44 @@ bool planned(const CallPlan &calls, const char *name, unsigned long call) {
   return it != calls.end() && it->second.count(call) != 0;
 }
 
-// Counts the call; true when it is to fail. Ends the process when it is to be killed.
-bool countCall(const char *name) {
-  if (inactive)
-    return false;
+struct CallFate {
+  bool fail = false;
+  bool kill = false;
+};
+
+// Counts the call and tells whether it is to fail or to be killed.
+CallFate countCall(const char *name) {
+  if (inactive || name == nullptr)
+    return {};
   std::lock_guard<std::mutex> lock(planMutex);
   if (!plan.loaded)
     loadPlan(plan);
   if (!plan.counting)
-    return false;
+    return {};
   unsigned long call = ++plan.calls[name];
-  if (planned(plan.killing, name, call))
-    std::_Exit(kKilledExitCode);
-  return planned(plan.failing, name, call);
+  return {planned(plan.failing, name, call), planned(plan.killing, name, call)};
 }
 
 } // namespace
 
+void killNow() {
+  std::_Exit(kKilledExitCode);
+}
+
 bool shouldFail(const char *functionName) {
-  return functionName != nullptr && countCall(functionName);
+  CallFate fate = countCall(functionName);
+  if (fate.kill)
+    killNow();
+  return fate.fail;
 }
 
 void killPoint(const char *hookName) {
-  if (hookName != nullptr)
-    countCall(hookName);
+  if (countCall(hookName).kill)
+    killNow();
+}
+
+bool killDue(const char *hookName) {
+  return countCall(hookName).kill;
 }
 
 void resetFaults() {

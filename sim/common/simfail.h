@@ -33,6 +33,11 @@ bool shouldFail(const char *functionName);
 // names this call.
 void killPoint(const char *hookName);
 
+// Counts this call of the hook `hookName`; true when KXLSIM_KILL names it, for
+// hooks that leave a half-done write behind before killNow().
+bool killDue(const char *hookName);
+[[noreturn]] void killNow();
+
 // Clears the call counters and re-reads the settings (for tests that change them).
 void resetFaults();
 

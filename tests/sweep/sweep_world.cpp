@@ -35,11 +35,8 @@ const Scenario kScenarios[] = {
      {"-u", "KXLADMIN,secret", "INST2"},
      "partitioned instance INST2 over two machines"},
     {"forcecn", "demo", {"-forcecn", "-u", "KXLADMIN,secret", "INST2"}, "INST2 with -forcecn"},
-    {"cluster-single", "cluster", {"CLINST1"}, "clustered single-partition instance"},
-    {"cluster-partitioned",
-     "cluster",
-     {"-u", "KXLADMIN,secret", "CLINST2"},
-     "clustered partitioned instance"},
+    {"cluster-single", "cluster", {"CINST1"}, "clustered single-partition instance CINST1"},
+    {"cluster-partitioned", "cluster", {"-u", "kxlsvc,Secret1", "CINST2"}, "clustered partitioned instance CINST2"},
 };
 
 // Files that every run writes or may write whatever happens: the event log,
