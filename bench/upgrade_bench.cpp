@@ -18,7 +18,8 @@
 // Usage: kxl_upgrade_bench [--rounds N] [--only ROW[,ROW...]] [--half-only]
 //                          [--command PATH] [--tools PATH] [--messages DIR]
 // The last three take the programs and catalogs of another build (to compare
-// builds); by default those of this build.
+// builds); by default those of this build. With KXL_BENCH_KEEP set the worlds
+// stay in the scratch folder, named on standard error, to be looked into.
 #include "sim/kxlsim/scenarios.h"
 #include "sim/posix/regfile.h"
 
@@ -295,6 +296,7 @@ public:
 
   fs::path world(const std::string &name, const std::function<void(WorldWriter &)> &extend) {
     fs::path dir = scratch_ / name;
+    run({"/bin/rm", "-rf", dir.string()}); // one kept from an earlier row of the same name
     if (!buildWorld(dir, options_.sources, extend)) {
       std::fprintf(stderr, "bench: world %s not built\n", name.c_str());
       std::exit(1);
@@ -426,6 +428,8 @@ int main(int argc, char **argv) {
   if (mkdtemp(pattern.data()) == nullptr)
     return 1;
   Bench b(options, pattern);
+  if (std::getenv("KXL_BENCH_KEEP") != nullptr)
+    std::fprintf(stderr, "bench: worlds kept in %s\n", pattern.c_str());
   b.demo_ = b.world("demo", [](WorldWriter &) {});
   std::printf(
       "| row        | size                   | measured                   |   median | baseline             "
