@@ -165,11 +165,11 @@ bool writeRunRecord(DriverState &state) {
   std::string text;
   char temporary[KXL_JOINED_PATH_SZ + 4];
   std::snprintf(temporary, sizeof temporary, "%s.new", state.recordPath);
-  if (state.recordPath[0] == '\0' || std::strlen(temporary) >= KXL_JOINED_PATH_SZ ||
-      !recordText(state, text) || !writeWhole(temporary, text))
+  if (state.recordPath[0] == '\0' || std::strlen(temporary) >= KXL_JOINED_PATH_SZ || !recordText(state, text))
     return false;
-  // The record is replaced whole or not at all.
-  if (MoveFileExA(temporary, state.recordPath, MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH))
+  // The record is replaced whole or not at all; a new text that did not make it goes again.
+  if (writeWhole(temporary, text) &&
+      MoveFileExA(temporary, state.recordPath, MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH))
     return true;
   DeleteFileA(temporary);
   return false;
