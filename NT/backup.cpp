@@ -13,6 +13,10 @@ namespace {
 
 constexpr char kBackupPrefix[] = "KXL";
 constexpr uint32_t kProbeRestoreFailed = 300;
+constexpr uint32_t kProbeBackupKept = 340;
+// A removal stopped by a passing fault (a listing that failed half way) is
+// tried again on what is left; only a lasting failure keeps the backup.
+constexpr int kBackupRemovalAttempts = 2;
 
 // Reports the system's last error at `probe` together with the failure.
 StepResult failedWithSystemError(uint32_t probe, int32_t rc) {
@@ -144,9 +148,17 @@ bool restoreBackup(DriverState &state) {
 }
 
 void removeBackup(DriverState &state) {
-  if (state.backupChosen)
-    sqlodeletedir(state.backupDir);
+  if (!state.backupChosen)
+    return;
   state.backupChosen = false;
+  int32_t rc = 0;
+  for (int attempt = 0; attempt < kBackupRemovalAttempts; ++attempt) {
+    rc = sqlodeletedir(state.backupDir);
+    if (rc == 0 || !pathExists(state.backupDir))
+      return;
+  }
+  pdLog(PD_LEVEL_WARNING, KXL_FN_UPGRADE_INSTANCE, kProbeBackupKept, rc,
+        "backup %s of instance directory %s could not be removed", state.backupDir, state.savedInstanceDir);
 }
 
 bool refreshFromBackup(DriverState &state) {

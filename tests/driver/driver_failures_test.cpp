@@ -16,11 +16,6 @@ constexpr long long kAccessDenied = static_cast<int32_t>(0x870F0003u);
 constexpr long long kExecFailed = static_cast<int32_t>(0x870F0140u);
 constexpr long long kPathNotFound = static_cast<int32_t>(0x870F0011u);
 
-bool hasBackup(const std::vector<std::string> &entries) {
-  return std::any_of(entries.begin(), entries.end(),
-                     [](const std::string &name) { return name.rfind("KXL", 0) == 0; });
-}
-
 // The partitions' services run under this account already: a failure after
 // they were re-pointed with it leaves them as they were.
 const std::vector<std::string> kPartitioned = {"-u", ".\\kxlsvc,secret", "INST2"};

@@ -5,6 +5,7 @@
 #include "sim/kxlsim/world_reader.h"
 #include "tests/support/command_run.h"
 
+#include <algorithm>
 #include <filesystem>
 #include <regex>
 #include <sstream>
@@ -61,6 +62,11 @@ void readDriverTrace(const std::string &trace, Outcome &outcome) {
 
 std::string profileKey(const std::string &copyName, const std::string &instance) {
   return kxlsim::copyRegistryKey(copyName) + "\\PROFILES\\" + instance;
+}
+
+bool hasBackup(const std::vector<std::string> &entries) {
+  return std::any_of(entries.begin(), entries.end(),
+                     [](const std::string &name) { return name.rfind("KXL", 0) == 0; });
 }
 
 std::string treeDifferences(const Tree &before, const Tree &after) {

@@ -87,4 +87,7 @@ std::string treeDifferences(const Tree &before, const Tree &after);
 // The profile key of an instance under a copy.
 std::string profileKey(const std::string &copyName, const std::string &instance);
 
+// True when `entries` (of the temporary directory) hold a backup folder.
+bool hasBackup(const std::vector<std::string> &entries);
+
 } // namespace drivertest

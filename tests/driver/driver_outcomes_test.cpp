@@ -130,6 +130,33 @@ TEST_F(DriverOutcomeTest, MissingOptionalFilesAndCleanupFailureDoNotFailTheUpgra
   EXPECT_FALSE(exists(std::string(kNewInstanceDir) + "\\cfg\\kxldj.ini"));
 }
 
+// The backup goes once the instance is upgraded: a removal stopped half way
+// (a listing that failed, a removal that failed once) is tried again, and
+// only a lasting failure keeps it, named in the diagnostic log. The upgrade
+// stays completed, and a rerun finds the instance on the current copy.
+TEST_F(DriverOutcomeTest, BackupIsRemovedAfterAFailedRemoval) {
+  struct Case {
+    const char *fault;
+    bool kept;
+  } cases[] = {
+      {"FindNextFileA:93", false}, // the last listing of the backup's removal
+      {"sqlodeletedir:1", false},
+      {"sqlodeletedir:1,sqlodeletedir:2", true},
+  };
+  for (const Case &c : cases) {
+    SCOPED_TRACE(c.fault);
+    resetWorld();
+    Outcome outcome = run({"INST1"}, c.fault);
+    EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
+    EXPECT_TRUE(outcome.failures.empty()) << outcome.trace;
+    EXPECT_EQ(stringValue("SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1", "Copy"), "KXL101");
+    EXPECT_EQ(hasBackup(tempEntries()), c.kept);
+    EXPECT_EQ(outcome.diagnostics.find("could not be removed") != std::string::npos, c.kept)
+        << outcome.diagnostics;
+    EXPECT_EQ(run({"-q", "INST1"}).exitCode, -1949 & 0xFF) << "a rerun finds it on the current copy";
+  }
+}
+
 TEST_F(DriverOutcomeTest, CleanupRunThatCannotStartDoesNotChangeTheResult) {
   // Installer mode: the audit, SSL and clean-up tools are the run's programs.
   Outcome outcome = run({"-install", "INST1"}, "sqloexec2:3");
