@@ -34,7 +34,12 @@ struct FaultPlan {
 };
 
 std::mutex planMutex;
-FaultPlan plan;
+// Never destroyed: registry files written back while the process exits still
+// pass their kill points.
+FaultPlan &thePlan() {
+  static FaultPlan *plan = new FaultPlan;
+  return *plan;
+}
 std::atomic<bool> inactive{false}; // loaded, and nothing to fail, kill or count
 
 // One "name:n" entry; malformed entries (no name, n not a positive number) are ignored.
@@ -72,12 +77,12 @@ std::string variableText(const char *variable) {
 
 void writeCounts() {
   std::lock_guard<std::mutex> lock(planMutex);
-  if (plan.countFile.empty())
+  if (thePlan().countFile.empty())
     return;
-  std::FILE *file = std::fopen(plan.countFile.c_str(), "w");
+  std::FILE *file = std::fopen(thePlan().countFile.c_str(), "w");
   if (file == nullptr)
     return;
-  for (const auto &[name, count] : plan.calls)
+  for (const auto &[name, count] : thePlan().calls)
     std::fprintf(file, "%s %lu\n", name.c_str(), count);
   std::fclose(file);
 }
@@ -90,8 +95,8 @@ void keepSettingsFromChildren() {
 #ifdef _WIN32
   for (const char *name : kOwnSettings)
     SetEnvironmentVariableA(name, nullptr);
-  if (!plan.childPlan.empty())
-    SetEnvironmentVariableA("KXLSIM_FAIL", plan.childPlan.c_str());
+  if (!thePlan().childPlan.empty())
+    SetEnvironmentVariableA("KXLSIM_FAIL", thePlan().childPlan.c_str());
 #endif
 }
 
@@ -127,12 +132,12 @@ CallFate countCall(const char *name) {
   if (inactive || name == nullptr)
     return {};
   std::lock_guard<std::mutex> lock(planMutex);
-  if (!plan.loaded)
-    loadPlan(plan);
-  if (!plan.counting)
+  if (!thePlan().loaded)
+    loadPlan(thePlan());
+  if (!thePlan().counting)
     return {};
-  unsigned long call = ++plan.calls[name];
-  return {planned(plan.failing, name, call), planned(plan.killing, name, call)};
+  unsigned long call = ++thePlan().calls[name];
+  return {planned(thePlan().failing, name, call), planned(thePlan().killing, name, call)};
 }
 
 } // namespace
@@ -159,7 +164,7 @@ bool killDue(const char *hookName) {
 
 void resetFaults() {
   std::lock_guard<std::mutex> lock(planMutex);
-  loadPlan(plan);
+  loadPlan(thePlan());
 }
 
 bool isOwnProcessSetting(const char *entry) {
@@ -173,9 +178,9 @@ bool isOwnProcessSetting(const char *entry) {
 
 const char *childFaultPlan() {
   std::lock_guard<std::mutex> lock(planMutex);
-  if (!plan.loaded)
-    loadPlan(plan);
-  return plan.childPlan.c_str();
+  if (!thePlan().loaded)
+    loadPlan(thePlan());
+  return thePlan().childPlan.c_str();
 }
 
 } // namespace kxlsim
