@@ -12,7 +12,7 @@
 #endif
 #include <windows.h>
 #else
-#include "sim/posix/world.h"
+#include "sim/common/worldroot.h"
 #include <fcntl.h>
 #include <unistd.h>
 #endif

@@ -1,6 +1,8 @@
 // Where the world lives and how Windows paths map onto it.
 #include "sim/posix/world.h"
 
+#include "sim/common/worldroot.h"
+
 #include <dirent.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -18,90 +20,13 @@ namespace kxlsim::posix {
 
 namespace {
 
-std::mutex rootMutex;
-std::string cachedRoot;
-bool rootKnown = false;
-
 bool isSep(char c) {
   return c == '\\' || c == '/';
-}
-
-bool isFile(const std::string &path) {
-  struct stat st {};
-  return stat(path.c_str(), &st) == 0 && S_ISREG(st.st_mode);
 }
 
 bool isDirectory(const std::string &path) {
   struct stat st {};
   return stat(path.c_str(), &st) == 0 && S_ISDIR(st.st_mode);
-}
-
-std::string parentDirectory(const std::string &path) {
-  size_t slash = path.find_last_of('/');
-  if (slash == std::string::npos)
-    return "";
-  return slash == 0 ? "/" : path.substr(0, slash);
-}
-
-std::string currentHostDirectory() {
-  char buffer[PATH_MAX];
-  if (getcwd(buffer, sizeof buffer) == nullptr)
-    return "";
-  return buffer;
-}
-
-// The program path as it was started (first word of the command line), made
-// absolute but not resolved, so a link placed inside a world counts there.
-std::string startedProgramPath() {
-  std::ifstream in("/proc/self/cmdline", std::ios::binary);
-  std::string argv0;
-  std::getline(in, argv0, '\0');
-  if (argv0.find('/') == std::string::npos)
-    return "";
-  if (argv0[0] == '/')
-    return argv0;
-  return currentHostDirectory() + "/" + argv0;
-}
-
-std::string resolvedProgramPath() {
-  char buffer[PATH_MAX];
-  ssize_t n = readlink("/proc/self/exe", buffer, sizeof buffer - 1);
-  if (n <= 0)
-    return "";
-  buffer[n] = '\0';
-  return buffer;
-}
-
-// Nearest directory at or above `start` that holds system.reg.
-std::string worldAbove(std::string dir) {
-  while (!dir.empty()) {
-    std::string base = dir == "/" ? "" : dir;
-    if (isFile(base + "/system.reg"))
-      return dir;
-    if (dir == "/")
-      break;
-    dir = parentDirectory(dir);
-  }
-  return "";
-}
-
-std::string stripTrailingSlashes(std::string path) {
-  while (path.size() > 1 && path.back() == '/')
-    path.pop_back();
-  return path;
-}
-
-std::string findRoot() {
-  if (const char *env = std::getenv("KXLSIM_ROOT"); env != nullptr && env[0] != '\0')
-    return stripTrailingSlashes(env);
-  for (const std::string &program : {startedProgramPath(), resolvedProgramPath()}) {
-    if (program.empty())
-      continue;
-    std::string found = worldAbove(parentDirectory(program));
-    if (!found.empty())
-      return found;
-  }
-  return "";
 }
 
 // Characters Windows refuses in a file name (the drive colon is handled apart).
@@ -210,8 +135,17 @@ struct Listing {
 };
 
 constexpr size_t kMaxListings = 64;
-std::mutex listingMutex;
-std::unordered_map<std::string, Listing> listings; // by host folder
+// Never destroyed: registry files written while the process exits still
+// report the entries they add.
+struct ListingCache {
+  std::mutex mutex;
+  std::unordered_map<std::string, Listing> byFolder; // by host folder
+};
+
+ListingCache &listingCache() {
+  static ListingCache *cache = new ListingCache;
+  return *cache;
+}
 
 bool sameTime(const struct timespec &a, const struct timespec &b) {
   return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec;
@@ -243,13 +177,13 @@ void addName(Listing &listing, const std::string &name) {
 }
 
 // The listing of `dir` as it is now: the kept one, or a new one. Null when the
-// folder cannot be read. The caller holds listingMutex.
+// folder cannot be read. The caller holds the cache's mutex.
 const Listing *currentListing(const std::string &dir) {
   struct stat st {};
   if (stat(dir.c_str(), &st) != 0)
     return nullptr;
-  auto kept = listings.find(dir);
-  if (kept != listings.end() && listingCurrent(kept->second, st))
+  auto kept = listingCache().byFolder.find(dir);
+  if (kept != listingCache().byFolder.end() && listingCurrent(kept->second, st))
     return &kept->second;
   // The times are taken before the listing: a change made while it is read
   // gives the folder later times, so the listing is not kept past it.
@@ -261,9 +195,9 @@ const Listing *currentListing(const std::string &dir) {
   while (const dirent *entry = readdir(d))
     addName(fresh, entry->d_name);
   closedir(d);
-  if (listings.size() >= kMaxListings)
-    listings.clear();
-  return &(listings[dir] = std::move(fresh));
+  if (listingCache().byFolder.size() >= kMaxListings)
+    listingCache().byFolder.clear();
+  return &(listingCache().byFolder[dir] = std::move(fresh));
 }
 
 // What lies at `path` (following links): 1 a folder, 0 something else, -1 nothing.
@@ -282,7 +216,7 @@ bool matchEntry(const std::string &dir, const std::string &name, std::string &fo
     found = name;
     return true;
   }
-  std::lock_guard<std::mutex> lock(listingMutex);
+  std::lock_guard<std::mutex> lock(listingCache().mutex);
   const Listing *listing = currentListing(dir);
   if (listing == nullptr)
     return false;
@@ -335,21 +269,6 @@ std::string backslashed(std::string text) {
 
 } // namespace
 
-const std::string &worldRoot() {
-  std::lock_guard<std::mutex> lock(rootMutex);
-  if (!rootKnown) {
-    cachedRoot = findRoot();
-    rootKnown = true;
-  }
-  return cachedRoot;
-}
-
-void resetWorldRoot() {
-  std::lock_guard<std::mutex> lock(rootMutex);
-  rootKnown = false;
-  cachedRoot.clear();
-}
-
 void requireWorld() {
   if (!worldRoot().empty())
     return;
@@ -375,13 +294,13 @@ bool hostPath(std::string_view windowsPathText, std::string &out) {
 
 void noteEntryAdded(const std::string &hostPathText) {
   std::string dir = parentDirectory(hostPathText);
-  std::lock_guard<std::mutex> lock(listingMutex);
-  auto kept = listings.find(dir);
-  if (kept == listings.end())
+  std::lock_guard<std::mutex> lock(listingCache().mutex);
+  auto kept = listingCache().byFolder.find(dir);
+  if (kept == listingCache().byFolder.end())
     return;
   struct stat st {};
   if (stat(dir.c_str(), &st) != 0) {
-    listings.erase(kept);
+    listingCache().byFolder.erase(kept);
     return;
   }
   addName(kept->second, hostPathText.substr(dir.size() + 1));
@@ -389,8 +308,8 @@ void noteEntryAdded(const std::string &hostPathText) {
 }
 
 void noteEntryRemoved(const std::string &hostPathText) {
-  std::lock_guard<std::mutex> lock(listingMutex);
-  listings.erase(parentDirectory(hostPathText));
+  std::lock_guard<std::mutex> lock(listingCache().mutex);
+  listingCache().byFolder.erase(parentDirectory(hostPathText));
 }
 
 std::string windowsPath(std::string_view hostPathText) {

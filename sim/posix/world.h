@@ -2,17 +2,12 @@
 // Windows paths map onto it. Internal to sim/ (the command never includes it).
 #pragma once
 
+#include "sim/common/worldroot.h"
+
 #include <string>
 #include <string_view>
 
 namespace kxlsim::posix {
-
-// Host directory of the world: KXLSIM_ROOT when set, else the nearest directory
-// above the running executable that holds system.reg. Empty when there is none.
-const std::string &worldRoot();
-
-// Forgets the cached root (tests that switch KXLSIM_ROOT between worlds).
-void resetWorldRoot();
 
 // Prints one line on standard error and exits nonzero when no world is found.
 // Called by every Win32 entry point before it touches the world.

@@ -6,7 +6,7 @@
 // A program configured to fail does none of its work (tool_actions.h).
 #include "platform/win32.h"
 #include "sim/common/events.h"
-#include "sim/tools/tool_actions.h"
+#include "sim/product/tool_actions.h"
 #include "sim/tools/tool_names.h"
 
 #include <cstdio>

@@ -3,7 +3,7 @@
 #include "demo_world.h"
 
 #include "sim/posix/world.h"
-#include "sim/tools/tool_actions.h"
+#include "sim/product/tool_actions.h"
 
 #include <sys/wait.h>
 

@@ -1,6 +1,8 @@
 // What the product's configuration programs do to a world besides recording
 // their run. Each works for one copy (the copy whose bin folder holds the
-// program) and on the instance named by KXLINSTANCE.
+// program) and on the instance named by KXLINSTANCE. The product library's
+// face for its own programs (sim/tools): they reach its state only through
+// these calls.
 #pragma once
 
 #include <string>

@@ -1,4 +1,4 @@
-#include "sim/tools/tool_actions.h"
+#include "sim/product/tool_actions.h"
 
 #include "sim/product/installation.h"
 #include "sim/product/regutil.h"
