@@ -119,13 +119,6 @@ void writeU32(std::vector<uint8_t> &image, size_t offset, uint32_t value) {
     image[offset + i] = uint8_t(value >> (8 * i));
 }
 
-uint32_t dbmCfgChecksum(const std::vector<uint8_t> &image) {
-  uint32_t sum = 0;
-  for (size_t i = 4; i < image.size(); ++i)
-    sum += image[i];
-  return sum;
-}
-
 bool dbmCfgChecksumValid(const std::vector<uint8_t> &image) {
   return image.size() > 4 && readU32(image, kDbmCfgOffsetChecksum) == dbmCfgChecksum(image);
 }
@@ -144,13 +137,6 @@ std::vector<uint8_t> makeDbmCfgImage(int nodeType, DbmRelease release, bool smal
     applyDefaults(image, std::begin(kServerDefaults), std::end(kServerDefaults), nodeType == 4);
   dbmCfgSealChecksum(image);
   return image;
-}
-
-const char *dbmCfgTemplateName(int nodeType) {
-  static const char *const names[] = {"kxlsyssv", "kxlsysrq", "kxlsyssr", "kxlsysmp", "kxlsysst"};
-  if (nodeType < 1 || nodeType > 5)
-    return nullptr;
-  return names[nodeType - 1];
 }
 
 } // namespace kxlsim

@@ -8,6 +8,8 @@
 // bytes with its flag area at 3584.
 #pragma once
 
+#include "sim/common/dbmcfgfile.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <vector>
@@ -42,17 +44,12 @@ uint32_t readU32(const std::vector<uint8_t> &image, size_t offset);
 void writeU16(std::vector<uint8_t> &image, size_t offset, uint16_t value);
 void writeU32(std::vector<uint8_t> &image, size_t offset, uint32_t value);
 
-// Sum of every byte from offset 4 to the end of the image.
-uint32_t dbmCfgChecksum(const std::vector<uint8_t> &image);
+// Whether the stored checksum is right; sealing stores the right one.
 bool dbmCfgChecksumValid(const std::vector<uint8_t> &image);
 void dbmCfgSealChecksum(std::vector<uint8_t> &image);
 
 // A complete, sealed image for a node type 1..5 with in-range defaults
 // (server values cleared for node type 2). `small` gives the 4096-byte layout.
 std::vector<uint8_t> makeDbmCfgImage(int nodeType, DbmRelease release, bool small = false);
-
-// The template file name of a node type in a copy's CFG folder ("kxlsyssv"
-// for 1 ... "kxlsysst" for 5); nullptr outside 1..5.
-const char *dbmCfgTemplateName(int nodeType);
 
 } // namespace kxlsim

@@ -4,6 +4,7 @@
 // bytes from 4 to the end), parameter values, and the 512-byte flag area at
 // 15872 with one byte per parameter index.
 #include "platform/kxlsys.h"
+#include "sim/common/dbmcfgfile.h"
 #include "sim/common/simfail.h"
 #include "sim/product/simstore.h"
 #include "sim/product/winpath.h"
@@ -47,13 +48,6 @@ const Parameter *findParameter(uint32_t token) {
   return nullptr;
 }
 
-uint32_t checksum(const std::vector<uint8_t> &image) {
-  uint32_t sum = 0;
-  for (size_t i = 4; i < image.size(); ++i)
-    sum += image[i];
-  return sum;
-}
-
 uint32_t storedChecksum(const std::vector<uint8_t> &image) {
   return uint32_t(image[0]) | uint32_t(image[1]) << 8 | uint32_t(image[2]) << 16 | uint32_t(image[3]) << 24;
 }
@@ -93,7 +87,7 @@ int32_t updateFile(uint16_t count, const sqlfupd *items) {
     return kSystemErrorSqlcode;
   std::vector<uint8_t> image;
   if (kxlprod::readWholeFile(path, kConfigSize, image) != ERROR_SUCCESS || image.size() != kConfigSize ||
-      storedChecksum(image) != checksum(image))
+      storedChecksum(image) != kxlsim::dbmCfgChecksum(image))
     return kConfigFileSqlcode;
   for (uint16_t i = 0; i < count; ++i) {
     const Parameter *parameter = findParameter(items[i].token);
@@ -101,7 +95,7 @@ int32_t updateFile(uint16_t count, const sqlfupd *items) {
     std::memcpy(&value, items[i].ptrvalue, sizeof value);
     put(image, parameter->offset, value, parameter->length);
   }
-  put(image, 0, checksum(image), 4);
+  put(image, 0, kxlsim::dbmCfgChecksum(image), 4);
   return kxlprod::writeWholeFile(path, image) == ERROR_SUCCESS ? 0 : kConfigFileSqlcode;
 }
 

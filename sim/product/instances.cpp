@@ -10,6 +10,7 @@
 // earlier state back exactly instead of losing the instance.
 #include "sim/product/instances.h"
 #include "platform/kxlsys.h"
+#include "sim/common/dbmcfgfile.h"
 #include "sim/common/simfail.h"
 #include "sim/product/installation.h"
 #include "sim/product/regutil.h"
@@ -72,11 +73,6 @@ bool validInstanceName(const char *name) {
   if (name == nullptr || name[0] == '\0' || std::strlen(name) >= SQLO_INSTANCE_NAME_SZ)
     return false;
   return std::strpbrk(name, "\\/:*?\"<>| ") == nullptr;
-}
-
-const char *templateName(uint32_t nodeType) {
-  static const char *const names[] = {"kxlsyssv", "kxlsysrq", "kxlsyssr", "kxlsysmp", "kxlsysst"};
-  return nodeType >= 1 && nodeType <= 5 ? names[nodeType - 1] : nullptr;
 }
 
 std::string serverProgram(const CopyInfo &copy) {
@@ -166,7 +162,8 @@ void undoCreation(const Creation &c) {
 }
 
 int32_t writeConfiguration(const CopyInfo &copy, const CreateRequest &request, const std::string &directory) {
-  std::string source = kxlprod::joinPath(copy.path, std::string("CFG\\") + templateName(request.nodeType));
+  std::string source =
+      kxlprod::joinPath(copy.path, std::string("CFG\\") + kxlsim::dbmCfgTemplateName(request.nodeType));
   std::vector<uint8_t> image;
   LONG rc = kxlprod::readWholeFile(source, kConfigSize, image);
   if (rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND)
@@ -363,7 +360,7 @@ int32_t sqlo_instance_create_extended(const char *instanceName, const char *inst
   if (kxlsim::shouldFail("sqlo_instance_create_extended"))
     return SQLO_RC_SYSTEM_ERROR;
   if (!validInstanceName(instanceName) || instanceProfilePath == nullptr ||
-      templateName(newNodeType) == nullptr)
+      kxlsim::dbmCfgTemplateName(newNodeType) == nullptr)
     return SQLO_RC_INVALID_ARGUMENT;
   CreateRequest request;
   request.instance = instanceName;
