@@ -5,8 +5,8 @@
 #pragma once
 
 #include "NT/pathjoin.h"
-#include "engn/sqo/options.h"
 #include "platform/kxlsys.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

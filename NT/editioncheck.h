@@ -2,7 +2,7 @@
 // host an instance of a given node type.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

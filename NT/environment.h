@@ -3,8 +3,8 @@
 // partition 0. Whatever a failing call created is removed again.
 #pragma once
 
-#include "engn/sqo/options.h"
 #include "platform/kxlsys.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

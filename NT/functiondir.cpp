@@ -1,8 +1,8 @@
 #include "NT/functiondir.h"
 
 #include "NT/pathjoin.h"
-#include "engn/sqo/run.h"
 #include "platform/kxlsys.h"
+#include "upgrade/records.h"
 
 namespace {
 

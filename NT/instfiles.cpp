@@ -1,8 +1,8 @@
 #include "NT/instfiles.h"
 
 #include "NT/pathjoin.h"
-#include "engn/sqo/run.h"
 #include "platform/kxlsys.h"
+#include "upgrade/records.h"
 
 #include <cstdio>
 

@@ -2,7 +2,7 @@
 // and whether the current copy ships a node type's configuration template.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

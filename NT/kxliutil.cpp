@@ -15,10 +15,10 @@
 #include "NT/services.h"
 #include "NT/tools_run.h"
 #include "cluster/clusterstep.h"
-#include "engn/sqo/run.h"
 #include "install/installcopy.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
+#include "upgrade/records.h"
 
 #include <cstring>
 #include <iterator>

@@ -1,7 +1,7 @@
 // The upgrade engine's driver: moves one instance to the current copy.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

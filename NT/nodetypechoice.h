@@ -2,7 +2,7 @@
 // current copy has a configuration template for.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

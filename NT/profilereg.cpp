@@ -2,11 +2,11 @@
 
 #include "NT/localhost.h"
 
-#include "engn/sqo/run.h"
 #include "install/installcopy.h"
 #include "install/iutil.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
+#include "upgrade/records.h"
 
 #include <cctype>
 #include <cstddef>

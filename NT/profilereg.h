@@ -2,8 +2,8 @@
 // to the current copy's on every machine that serves the instance, and the undo.
 #pragma once
 
-#include "engn/sqo/options.h"
 #include "platform/win32.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

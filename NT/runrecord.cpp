@@ -1,10 +1,10 @@
 #include "NT/runrecord.h"
 
 #include "NT/pathjoin.h"
-#include "engn/sqo/run.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
+#include "upgrade/records.h"
 
 #include <cstdio>
 #include <cstdlib>

@@ -6,9 +6,9 @@
 #include "NT/localhost.h"
 #include "NT/nodetypechoice.h"
 #include "NT/pathjoin.h"
-#include "engn/sqo/run.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
+#include "upgrade/records.h"
 
 #include <cstring>
 

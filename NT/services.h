@@ -2,7 +2,7 @@
 // copy and makes every service of the instance run the current copy's programs.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

@@ -1,9 +1,9 @@
 #include "cluster/clusterstep.h"
 
 #include "cluster/mscsutil.h"
-#include "engn/sqo/run.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
+#include "upgrade/records.h"
 
 #include <cstdlib>
 #include <cstring>

@@ -2,7 +2,7 @@
 // resources by resources of the current copy's resource type.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

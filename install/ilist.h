@@ -17,6 +17,10 @@ inline constexpr uint32_t KXLI_RC_NAME_NOT_FOUND = 0x9000006Du;   // no entry of
 inline constexpr uint32_t KXLI_RC_NO_MEMORY = 0x9000000Du;        // allocation failed
 
 // Names of copies and instances are single-byte text compared ignoring case.
+inline constexpr uint32_t KXLI_COPY_NAME_SZ = 65;
+// Name of the version-8 installation in the list of copies.
+inline constexpr const char KXLI_V8_COPY_NAME[] = "KXLV8";
+
 inline char kxliUpper(char c) {
   return c >= 'a' && c <= 'z' ? static_cast<char>(c - 'a' + 'A') : c;
 }

@@ -146,24 +146,24 @@ uint32_t InstallCopy::GetVersion(CopyVersion **out) {
 uint32_t InstallCopy::GetInstanceList(IKXLINSTANCELIST **out) {
   if (instances == nullptr && family != nullptr)
     family->BuildInstanceLists();
-  return subList(instances, out);
+  return subList(instances, out, name);
 }
 
 uint32_t InstallCopy::GetInstalledProdList(InstalledProdList **out) {
-  return subList(installedProducts, out);
+  return subList(installedProducts, out, this);
 }
 
 // Builds a sub-list on first use and keeps it. A list whose build failed is not
 // kept: the next call tries again instead of handing out a partial list as if
-// it were whole.
-template <class List> uint32_t InstallCopy::subList(List *&kept, List **out) {
+// it were whole. The list is built from `source`: this copy, or its name.
+template <class List, class Source> uint32_t InstallCopy::subList(List *&kept, List **out, Source source) {
   if (out == nullptr)
     return KXLI_RC_NULL_ARGUMENT;
   *out = nullptr;
   if (name[0] == '\0')
     return KXLI_RC_NOT_USABLE;
   if (kept == nullptr) {
-    List *built = new (std::nothrow) List(this);
+    List *built = new (std::nothrow) List(source);
     if (built == nullptr)
       return KXLI_RC_NO_MEMORY;
     if (built->status != 0) {
@@ -252,12 +252,15 @@ uint32_t InstallCopyList::adopt(InstallCopy *copy) {
 void InstallCopyList::BuildInstanceLists() {
   // Walked by node, so that a caller's walk of this list keeps its place.
   std::vector<InstallCopy *> owners;
+  std::vector<const char *> names;
   for (INODE<InstallCopy> *node = head; node != nullptr; node = node->next)
-    if (node->data->instances == nullptr && node->data->name[0] != '\0')
+    if (node->data->instances == nullptr && node->data->name[0] != '\0') {
       owners.push_back(node->data);
+      names.push_back(node->data->name);
+    }
   std::vector<IKXLINSTANCELIST *> lists(owners.size(), nullptr);
-  if (owners.empty() || IKXLINSTANCELIST::BuildForCopies(owners.data(), static_cast<uint32_t>(owners.size()),
-                                                         lists.data()) != 0)
+  if (owners.empty() ||
+      IKXLINSTANCELIST::BuildForCopies(names.data(), static_cast<uint32_t>(names.size()), lists.data()) != 0)
     return;
   for (size_t i = 0; i < owners.size(); ++i) {
     if (lists[i]->status == 0)

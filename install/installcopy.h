@@ -12,9 +12,6 @@ class IKXLINSTANCELIST;
 class InstalledProdList;
 class InstallCopyList;
 
-// Name of the version-8 installation in the list of copies.
-inline constexpr const char KXLI_V8_COPY_NAME[] = "KXLV8";
-inline constexpr uint32_t KXLI_COPY_NAME_SZ = 65;
 inline constexpr uint32_t KXLI_COPY_PATH_SZ = 256;
 
 // Registry access flags of the 32-bit and 64-bit registry views.
@@ -81,7 +78,7 @@ private:
   void readUsersKey();
   void readComponentsKey();
   void readComponentNames();
-  template <class List> uint32_t subList(List *&kept, List **out);
+  template <class List, class Source> uint32_t subList(List *&kept, List **out, Source source);
 };
 
 inline constexpr uint32_t KXLI_COPY_OK = 0;

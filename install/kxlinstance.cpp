@@ -1,15 +1,12 @@
 #include "install/kxlinstance.h"
 
-#include "install/installcopy.h"
 #include "install/iutil.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
 
-#include <array>
 #include <cstdio>
 #include <cstring>
 #include <new>
-#include <vector>
 
 namespace {
 
@@ -40,15 +37,16 @@ void terminateFields(OSSInstanceInfo_t &info) {
 // ---------------------------------------------------------------------------
 
 IKXLINSTANCE::IKXLINSTANCE()
-    : owner(nullptr), instanceDir{}, name{}, clusterName{}, isClustered(0), dbmCfgImage{} {}
+    : copyName{}, instanceDir{}, name{}, clusterName{}, isClustered(0), dbmCfgImage{} {}
 
-IKXLINSTANCE::IKXLINSTANCE(const char *instanceName, InstallCopy *copy, const char *directory)
-    : owner(copy), instanceDir{}, name{}, clusterName{}, isClustered(0), dbmCfgImage{} {
+IKXLINSTANCE::IKXLINSTANCE(const char *instanceName, const char *owner, const char *directory)
+    : copyName{}, instanceDir{}, name{}, clusterName{}, isClustered(0), dbmCfgImage{} {
+  kxliSetString(copyName, sizeof copyName, owner);
   kxliSetString(name, sizeof name, instanceName);
   kxliSetString(instanceDir, sizeof instanceDir, directory);
   // A missing kxlsystm leaves the snapshot empty; the instance still counts.
   kxliReadDbmCfg(instanceDir, dbmCfgImage, sizeof dbmCfgImage);
-  if (owner != nullptr)
+  if (copyName[0] != '\0')
     readClusterName();
 }
 
@@ -56,13 +54,10 @@ IKXLINSTANCE::~IKXLINSTANCE() = default;
 
 void IKXLINSTANCE::readClusterName() {
   char key[KXLI_PATH_BUFFER_SZ];
-  if (owner->IsV8Copy()) {
+  if (kxliSameName(copyName, KXLI_V8_COPY_NAME))
     std::snprintf(key, sizeof key, "SOFTWARE\\ZAV\\KXL\\PROFILES\\%s", name);
-  } else {
-    char copyName[KXLI_COPY_NAME_SZ] = {};
-    owner->GetName(copyName, sizeof copyName);
+  else
     std::snprintf(key, sizeof key, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\%s\\PROFILES\\%s", copyName, name);
-  }
   if (kxliReadRegString(HKEY_LOCAL_MACHINE, key, kProfileAccess, kClusterValue, clusterName,
                         sizeof clusterName) == ERROR_SUCCESS)
     isClustered = 1;
@@ -98,9 +93,9 @@ uint32_t IKXLINSTANCE::GetInstanceParentDir(char *buffer, uint32_t size) const {
 }
 
 uint32_t IKXLINSTANCE::GetCopyName(char *buffer, uint32_t size) const {
-  if (owner == nullptr)
+  if (copyName[0] == '\0')
     return KXLI_RC_NOT_USABLE;
-  return owner->GetName(buffer, size);
+  return kxliGetString(copyName, buffer, size);
 }
 
 uint16_t IKXLINSTANCE::GetNodeType() const {
@@ -119,11 +114,10 @@ uint32_t IKXLINSTANCE::ReloadDbmCfg(const char *dir) {
 
 namespace {
 
-// The owner's name; false for an owner without one (every instance of the
-// version-8 installation would match the empty name).
-bool ownerName(InstallCopy *owner, char (&name)[KXLI_COPY_NAME_SZ]) {
-  name[0] = '\0';
-  return owner != nullptr && owner->GetName(name, sizeof name) == 0 && name[0] != '\0';
+// An owner without a name owns nothing (every instance of the version-8
+// installation would match the empty name).
+bool named(const char *copyName) {
+  return copyName != nullptr && copyName[0] != '\0';
 }
 
 // Calls place(info) for each instance the platform lists; 0 when the walk
@@ -149,37 +143,33 @@ template <class Place> uint32_t walkInstances(Place place) {
 }
 
 uint32_t appendInstance(IKXLINSTANCELIST &list, const OSSInstanceInfo_t &info) {
-  IKXLINSTANCE *instance = new (std::nothrow) IKXLINSTANCE(info.instanceName, list.owner, info.instanceDir);
+  IKXLINSTANCE *instance =
+      new (std::nothrow) IKXLINSTANCE(info.instanceName, list.copyName, info.instanceDir);
   return instance != nullptr ? list.Append(instance) : KXLI_RC_NO_MEMORY;
 }
 
 } // namespace
 
-IKXLINSTANCELIST::IKXLINSTANCELIST(InstallCopy *copy, uint32_t initialStatus)
-    : owner(copy), status(initialStatus) {}
+IKXLINSTANCELIST::IKXLINSTANCELIST(const char *owner, uint32_t initialStatus)
+    : copyName{}, status(initialStatus) {
+  kxliSetString(copyName, sizeof copyName, owner);
+}
 
-IKXLINSTANCELIST::IKXLINSTANCELIST(InstallCopy *copy) : owner(copy), status(0) {
-  char name[KXLI_COPY_NAME_SZ];
-  if (!ownerName(owner, name)) {
-    status = 1;
+IKXLINSTANCELIST::IKXLINSTANCELIST(const char *owner) : IKXLINSTANCELIST(owner, named(owner) ? 0 : 1) {
+  if (status != 0)
     return;
-  }
   uint32_t rc = walkInstances([&](const OSSInstanceInfo_t &info) -> uint32_t {
-    return belongsTo(info, name) ? appendInstance(*this, info) : 0;
+    return belongsTo(info, copyName) ? appendInstance(*this, info) : 0;
   });
   if (rc != 0)
     status = 1;
 }
 
-uint32_t IKXLINSTANCELIST::BuildForCopies(InstallCopy *const *owners, uint32_t count,
+uint32_t IKXLINSTANCELIST::BuildForCopies(const char *const *copyNames, uint32_t count,
                                           IKXLINSTANCELIST **lists) {
-  std::vector<std::array<char, KXLI_COPY_NAME_SZ>> names(count);
   uint32_t rc = 0;
   for (uint32_t i = 0; i < count; ++i) {
-    char name[KXLI_COPY_NAME_SZ];
-    bool named = ownerName(owners[i], name);
-    std::memcpy(names[i].data(), name, sizeof name);
-    lists[i] = new (std::nothrow) IKXLINSTANCELIST(owners[i], named ? 0 : 1);
+    lists[i] = new (std::nothrow) IKXLINSTANCELIST(copyNames[i], named(copyNames[i]) ? 0 : 1);
     if (lists[i] == nullptr)
       rc = KXLI_RC_NO_MEMORY;
   }
@@ -187,7 +177,7 @@ uint32_t IKXLINSTANCELIST::BuildForCopies(InstallCopy *const *owners, uint32_t c
     rc = walkInstances([&](const OSSInstanceInfo_t &info) -> uint32_t {
       uint32_t placed = 0;
       for (uint32_t i = 0; i < count && placed == 0; ++i)
-        if (lists[i]->status == 0 && belongsTo(info, names[i].data()))
+        if (lists[i]->status == 0 && belongsTo(info, lists[i]->copyName))
           placed = appendInstance(*lists[i], info);
       return placed;
     });

@@ -1,13 +1,12 @@
 // Instances of one installed copy, from the platform's instance registry, each
 // with its cluster membership and a snapshot of its database manager
-// configuration file kxlsystm.
+// configuration file kxlsystm. An instance knows its copy by name only, so
+// that copies (which hold their instances) stand above instances.
 #pragma once
 
 #include "install/ilist.h"
 
 #include <cstdint>
-
-class InstallCopy;
 
 inline constexpr uint32_t KXLI_INSTANCE_NAME_SZ = 9; // 8 characters
 inline constexpr uint32_t KXLI_INSTANCE_DIR_SZ = 256;
@@ -19,10 +18,11 @@ class IKXLINSTANCE {
 public:
   // An empty holder: ReloadDbmCfg with a directory, then GetNodeType.
   IKXLINSTANCE();
-  // name cut to 8 characters, instanceDir to 255. Reads the kxlsystm snapshot
+  // name cut to 8 characters, instanceDir to 255; copyName names the copy
+  // that owns the instance (null or "": none). Reads the kxlsystm snapshot
   // (a missing file leaves it zero) and, with an owner, "KXLCLUSTER" of the
   // instance's profile key.
-  IKXLINSTANCE(const char *name, InstallCopy *owner, const char *instanceDir);
+  IKXLINSTANCE(const char *name, const char *copyName, const char *instanceDir);
   virtual ~IKXLINSTANCE();
   IKXLINSTANCE(const IKXLINSTANCE &) = delete;
   IKXLINSTANCE &operator=(const IKXLINSTANCE &) = delete;
@@ -36,7 +36,6 @@ public:
   uint32_t GetInstanceParentDir(char *buffer, uint32_t size) const;
   // The owner's name; KXLI_RC_NOT_USABLE without an owner.
   uint32_t GetCopyName(char *buffer, uint32_t size) const;
-  InstallCopy *GetOwner() const { return owner; }
 
   // The node type word of the snapshot (1 to 5 for a real instance).
   uint16_t GetNodeType() const;
@@ -45,7 +44,7 @@ public:
   // stays as it was.
   uint32_t ReloadDbmCfg(const char *dir);
 
-  InstallCopy *owner; // not owned
+  char copyName[KXLI_COPY_NAME_SZ]; // the owning copy, "" for none
   char instanceDir[KXLI_INSTANCE_DIR_SZ];
   char name[KXLI_INSTANCE_NAME_SZ];
   char clusterName[KXLI_CLUSTER_NAME_SZ];
@@ -58,22 +57,24 @@ private:
 
 class IKXLINSTANCELIST : public ILIST<IKXLINSTANCE> {
 public:
-  // The instances whose owning copy is `owner` (for the version-8 copy: the
-  // instances registered without a copy name). status 0 built, 1 failed.
-  explicit IKXLINSTANCELIST(InstallCopy *owner);
+  // The instances whose owning copy is named `copyName` (for the version-8
+  // copy: the instances registered without a copy name). status 0 built, 1
+  // failed (also for a null or empty name).
+  explicit IKXLINSTANCELIST(const char *copyName);
   virtual ~IKXLINSTANCELIST();
 
   // The lists of `count` copies from one walk of the platform's instances
   // (a walk per copy would read every instance once for each copy). 0 with
-  // lists[i] the new list of owners[i]; otherwise every lists[i] is null.
-  static uint32_t BuildForCopies(InstallCopy *const *owners, uint32_t count, IKXLINSTANCELIST **lists);
+  // lists[i] the new list of the copy named copyNames[i]; otherwise every
+  // lists[i] is null.
+  static uint32_t BuildForCopies(const char *const *copyNames, uint32_t count, IKXLINSTANCELIST **lists);
 
   // As InstallCopyList::Find, by instance name.
   uint32_t Find(const char *name, IKXLINSTANCE **out);
 
-  InstallCopy *owner; // not owned
+  char copyName[KXLI_COPY_NAME_SZ];
   uint32_t status;
 
 private:
-  IKXLINSTANCELIST(InstallCopy *owner, uint32_t initialStatus);
+  IKXLINSTANCELIST(const char *copyName, uint32_t initialStatus);
 };

@@ -2,7 +2,7 @@
 // it, ODBC data sources that need cataloguing again after it.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 

@@ -1,7 +1,7 @@
 // The command line of the upgrade command: options and the instance name.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 // Reads every argument after the program name into `options` (cleared by the
 // caller). 0 when the command line is complete and valid, else the negative

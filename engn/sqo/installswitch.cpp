@@ -1,7 +1,7 @@
 #include "engn/sqo/installswitch.h"
 
-#include "engn/sqo/options.h"
 #include "install/kxlinstance.h"
+#include "upgrade/records.h"
 
 namespace {
 

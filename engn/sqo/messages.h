@@ -2,7 +2,7 @@
 // message catalogs, or fixed fallback lines when a text cannot be had.
 #pragma once
 
-#include "engn/sqo/options.h"
+#include "upgrade/records.h"
 
 #include <cstddef>
 

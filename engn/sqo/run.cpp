@@ -4,6 +4,7 @@
 
 #include "NT/instfiles.h"
 #include "NT/kxliutil.h"
+#include "NT/pathjoin.h"
 #include "NT/readnodetype.h"
 #include "engn/sqo/boundedtext.h"
 #include "engn/sqo/checks.h"
@@ -16,7 +17,6 @@
 #include <cstdio>
 #include <cstring>
 #include <new>
-#include <string>
 
 namespace {
 
@@ -264,7 +264,7 @@ int takeUpKilledRun(UpgradeContext &context, UpgradeOptions &options, RunState &
   if (findKilledRun(context, options, killed) != KilledRunFound::found ||
       context.copies->Find(killed.oldCopy, &oldCopy) != 0)
     return 0;
-  IKXLINSTANCE previous(options.instanceName, oldCopy, killed.instanceDir);
+  IKXLINSTANCE previous(options.instanceName, oldCopy->name, killed.instanceDir);
   previous.isClustered = killed.clustered ? 1 : 0;
   setOwningCopy(context, oldCopy);
   bindInstance(context, &previous);
@@ -454,23 +454,25 @@ void clearOptions(UpgradeOptions &options) {
   options.flags = UPGRADE_FLAG_TOOL;
 }
 
-} // namespace
-
-UpgradeContext::UpgradeContext(int32_t *result) {
+// Reads the installed copies and finds the current copy: 0, or -1918 when the
+// copies or the current copy cannot be had.
+int32_t readInstalledCopies(UpgradeContext &context) {
   pdtEntry(KXL_FN_UPGRADE_CONTEXT);
   int32_t rc = 0;
   sqlo_create_init_app_data(kAppKind, &rc);
   sqlz_krcbp->utilityMode = 1;
-  copies = new (std::nothrow) InstallCopyList(false, false);
+  context.copies = new (std::nothrow) InstallCopyList(false, false);
   char current[SQLO_COPY_NAME_SZ];
-  if (copies == nullptr || copies->status != 0 || !currentInstallationName(current, sizeof current) ||
-      copies->Find(current, &copy) != 0)
+  if (context.copies == nullptr || context.copies->status != 0 ||
+      !currentInstallationName(current, sizeof current) || context.copies->Find(current, &context.copy) != 0)
     rc = UPGRADE_RC_NO_COPY;
   else
     rc = 0;
-  *result = rc;
   pdtExit(KXL_FN_UPGRADE_CONTEXT, rc, 0);
+  return rc;
 }
+
+} // namespace
 
 void setOwningCopy(UpgradeContext &context, InstallCopy *copy) {
   context.copy = copy;
@@ -527,38 +529,6 @@ int bindInstance(UpgradeContext &context, IKXLINSTANCE *instance) {
   return rc;
 }
 
-void expandLongPath(const char *path, char *output, std::size_t size) {
-  if (output == nullptr || size == 0)
-    return;
-  const char *in = path != nullptr ? path : "";
-  std::string out;
-  std::size_t i = 0;
-  if (std::isalpha(static_cast<unsigned char>(in[0])) && in[1] == ':') {
-    i = 2;
-  } else if (in[0] == '\\' && in[1] == '\\') {
-    const char *server = std::strchr(in + 2, '\\');
-    i = server != nullptr ? static_cast<std::size_t>(server - in) : std::strlen(in);
-  }
-  out.assign(in, i);
-  while (in[i] == '\\') {
-    std::size_t end = i + 1;
-    while (in[end] != '\0' && in[end] != '\\')
-      ++end;
-    std::size_t componentAt = out.size() + 1;
-    out.append(in + i, end - i);
-    WIN32_FIND_DATAA found;
-    HANDLE search = FindFirstFileA(out.c_str(), &found);
-    i = end;
-    if (search == INVALID_HANDLE_VALUE)
-      break;
-    FindClose(search);
-    out.resize(componentAt);
-    out.append(found.cFileName);
-  }
-  out.append(in + i);
-  copyText(output, size, out.c_str());
-}
-
 int runUpgrade(int argc, const char *const *argv, UpgradeDriver driver) {
   pdtEntry(KXL_FN_RUN_UPGRADE);
   ossOneTimeOnly();
@@ -571,9 +541,8 @@ int runUpgrade(int argc, const char *const *argv, UpgradeDriver driver) {
   int rc = parseCommandLine(argc, argv, &options);
   if (rc == 0) {
     findReportingName(options);
-    int32_t contextRc = 0;
-    context = new (std::nothrow) UpgradeContext(&contextRc);
-    rc = context == nullptr ? UPGRADE_RC_NO_COPY : contextRc;
+    context = new (std::nothrow) UpgradeContext;
+    rc = context == nullptr ? UPGRADE_RC_NO_COPY : readInstalledCopies(*context);
     if (rc == 0)
       rc = checkAndUpgrade(*context, options, driver, state);
   }

@@ -4,8 +4,8 @@
 #include "cluster/mscsutil.h"
 
 #include "cluster/clusterstep.h"
-#include "engn/sqo/run.h"
 #include "install/kxlinstance.h"
+#include "upgrade/records.h"
 
 #include "sim/common/simfail.h"
 #include "sim/posix/modules.h"

@@ -69,12 +69,13 @@ TEST_F(Instances, AreFoundByNameIgnoringCase) {
 
 TEST_F(Instances, ListFailsWhenTheInstanceRegistryFails) {
   registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
-  InstallCopy copy("KXL95", false, false);
   failCalls("ossGetNextInstance:1");
-  IKXLINSTANCELIST failed(&copy);
+  IKXLINSTANCELIST failed("KXL95");
   EXPECT_EQ(1u, failed.status);
   IKXLINSTANCELIST ownerless(nullptr);
   EXPECT_EQ(1u, ownerless.status);
+  IKXLINSTANCELIST nameless("");
+  EXPECT_EQ(1u, nameless.status);
 }
 
 // The run walks the copies and asks each for its instance list: one walk of

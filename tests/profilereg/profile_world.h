@@ -5,10 +5,10 @@
 
 #include "../install/install_world.h"
 #include "NT/profilereg.h"
-#include "engn/sqo/run.h"
 #include "install/installcopy.h"
 #include "install/kxlinstance.h"
 #include "sim/product/diag.h"
+#include "upgrade/records.h"
 
 #include <cstdio>
 #include <fstream>
@@ -56,7 +56,7 @@ protected:
   void ownBy(const char *copy) {
     owner_ = std::make_unique<InstallCopy>(copy, false, false);
     ASSERT_EQ(0u, owner_->GetStatus()) << copy;
-    instance_ = std::make_unique<IKXLINSTANCE>("INST1", owner_.get(), "C:\\prof\\INST1");
+    instance_ = std::make_unique<IKXLINSTANCE>("INST1", owner_->name, "C:\\prof\\INST1");
     context_.copy = owner_.get();
     owner_->GetPath(context_.copyPath, sizeof context_.copyPath);
     context_.instance = instance_.get();

@@ -1,6 +1,5 @@
 // Paths as the run forms them: long-name expansion and joining.
 #include "NT/pathjoin.h"
-#include "engn/sqo/run.h"
 #include "world_fixture.h"
 
 #include <string>

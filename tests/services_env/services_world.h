@@ -4,11 +4,10 @@
 #pragma once
 
 #include "../install/install_world.h"
-#include "engn/sqo/options.h"
-#include "engn/sqo/run.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
 #include "sim/product/diag.h"
+#include "upgrade/records.h"
 
 #include <cstdint>
 #include <cstdio>

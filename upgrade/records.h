@@ -1,11 +1,15 @@
-// The run's one option and result record. It is cleared with zero bytes at
-// start-up, filled by the command line, and read by every later step: the
-// checks, the upgrade engine and the message printer.
+// The records one run of the command works with, shared by the front end and
+// the upgrade engine: the option and result record (cleared with zero bytes at
+// start-up, filled by the command line, read by every later step: the checks,
+// the engine and the message printer) and the context the run is bound to.
 #pragma once
 
+#include "install/installcopy.h"
+#include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
 
 #include <cstdint>
+#include <cstdlib>
 
 // ---------------------------------------------------------------------------
 // Field capacities (bytes, terminator included)
@@ -109,4 +113,36 @@ struct UpgradeOptions {
   char programName[UPGRADE_PROGRAM_NAME_SZ];
   uint8_t undoOutcome;                 // UPGRADE_UNDO_*, written by the upgrade engine
   char keptBackupDir[UPGRADE_PATH_SZ]; // the instance directory's backup, when it is kept
+};
+
+inline constexpr uint32_t UPGRADE_COPY_PATH_SZ = 261;
+inline constexpr uint32_t UPGRADE_VAR159_SZ = 10;
+inline constexpr int32_t UPGRADE_NO_SERVICE_STATE = -1;
+
+// The installed copies and the instance one run works on. The front end reads
+// the copies and binds the instance; the engine's steps read and update it.
+class UpgradeContext {
+public:
+  UpgradeContext() = default;
+  ~UpgradeContext() {
+    delete copies;
+    std::free(nodeList);
+  }
+  UpgradeContext(const UpgradeContext &) = delete;
+  UpgradeContext &operator=(const UpgradeContext &) = delete;
+
+  InstallCopyList *copies = nullptr; // owned
+  InstallCopy *copy = nullptr;       // the current copy, from setOwningCopy on the instance's
+  IKXLINSTANCE *instance = nullptr;  // set by bindInstance
+  char copyPath[UPGRADE_COPY_PATH_SZ] = {};
+  uint32_t nodeType = 0;
+  char var159Head[UPGRADE_VAR159_SZ] = {};
+  char var159Tail[UPGRADE_VAR159_SZ] = {};
+  SQLO_NODELIST *nodeList = nullptr; // std::malloc'ed by the platform, owned
+  int32_t serviceStartType = UPGRADE_NO_SERVICE_STATE;
+  // The node type the services step re-created the instance with under the
+  // current copy; 0 while it has not been re-created. The driver's undo drops
+  // a re-created instance again; the profile undo then knows that the
+  // services were re-pointed.
+  uint32_t recreatedNodeType = 0;
 };
