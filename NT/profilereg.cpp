@@ -1,6 +1,7 @@
 #include "NT/profilereg.h"
 
 #include "NT/localhost.h"
+#include "NT/services.h"
 
 #include "install/installcopy.h"
 #include "install/iutil.h"
@@ -463,14 +464,16 @@ bool forceCopyName(const UpgradeOptions &options) {
 
 // How the undo points one partition's service at the owning copy again.
 struct OwnedService {
-  const char *machine = nullptr; // null: this machine
-  bool remoteProgram = false;    // the program of that machine's recorded installation
-  bool keepProgram = false;      // a forced partition keeps the program it has
+  const char *machine = nullptr;  // null: this machine
+  const char *listedAs = nullptr; // the machine as the services step named it
+  bool remoteProgram = false;     // the program of that machine's recorded installation
+  bool keepProgram = false;       // a forced partition keeps the program it has
 };
 
-// The service's program and display name as the owning copy gives them. The
-// account given with -u only when the services were re-pointed under it (the
-// instance was re-created); without a user name the service keeps its account.
+// The service's program and display name as the owning copy gives them, and
+// the account the services step found it running under before it gave it the
+// account of -u (none recorded: the account stays as it is). The earlier
+// account's password cannot be read, so none is passed.
 void repointOwnedService(MachineWalk &walk, const char *service, const OwnedService &how) {
   char program[kProgramPathSize];
   ownerProgramPath(walk.context, program);
@@ -478,9 +481,9 @@ void repointOwnedService(MachineWalk &walk, const char *service, const OwnedServ
     remoteProgramPath(walk, how.machine, program);
   char display[kDisplayNameSize];
   serviceDisplayName(*walk.keys, service, display);
-  const char *account = walk.context.recreatedNodeType != 0 ? textOrNull(walk.options.userName) : nullptr;
+  const char *account = serviceAccountBefore(walk.context, how.listedAs, service);
   repointService(walk.context, service, how.machine, how.keepProgram ? nullptr : textOrNull(program), account,
-                 account != nullptr ? walk.options.password : nullptr, display);
+                 nullptr, display);
 }
 
 void partitionServiceName(const MachineWalk &walk, const unsigned char *entry,
@@ -492,6 +495,7 @@ void repointPartitionService(MachineWalk &walk, const unsigned char *entry, uint
                              const char *localHost) {
   OwnedService how;
   how.machine = sqloNodeMachine(entry);
+  how.listedAs = how.machine;
   how.remoteProgram =
       !forceCopyName(walk.options) && !sameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
   how.keepProgram = force != 0;
@@ -517,6 +521,7 @@ void repointClusterServices(MachineWalk &walk) {
     bool local = computer[0] != '\0' && sameText(name, computer, SQLO_COMPUTERNAME_SZ);
     OwnedService how;
     how.machine = local ? nullptr : name;
+    how.listedAs = name;
     if (!partitioned) {
       how.remoteProgram = !local;
       if (!local)

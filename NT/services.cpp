@@ -31,6 +31,7 @@ enum Probe : uint32_t {
   kProbeClusterName = 10,
   kProbeSaveNodes = 20,
   kProbeServiceConfig = 30,
+  kProbeServiceAccount = 35,
   kProbeEnvironment = 40,
   kProbeRestoreNodes = 50,
   kProbeHostName = 70,
@@ -265,6 +266,17 @@ void partitionServiceName(const ServicesStep &step, const unsigned char *entry, 
   ossSnprintf(name, kServiceNameSize, "%s-%d", step.instanceName, sqloNodeNumber(entry));
 }
 
+template <class Visit> int32_t forEachNode(const ServicesStep &step, Visit visit) {
+  const unsigned char *entry = firstNode(step.context);
+  int32_t count = entry != nullptr ? sqloNodeListCount(step.context.nodeList) : 0;
+  for (int32_t i = 0; i < count; ++i, entry = sqloNodeNext(entry)) {
+    int32_t rc = visit(entry);
+    if (rc != 0)
+      return rc;
+  }
+  return 0;
+}
+
 // The service whose start type the re-created services get: the first
 // partition's, or the instance's own. A partitioned instance without a node
 // list has none.
@@ -284,6 +296,40 @@ int32_t readStartType(ServicesStep &step) {
     return traced(kProbeServiceConfig, SERVICES_RC_NO_SERVICE_CONFIG);
   step.context.serviceStartType = config.startType;
   return 0;
+}
+
+// One service's account, read before the step gives it the account of -u. A
+// service that does not exist has none to give back; any other failed read
+// ends the step before anything is changed.
+int32_t recordAccount(ServicesStep &step, const char *service, const char *machine) {
+  SQLO_SVC_CONFIG config{};
+  SQLO_SVC_OUT out{};
+  int32_t rc = sqloQueryNTServiceConfig(service, machine, &config, &out);
+  if (rc == SQLO_RC_SVC_NOT_FOUND)
+    return 0;
+  if (rc != 0)
+    return traced(kProbeServiceAccount, SERVICES_RC_NO_SERVICE_CONFIG);
+  config.account[sizeof config.account - 1] = '\0';
+  step.context.serviceAccounts.push_back({machine != nullptr ? machine : "", service, config.account});
+  return 0;
+}
+
+// The partitions' services get the account of -u: their accounts before are
+// kept for the undo, on every machine the step will change them on.
+int32_t recordAccounts(ServicesStep &step) {
+  step.context.serviceAccounts.clear();
+  if (step.account() == nullptr || !step.partitioned())
+    return 0;
+  auto onMachine = [&](const char *machine) {
+    return forEachNode(step, [&](const unsigned char *entry) {
+      char service[kServiceNameSize];
+      partitionServiceName(step, entry, service);
+      return recordAccount(step, service, machine != nullptr ? machine : sqloNodeMachine(entry));
+    });
+  };
+  if (step.clustered())
+    return forEachClusterMachine(step, onMachine);
+  return onMachine(nullptr);
 }
 
 int32_t recreateInstance(ServicesStep &step, int32_t newNodeType, uint32_t workstationFlag) {
@@ -376,17 +422,6 @@ int32_t repointPartition(ServicesStep &step, const unsigned char *entry) {
     machineProgramPaths(step.machine->hklm, step.copyName, paths);
   }
   repointPartitionServices(step, entry, sqloNodeMachine(entry), paths, forceCopyName && !localHost);
-  return 0;
-}
-
-template <class Visit> int32_t forEachNode(const ServicesStep &step, Visit visit) {
-  const unsigned char *entry = firstNode(step.context);
-  int32_t count = entry != nullptr ? sqloNodeListCount(step.context.nodeList) : 0;
-  for (int32_t i = 0; i < count; ++i, entry = sqloNodeNext(entry)) {
-    int32_t rc = visit(entry);
-    if (rc != 0)
-      return rc;
-  }
   return 0;
 }
 
@@ -491,7 +526,7 @@ int32_t runServicesStep(ServicesStep &step) {
   chooseReferenceService(step);
   if (context.nodeType != 2 && (rc = readStartType(step)) != 0)
     return rc;
-  if ((rc = recreateInstance(step, newNodeType, workstationFlag)) != 0)
+  if ((rc = recordAccounts(step)) != 0 || (rc = recreateInstance(step, newNodeType, workstationFlag)) != 0)
     return rc;
   context.recreatedNodeType = static_cast<uint32_t>(newNodeType);
   if (newNodeType == 4 && step.partitioned())
@@ -502,6 +537,15 @@ int32_t runServicesStep(ServicesStep &step) {
 }
 
 } // namespace
+
+const char *serviceAccountBefore(const UpgradeContext &context, const char *machine, const char *service) {
+  const char *onMachine = machine != nullptr ? machine : "";
+  for (const ServiceAccount &kept : context.serviceAccounts)
+    if (sqlomcpi(kept.machine.c_str(), onMachine, SQLO_COMPUTERNAME_SZ) == 0 &&
+        sqlomcpi(kept.service.c_str(), service, kServiceNameSize) == 0)
+      return kept.account.c_str();
+  return nullptr;
+}
 
 int32_t upgradeInstanceServices(UpgradeContext &context, UpgradeOptions &options) {
   pdtEntry(KXL_FN_UPGRADE_INSTANCE_SERVICES);

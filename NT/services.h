@@ -15,6 +15,11 @@ inline constexpr int32_t SERVICES_RC_NO_SERVICE_CONFIG = -1925; // start type un
 inline constexpr int32_t SERVICES_RC_MACHINE_REGISTRY = -1913;  // a machine's registry cannot be opened
 inline constexpr int32_t SERVICES_SQLCODE_HOST = -1042;         // status block code: no full host name
 
+// The account the services step found `service` on `machine` (as the step
+// names it) running under before it gave it the account of -u; null when the
+// step recorded none (no -u, or no such service).
+const char *serviceAccountBefore(const UpgradeContext &context, const char *machine, const char *service);
+
 // Re-creates the context's instance under the current copy (through
 // upgradeInstanceEnvironment) and re-points its services. Writes the context's
 // service start type word. 0 on success; -1 with the reason in options.status.

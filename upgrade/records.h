@@ -10,6 +10,8 @@
 
 #include <cstdint>
 #include <cstdlib>
+#include <string>
+#include <vector>
 
 // ---------------------------------------------------------------------------
 // Field capacities (bytes, terminator included)
@@ -121,6 +123,14 @@ inline constexpr int32_t UPGRADE_NO_SERVICE_STATE = -1;
 
 // The installed copies and the instance one run works on. The front end reads
 // the copies and binds the instance; the engine's steps read and update it.
+// The account a service ran under before the services step gave it the
+// account of -u; the undo gives it back.
+struct ServiceAccount {
+  std::string machine; // as the services step names it (a node list entry's or a cluster list's machine)
+  std::string service;
+  std::string account;
+};
+
 class UpgradeContext {
 public:
   UpgradeContext() = default;
@@ -145,4 +155,6 @@ public:
   // a re-created instance again; the profile undo then knows that the
   // services were re-pointed.
   uint32_t recreatedNodeType = 0;
+  // Filled by the services step before it changes any service's account.
+  std::vector<ServiceAccount> serviceAccounts;
 };

@@ -16,9 +16,11 @@ constexpr long long kAccessDenied = static_cast<int32_t>(0x870F0003u);
 constexpr long long kExecFailed = static_cast<int32_t>(0x870F0140u);
 constexpr long long kPathNotFound = static_cast<int32_t>(0x870F0011u);
 
-// The partitions' services run under this account already: a failure after
-// they were re-pointed with it leaves them as they were.
+// The partitions' services run under this account already.
 const std::vector<std::string> kPartitioned = {"-u", ".\\kxlsvc,secret", "INST2"};
+// Another account: a failure after the services were given it gives them
+// their own back on every machine.
+const std::vector<std::string> kNewAccount = {"-u", "KXLADMIN,secret", "INST2"};
 constexpr const char *kRestoredNotice = "KXL1971I";
 constexpr const char *kNotRestored = "KXL1972E";
 
@@ -157,6 +159,9 @@ TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
       {kPartitioned, "sqleInitApplicationEnvironment:1", 120, 0},
       {withArgs({"-forcecn"}, kPartitioned), "sqleInitApplicationEnvironment:1", 120, 0},
       {withArgs({"-forcecn"}, kPartitioned), "sqlo_instance_addnode:1", 90, 0},
+      {kNewAccount, "sqlowrite:4", 130, -1947},
+      {withArgs({"-forcecn"}, kNewAccount), "sqleInitApplicationEnvironment:1", 120, 0},
+      {kNewAccount, "sqloQueryNTServiceConfig:2", 90, -1925}, // an account that cannot be read
   };
   for (const Case &c : cases) {
     SCOPED_TRACE(std::string(c.fault) + " " + c.args.front() + " " + c.args.back());

@@ -94,7 +94,10 @@ TEST_F(RevertProfile, PartitionServicesOnEveryMachine) {
   std::snprintf(options_.userName, sizeof options_.userName, "svcuser");
   std::snprintf(options_.password, sizeof options_.password, "secret");
   context_.serviceStartType = SQLO_SVC_DEMAND_START;
-  context_.recreatedNodeType = 4; // the services were re-pointed under that account
+  context_.recreatedNodeType = 4;
+  // The services step gave INST1-1 the account of -u; INST1-2's was not recorded.
+  setString(at("M2", "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1-1"), "ObjectName", "svcuser");
+  context_.serviceAccounts = {{"M2", "INST1-1", ".\\oldacct"}};
 
   EXPECT_EQ(0, revertInstanceProfile(context_, options_));
   for (const char *machine : {kLocal, "M2", "M3"})
@@ -106,7 +109,8 @@ TEST_F(RevertProfile, PartitionServicesOnEveryMachine) {
   EXPECT_EQ("C:\\KXL95\\bin\\kxlsyscs.exe", service("M3", "INST1-3", "ImagePath"));
   EXPECT_EQ("KXL - KXL95 - INST1-0", service(kLocal, "INST1-0", "DisplayName"));
   EXPECT_EQ("KXL - KXL95 - INST1-2", service("M2", "INST1-2", "DisplayName"));
-  EXPECT_EQ("svcuser", service("M2", "INST1-1", "ObjectName"));
+  EXPECT_EQ(".\\oldacct", service("M2", "INST1-1", "ObjectName"));
+  EXPECT_EQ("LocalSystem", service("M2", "INST1-2", "ObjectName"));
   EXPECT_EQ(DWORD(SQLO_SVC_DEMAND_START), serviceStart("INST1-0"));
 }
 
