@@ -41,7 +41,7 @@ constexpr uint32_t kProbeDbmConfig = 130;
 constexpr uint32_t kProbeAuthType = 140;
 constexpr uint32_t kProbeFunctionDir = 190;
 constexpr uint32_t kProbeCluster = 200;
-constexpr uint32_t kProbeForcedKeys = 210;     // diagnostic log only
+constexpr uint32_t kProbeForcedKeys = 210;
 constexpr uint32_t kProbeDropFailed = 310;     // diagnostic log only
 constexpr uint32_t kProbeUndoIncomplete = 320; // diagnostic log only
 
@@ -210,12 +210,12 @@ StepResult upgradeCluster(DriverState &state) {
 
 // The other machines' old profile keys of a force-copy-name upgrade are kept
 // until everything else has succeeded, so that a failure can put them back.
+// A drop that fails before any of them is gone fails the upgrade, which is
+// then undone whole, rather than leave a machine listing the instance under
+// its old copy too.
 StepResult dropForcedKeys(DriverState &state) {
   int32_t rc = dropForcedProfileKeys(state.context, state.options);
-  if (rc != 0)
-    pdLog(PD_LEVEL_WARNING, KXL_FN_UPGRADE_INSTANCE, kProbeForcedKeys, rc,
-          "old profile keys of the force-copy-name machines not all deleted");
-  return stepDone();
+  return rc != 0 ? stepFailed(kProbeForcedKeys, rc) : stepDone();
 }
 
 StepResult cleanProfileRegistry(DriverState &) {

@@ -44,6 +44,8 @@ constexpr uint32_t kProbeClusterOpen = 60;
 constexpr uint32_t kProbeClusterKey = 70;
 constexpr uint32_t kProbeCreateKey = 100;
 constexpr uint32_t kProbeCopyKey = 110;
+constexpr uint32_t kProbeDropKey = 120;
+constexpr uint32_t kProbeForcedKeysLeft = 210; // diagnostic log only
 
 int32_t traced(uint32_t function, uint32_t probe, int32_t rc) {
   pdtError(function, probe, rc);
@@ -208,9 +210,14 @@ int32_t revertKey(HKEY root, const ProfileKeys &keys, bool force) {
 }
 
 // After a successful force-copy-name upgrade: the old key of a forced machine.
+// A key that is gone already (a run that was killed after deleting it) is
+// what the drop wants.
 int32_t dropForcedKey(HKEY root, const ProfileKeys &keys) {
-  if (!sameText(keys.old, keys.force, kKeyPathSize))
-    SHDeleteKeyA(root, keys.old);
+  if (sameText(keys.old, keys.force, kKeyPathSize))
+    return 0;
+  LONG rc = SHDeleteKeyA(root, keys.old);
+  if (rc != ERROR_SUCCESS && rc != ERROR_FILE_NOT_FOUND)
+    return traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeDropKey, KXL_RC_PROFILE_KEY);
   return 0;
 }
 
@@ -231,6 +238,12 @@ struct MachineWalk {
   // The undo goes on past a machine it cannot handle, so that every machine
   // it can reach is put back; it reports the first failure.
   bool keepGoing = false;
+  // Forced machines whose operation succeeded; with goOnOnceForced, the walk
+  // goes on past a failure once there is one, as for the undo.
+  uint32_t forcedDone = 0;
+  bool goOnOnceForced = false;
+
+  bool goesOn() const { return keepGoing || (goOnOnceForced && forcedDone > 0); }
 
   MachineWalk(UpgradeContext &c, UpgradeOptions &o, uint32_t f, KeyOperation op, const ProfileKeys *k)
       : context(c), options(o), function(f), operation(op), keys(k) {}
@@ -266,6 +279,8 @@ int32_t onMachine(MachineWalk &walk, const char *machineName, uint8_t force, uin
   int32_t rc = walk.operation(walk.context, walk.machine->hklm, walk.options, force);
   if (rc != 0)
     pdtError(walk.function, keyProbe, rc);
+  else if (force != 0)
+    ++walk.forcedDone;
   return rc;
 }
 
@@ -335,7 +350,7 @@ int32_t walkPartitions(MachineWalk &walk, const char *localHost, EntryHook hook)
     uint8_t force = forceFor(walk.options, localHost, entry);
     if (sqloNodePort(entry) == 0) {
       int32_t rc = onMachine(walk, sqloNodeMachine(entry), force, kProbePartitionOpen, kProbePartitionKey);
-      if (rc != 0 && !walk.keepGoing)
+      if (rc != 0 && !walk.goesOn())
         return rc;
       first = first != 0 ? first : rc;
     }
@@ -654,9 +669,14 @@ int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options) 
 int32_t dropForcedProfileKeys(UpgradeContext &context, UpgradeOptions &options) {
   pdtEntry(KXL_FN_MOVE_INSTANCE_PROFILE);
   MachineWalk walk(context, options, KXL_FN_MOVE_INSTANCE_PROFILE, dropForcedProfileKey, nullptr);
-  walk.keepGoing = true;
+  walk.goOnOnceForced = true;
   int32_t rc = dropForcedMachines(walk);
   walk.release();
+  if (rc != 0 && walk.forcedDone > 0) {
+    pdLog(PD_LEVEL_WARNING, KXL_FN_MOVE_INSTANCE_PROFILE, kProbeForcedKeysLeft, rc,
+          "old profile keys of the force-copy-name machines not all deleted");
+    rc = 0;
+  }
   pdtExit(KXL_FN_MOVE_INSTANCE_PROFILE, rc, 0);
   return rc;
 }

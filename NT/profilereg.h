@@ -39,5 +39,8 @@ int32_t revertProfileKey(UpgradeContext &context, HKEY machineRoot, UpgradeOptio
 int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options);
 
 // After a successful force-copy-name upgrade of a partitioned instance: deletes
-// the old profile key on the machines of the forced partitions.
+// the old profile key on the machines of the forced partitions. A failure
+// before any old key is gone is returned: the upgrade can still be undone as
+// a whole. Once one is gone it cannot come back: every other machine is then
+// tried, a failure is written to the diagnostic log and the result is 0.
 int32_t dropForcedProfileKeys(UpgradeContext &context, UpgradeOptions &options);

@@ -43,6 +43,19 @@ int32_t missingPathCode(const std::string &path) {
   return parent.empty() || isDirectoryPath(parent) ? SQLO_RC_FILE_NOT_FOUND : SQLO_RC_PATH_NOT_FOUND;
 }
 
+// After attributes that could not be read: true when the system says the
+// path is not there. Any other failure (a denied or failed read) is never
+// taken for a missing file; `code` then gets the failure's code.
+bool isMissing(const std::string &path, int32_t &code) {
+  DWORD error = GetLastError();
+  if (error == ERROR_FILE_NOT_FOUND || error == ERROR_PATH_NOT_FOUND) {
+    code = missingPathCode(path);
+    return true;
+  }
+  code = codeForLastError(SQLO_RC_IO_ERROR);
+  return false;
+}
+
 DWORD accessFor(uint32_t flags) {
   DWORD access = 0;
   if (flags & SQLO_READONLY)
@@ -269,11 +282,14 @@ int32_t sqloopenp(const char *path, uint32_t flags, uint32_t mode, SQLO_FHANDLE 
   std::string name = unquotedPath(path);
   DWORD attributes = GetFileAttributesA(name.c_str());
   bool exists = attributes != INVALID_FILE_ATTRIBUTES;
+  int32_t missing = 0;
+  if (!exists && !isMissing(name, missing))
+    return missing;
   if (exists && (attributes & FILE_ATTRIBUTE_DIRECTORY))
     return SQLO_RC_ACCESS_DENIED;
   DWORD disposition = dispositionFor(flags, exists);
   if (disposition == OPEN_EXISTING && !exists)
-    return missingPathCode(name);
+    return missing;
   HANDLE file =
       CreateFileA(name.c_str(), accessFor(flags) | (disposition == TRUNCATE_EXISTING ? GENERIC_WRITE : 0),
                   shareFor(flags), nullptr, disposition, FILE_ATTRIBUTE_NORMAL, nullptr);
@@ -338,9 +354,9 @@ int32_t sqlocopy(const char *source, const char *target, uint32_t flags) {
   std::string to = unquotedPath(target);
   DWORD attributes = GetFileAttributesA(from.c_str());
   // A missing file is reported as the warning callers tolerate as "missing".
+  int32_t missing = 0;
   if (attributes == INVALID_FILE_ATTRIBUTES)
-    return missingPathCode(from) == SQLO_RC_FILE_NOT_FOUND ? SQLO_RC_FILE_NOT_FOUND_W
-                                                           : SQLO_RC_PATH_NOT_FOUND;
+    return isMissing(from, missing) && missing == SQLO_RC_FILE_NOT_FOUND ? SQLO_RC_FILE_NOT_FOUND_W : missing;
   if (attributes & FILE_ATTRIBUTE_DIRECTORY)
     return SQLO_RC_ACCESS_DENIED;
   // A missing target directory is made, so that a file being carried over is
@@ -386,8 +402,11 @@ int32_t sqlodelete(const char *path, uint32_t flags) {
     return SQLO_RC_INVALID_ARGUMENT;
   std::string name = unquotedPath(path);
   DWORD attributes = GetFileAttributesA(name.c_str());
-  if (attributes == INVALID_FILE_ATTRIBUTES)
-    return missingPathCode(name);
+  int32_t missing = 0;
+  if (attributes == INVALID_FILE_ATTRIBUTES) {
+    isMissing(name, missing);
+    return missing;
+  }
   if (attributes & FILE_ATTRIBUTE_DIRECTORY)
     return SQLO_RC_ACCESS_DENIED;
   return DeleteFileA(name.c_str()) ? 0 : codeForLastError(SQLO_RC_FILE_NOT_FOUND);

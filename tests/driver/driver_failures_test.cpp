@@ -162,6 +162,9 @@ TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
       {kNewAccount, "sqlowrite:4", 130, -1947},
       {withArgs({"-forcecn"}, kNewAccount), "sqleInitApplicationEnvironment:1", 120, 0},
       {kNewAccount, "sqloQueryNTServiceConfig:2", 90, -1925}, // an account that cannot be read
+      // The forced machine's old profile key cannot be deleted or reached.
+      {withArgs({"-forcecn"}, kNewAccount), "SHDeleteKeyA:2", 210, -1918},
+      {withArgs({"-forcecn"}, kNewAccount), "sqloPRegMachineOpen:4", 210, -1913},
   };
   for (const Case &c : cases) {
     SCOPED_TRACE(std::string(c.fault) + " " + c.args.front() + " " + c.args.back());

@@ -196,4 +196,30 @@ TEST_F(Files, InjectedFailures) {
   EXPECT_EQ(0u, pathTest("C:\\src\\a.txt"));
 }
 
+// A file whose attributes cannot be read is never taken for a missing one:
+// callers tolerate "missing" and would go on without the file.
+TEST_F(Files, UnreadableAttributesAreNotAMissingFile) {
+  writeFile("C:\\src\\a.txt", "new");
+  SQLO_FHANDLE handle = nullptr;
+  const struct {
+    const char *what;
+    int32_t (*call)(SQLO_FHANDLE &);
+  } calls[] = {
+      {"copy", [](SQLO_FHANDLE &) { return sqlocopy("C:\\src\\a.txt", "C:\\dst\\c.txt", 0); }},
+      {"delete", [](SQLO_FHANDLE &) { return sqlodelete("C:\\src\\a.txt", 0); }},
+      {"open", [](SQLO_FHANDLE &h) { return sqloopenp("C:\\src\\a.txt", SQLO_READONLY, 0, &h, 0); }},
+  };
+  for (const auto &c : calls) {
+    SCOPED_TRACE(c.what);
+    failCalls("GetFileAttributesA:1");
+    int32_t rc = c.call(handle);
+    EXPECT_EQ(int32_t(0x870F0003u), rc); // access denied
+    EXPECT_NE(SQLO_RC_FILE_NOT_FOUND_W, rc);
+    EXPECT_EQ(nullptr, handle);
+  }
+  failCalls(nullptr);
+  EXPECT_TRUE(exists("C:\\src\\a.txt"));
+  EXPECT_FALSE(exists("C:\\dst\\c.txt"));
+}
+
 } // namespace

@@ -85,6 +85,28 @@ TEST_F(MoveProfile, ForceCopyNameGivesOtherHostsAnEmptyPlaceholder) {
   expectProfileAt(kLocal, kCurrent);
 }
 
+// The drop fails while every old key is still there (the upgrade can be
+// undone whole); once one is gone it goes on past a machine it cannot reach.
+TEST_F(MoveProfile, ForcedKeysDropFailsOnlyBeforeAnyKeyIsGone) {
+  ownBy(kOld);
+  for (const char *machine : {kLocal, "M2", "M3"})
+    seedProfile(machine, kOld);
+  options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
+  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostc.zav.test M3 0\n");
+  ASSERT_EQ(0, moveInstanceProfile(context_, options_));
+
+  failCalls("SHDeleteKeyA:1");
+  EXPECT_EQ(KXL_RC_PROFILE_KEY, dropForcedProfileKeys(context_, options_));
+  expectUntouched("M2", kOld, kCurrent);
+  expectUntouched("M3", kOld, kCurrent);
+
+  failCalls("SHDeleteKeyA:2");
+  EXPECT_EQ(0, dropForcedProfileKeys(context_, options_));
+  EXPECT_FALSE(keyExists(at("M2", profile(kOld))));
+  expectUntouched("M3", kOld, kCurrent);
+  failCalls(nullptr);
+}
+
 TEST_F(MoveProfile, ForceCopyNameNeedsTheLocalHostName) {
   ownBy(kOld);
   seedProfile(kLocal, kOld);
