@@ -34,6 +34,8 @@ enum Probe : uint32_t {
   kProbeServiceAccount = 35,
   kProbeEnvironment = 40,
   kProbeRestoreNodes = 50,
+  kProbeServiceChange = 60,
+  kProbeProgramPath = 65,
   kProbeHostName = 70,
   kProbeClusterMachine = 80,
   kProbePartitionMachine = 90,
@@ -84,19 +86,23 @@ struct ServiceChange {
   const char *displayName = nullptr;
 };
 
-void changeService(const ServiceChange &change) {
+// A service that is not there has nothing to change; any other failure ends
+// the step, so that a service still running the old copy's program is never
+// reported as upgraded.
+int32_t changeService(const ServiceChange &change) {
   SQLO_SVC_OUT out{};
-  sqloChangeNTServiceConfig(change.service, change.machine, SQLO_SVC_NO_CHANGE,
-                            static_cast<uint32_t>(change.startType), SQLO_SVC_NO_CHANGE, change.program,
-                            nullptr, nullptr, nullptr, change.account, change.password, change.displayName,
-                            &out);
+  int32_t rc = sqloChangeNTServiceConfig(change.service, change.machine, SQLO_SVC_NO_CHANGE,
+                                         static_cast<uint32_t>(change.startType), SQLO_SVC_NO_CHANGE,
+                                         change.program, nullptr, nullptr, nullptr, change.account,
+                                         change.password, change.displayName, &out);
+  return rc == 0 || rc == SQLO_RC_SVC_NOT_FOUND ? 0 : traced(kProbeServiceChange, rc);
 }
 
-void restoreStartType(const ServicesStep &step, const char *service) {
+int32_t restoreStartType(const ServicesStep &step, const char *service) {
   ServiceChange change;
   change.service = service;
   change.startType = step.context.serviceStartType;
-  changeService(change);
+  return changeService(change);
 }
 
 struct ProgramPaths {
@@ -112,21 +118,28 @@ void programPaths(const char *installPath, ProgramPaths &paths) {
 }
 
 // The program paths from "KXLPATH" of the current copy's global profile in a
-// machine's registry; the paths stay as they are when it has none.
-void machineProgramPaths(HKEY hklm, const char *copyName, ProgramPaths &paths) {
+// machine's registry; the paths stay as they are when it has none. A profile
+// or value that cannot be read is a failure, never taken for a missing one.
+int32_t machineProgramPaths(HKEY hklm, const char *copyName, ProgramPaths &paths) {
   char keyPath[64 + SQLO_COPY_NAME_SZ];
   ossSnprintf(keyPath, sizeof keyPath, "%s\\InstalledCopies\\%s\\GLOBAL_PROFILE", "SOFTWARE\\ZAV\\KXL",
               copyName);
   HKEY key = nullptr;
-  if (RegOpenKeyExA(hklm, keyPath, 0, KEY_READ, &key) != ERROR_SUCCESS)
-    return;
+  LONG rc = RegOpenKeyExA(hklm, keyPath, 0, KEY_READ, &key);
+  if (rc == ERROR_FILE_NOT_FOUND)
+    return 0;
+  if (rc != ERROR_SUCCESS)
+    return traced(kProbeProgramPath, SERVICES_RC_MACHINE_REGISTRY);
   char value[kKxlPathSize + 1] = {};
   DWORD size = kKxlPathSize;
   DWORD type = REG_NONE;
-  LONG rc = RegQueryValueExA(key, "KXLPATH", nullptr, &type, reinterpret_cast<BYTE *>(value), &size);
+  rc = RegQueryValueExA(key, "KXLPATH", nullptr, &type, reinterpret_cast<BYTE *>(value), &size);
   RegCloseKey(key);
+  if (rc != ERROR_SUCCESS && rc != ERROR_FILE_NOT_FOUND)
+    return traced(kProbeProgramPath, SERVICES_RC_MACHINE_REGISTRY);
   if (rc == ERROR_SUCCESS && (type == REG_SZ || type == REG_EXPAND_SZ) && value[0] != '\0')
     programPaths(value, paths);
+  return 0;
 }
 
 int32_t openMachine(ServicesStep &step, const char *machineName, uint32_t probe) {
@@ -365,8 +378,8 @@ bool isLocalHost(const ServicesStep &step, const unsigned char *entry) {
 }
 
 // The extender service of a partition; an existing one is changed instead.
-void registerExtender(const ServicesStep &step, const unsigned char *entry, const ServiceChange &partition,
-                      const char *program) {
+int32_t registerExtender(const ServicesStep &step, const unsigned char *entry, const ServiceChange &partition,
+                         const char *program) {
   char service[kExtenderNameSize], display[kDisplayNameSize];
   ossSnprintf(service, sizeof service, "KXLEXT - %s", partition.service);
   ossSnprintf(display, sizeof display, "KXLEXT - %s - %s-%d", step.copyName, step.instanceName,
@@ -375,18 +388,18 @@ void registerExtender(const ServicesStep &step, const unsigned char *entry, cons
   int32_t rc = sqloRegisterNTService(partition.machine, service, display, 0, program, 0, partition.account,
                                      partition.password, kMessageLibrary, &out);
   if (rc != SQLO_RC_SVC_EXISTS)
-    return;
+    return rc == 0 ? 0 : traced(kProbeServiceChange, rc);
   ServiceChange change = partition;
   change.service = service;
   change.program = partition.startType == kDisabled ? nullptr : program;
   change.displayName = display;
-  changeService(change);
+  return changeService(change);
 }
 
 // Points one partition's services at the current copy's programs (the program
 // paths given), or leaves a forced partition disabled on its old program.
-void repointPartitionServices(const ServicesStep &step, const unsigned char *entry, const char *machine,
-                              const ProgramPaths &paths, bool forced) {
+int32_t repointPartitionServices(const ServicesStep &step, const unsigned char *entry, const char *machine,
+                                 const ProgramPaths &paths, bool forced) {
   char service[kServiceNameSize], display[kDisplayNameSize];
   partitionServiceName(step, entry, service);
   ossSnprintf(display, sizeof display, "KXL - %s - %s-%d", step.copyName, step.instanceName,
@@ -399,9 +412,10 @@ void repointPartitionServices(const ServicesStep &step, const unsigned char *ent
   change.account = step.account();
   change.password = step.password();
   change.displayName = display;
-  changeService(change);
-  if (step.flag(UPGRADE_FLAG_CONTENT_EXTENDER))
-    registerExtender(step, entry, change, paths.extender);
+  int32_t rc = changeService(change);
+  if (rc == 0 && step.flag(UPGRADE_FLAG_CONTENT_EXTENDER))
+    rc = registerExtender(step, entry, change, paths.extender);
+  return rc;
 }
 
 int32_t repointPartition(ServicesStep &step, const unsigned char *entry) {
@@ -409,20 +423,19 @@ int32_t repointPartition(ServicesStep &step, const unsigned char *entry) {
   if (localHost && sqloNodePort(entry) == 0) {
     char service[kServiceNameSize];
     partitionServiceName(step, entry, service);
-    restoreStartType(step, service);
-    return 0;
+    return restoreStartType(step, service);
   }
   ProgramPaths paths;
   programPaths(step.options.currentInstallPath, paths);
   bool forceCopyName = step.flag(UPGRADE_FLAG_FORCE_COPY_NAME);
   if (!forceCopyName && !localHost) {
     int32_t rc = openMachine(step, sqloNodeMachine(entry), kProbePartitionMachine);
+    if (rc == 0)
+      rc = machineProgramPaths(step.machine->hklm, step.copyName, paths);
     if (rc != 0)
       return rc;
-    machineProgramPaths(step.machine->hklm, step.copyName, paths);
   }
-  repointPartitionServices(step, entry, sqloNodeMachine(entry), paths, forceCopyName && !localHost);
-  return 0;
+  return repointPartitionServices(step, entry, sqloNodeMachine(entry), paths, forceCopyName && !localHost);
 }
 
 // Every partition's service on one machine of the cluster, then the cluster
@@ -435,13 +448,14 @@ int32_t repointClusterMachine(ServicesStep &step, const char *machine) {
   ProgramPaths paths;
   programPaths(step.options.currentInstallPath, paths);
   if (!forceCopyName)
-    machineProgramPaths(step.machine->hklm, step.copyName, paths);
-  forEachNode(step, [&](const unsigned char *entry) {
-    repointPartitionServices(step, entry, machine, paths, forceCopyName);
-    return 0;
-  });
-  writeMachineClusterValues(step);
-  return 0;
+    rc = machineProgramPaths(step.machine->hklm, step.copyName, paths);
+  if (rc == 0)
+    rc = forEachNode(step, [&](const unsigned char *entry) {
+      return repointPartitionServices(step, entry, machine, paths, forceCopyName);
+    });
+  if (rc == 0)
+    writeMachineClusterValues(step);
+  return rc;
 }
 
 int32_t repointPartitions(ServicesStep &step) {
@@ -466,7 +480,9 @@ int32_t repointClusterNode(ServicesStep &step, const char *machine) {
   writeMachineClusterValues(step);
   ProgramPaths paths;
   programPaths(step.options.currentInstallPath, paths);
-  machineProgramPaths(step.machine->hklm, step.copyName, paths);
+  rc = machineProgramPaths(step.machine->hklm, step.copyName, paths);
+  if (rc != 0)
+    return rc;
   char display[kDisplayNameSize];
   ossSnprintf(display, sizeof display, "KXL - %s - %s", step.copyName, step.instanceName);
   ServiceChange change;
@@ -475,15 +491,13 @@ int32_t repointClusterNode(ServicesStep &step, const char *machine) {
   change.startType = step.context.serviceStartType;
   change.program = paths.server;
   change.displayName = display;
-  changeService(change);
-  return 0;
+  return changeService(change);
 }
 
 int32_t repointSingleService(ServicesStep &step) {
-  if (step.referenceService[0] != '\0')
-    restoreStartType(step, step.referenceService);
-  if (!step.clustered())
-    return 0;
+  int32_t rc = step.referenceService[0] != '\0' ? restoreStartType(step, step.referenceService) : 0;
+  if (rc != 0 || !step.clustered())
+    return rc;
   char local[SQLO_COMPUTERNAME_SZ] = {};
   uint32_t size = sizeof local;
   if (sqloGetComputerNameA(local, &size) == 0) {

@@ -24,15 +24,23 @@ std::string instancesKey() {
   return std::string(kxlprod::kSimRoot) + "\\Instances";
 }
 
-// Fills `info` from the instance's registry entry; false when it has none.
-// The copy's path comes from `copies`, read once by the caller.
-bool readInstance(const std::string &name, const std::vector<CopyInfo> &copies, OSSInstanceInfo_t &info) {
+enum class EntryRead { read, absent, failed };
+
+// Fills `info` from the instance's registry entry. An entry without a
+// directory is absent (removed meanwhile); an entry without a copy belongs to
+// the version-8 installation. Any other failed read is a failure, never taken
+// for either.
+EntryRead readInstance(const std::string &name, const std::vector<CopyInfo> &copies,
+                       OSSInstanceInfo_t &info) {
   std::string key = instancesKey() + "\\" + name;
   std::string directory;
-  if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Directory", directory) != ERROR_SUCCESS)
-    return false;
+  LONG rc = kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Directory", directory);
+  if (rc != ERROR_SUCCESS)
+    return rc == ERROR_FILE_NOT_FOUND ? EntryRead::absent : EntryRead::failed;
   std::string copyName;
-  kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Copy", copyName);
+  rc = kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Copy", copyName);
+  if (rc != ERROR_SUCCESS && rc != ERROR_FILE_NOT_FOUND)
+    return EntryRead::failed;
   std::memset(&info, 0, sizeof info);
   info.version = 1;
   info.size = sizeof info;
@@ -47,10 +55,10 @@ bool readInstance(const std::string &name, const std::vector<CopyInfo> &copies, 
       break;
     }
   }
-  return true;
+  return EntryRead::read;
 }
 
-bool readInstance(const std::string &name, OSSInstanceInfo_t &info) {
+EntryRead readInstance(const std::string &name, OSSInstanceInfo_t &info) {
   std::vector<CopyInfo> copies;
   kxlprod::listCopies(copies);
   return readInstance(name, copies, info);
@@ -77,7 +85,7 @@ uint32_t adminServerInfo(OSSInstanceInfo_t &info) {
       name.empty())
     return OSS_RC_NOT_FOUND;
   std::string stored;
-  if (!findInstanceName(name, stored) || !readInstance(stored, info)) {
+  if (!findInstanceName(name, stored) || readInstance(stored, info) != EntryRead::read) {
     // An administration server without an instance entry: its name is all there is.
     std::memset(&info, 0, sizeof info);
     info.version = 1;
@@ -145,10 +153,15 @@ uint32_t ossGetNextInstance(OSSInstanceListHandle handle, OSSInstanceInfo_t *inf
     return OSS_RC_FAILED;
   if (handle == nullptr || info == nullptr)
     return OSS_RC_NULL_ARGUMENT;
-  // Entries removed since the list was opened are passed over.
+  // Entries removed since the list was opened are passed over; an entry that
+  // cannot be read ends the walk with a failure, so that no list is taken
+  // for whole without it.
   while (handle->next < handle->names.size()) {
-    if (readInstance(handle->names[handle->next++], handle->copies, *info))
+    EntryRead read = readInstance(handle->names[handle->next++], handle->copies, *info);
+    if (read == EntryRead::read)
       return 0;
+    if (read == EntryRead::failed)
+      return OSS_RC_FAILED;
   }
   std::memset(info, 0, sizeof *info);
   return OSS_RC_END_OF_LIST;
@@ -169,9 +182,10 @@ uint32_t ossGetInstanceInfo(const char *name, uint32_t, const char *, OSSInstanc
   if (std::strcmp(name, OSS_ADMIN_SERVER_INSTANCE) == 0)
     return adminServerInfo(*info);
   std::string stored;
-  if (!findInstanceName(name, stored) || !readInstance(stored, *info))
+  if (!findInstanceName(name, stored))
     return OSS_RC_NOT_FOUND;
-  return 0;
+  EntryRead read = readInstance(stored, *info);
+  return read == EntryRead::read ? 0 : (read == EntryRead::absent ? OSS_RC_NOT_FOUND : OSS_RC_FAILED);
 }
 
 } // extern "C"

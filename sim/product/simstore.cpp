@@ -66,8 +66,10 @@ bool readInstanceEntry(const std::string &instance, std::string &directory, std:
   if (readRegString(HKEY_LOCAL_MACHINE, key, "Directory", directory) != ERROR_SUCCESS)
     return false;
   copy.clear();
-  readRegString(HKEY_LOCAL_MACHINE, key, "Copy", copy);
-  return true;
+  // No copy: the version-8 installation's. A copy that cannot be read is
+  // never taken for that.
+  LONG rc = readRegString(HKEY_LOCAL_MACHINE, key, "Copy", copy);
+  return rc == ERROR_SUCCESS || rc == ERROR_FILE_NOT_FOUND;
 }
 
 std::string processInstance() {

@@ -24,7 +24,8 @@ std::string serviceKeyPath(const std::string &machinePrefix, const std::string &
 // The instance registry key of an instance.
 std::string instanceRegistryKey(const std::string &instance);
 
-// "Directory" and "Copy" of an instance registry entry; false when it has none.
+// "Directory" and "Copy" of an instance registry entry; false when it has
+// none or it cannot be read (no copy: the version-8 installation's).
 bool readInstanceEntry(const std::string &instance, std::string &directory, std::string &copy);
 
 // The process's current instance (KXLINSTANCE), "" when unset.

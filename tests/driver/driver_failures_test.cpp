@@ -162,6 +162,7 @@ TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
       {kNewAccount, "sqlowrite:4", 130, -1947},
       {withArgs({"-forcecn"}, kNewAccount), "sqleInitApplicationEnvironment:1", 120, 0},
       {kNewAccount, "sqloQueryNTServiceConfig:2", 90, -1925}, // an account that cannot be read
+      {kNewAccount, "sqloChangeNTServiceConfig:2", 90, 0},    // a partition that cannot be re-pointed
       // The forced machine's old profile key cannot be deleted or reached.
       {withArgs({"-forcecn"}, kNewAccount), "SHDeleteKeyA:2", 210, -1918},
       {withArgs({"-forcecn"}, kNewAccount), "sqloPRegMachineOpen:4", 210, -1913},

@@ -221,6 +221,36 @@ TEST_F(PartitionedServicesTest, NodesFileFailuresAndUnreachableMachine) {
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=90 rc=-1913"));
 }
 
+// With -u, the partitions' accounts are kept for the undo before anything
+// changes. A service that cannot be changed, or another machine's program path
+// that cannot be read (here: too long), fails the step instead of leaving a
+// service on the old copy's program.
+TEST_F(PartitionedServicesTest, AccountsAreKeptBeforeTheyChange) {
+  std::snprintf(options->userName, sizeof options->userName, "NEWACCT");
+  std::snprintf(options->password, sizeof options->password, "secret");
+  ASSERT_EQ(0, run());
+  EXPECT_EQ("NEWACCT", getString(kMach2 + serviceKey("INST1-2"), "ObjectName"));
+  ASSERT_EQ(3u, context.serviceAccounts.size());
+  ASSERT_NE(nullptr, serviceAccountBefore(context, "mach2", "inst1-2"));
+  EXPECT_STREQ("OLDACCT", serviceAccountBefore(context, "mach2", "inst1-2"));
+  EXPECT_EQ(nullptr, serviceAccountBefore(context, "MACH2", "INST1-1"));
+}
+
+TEST_F(PartitionedServicesTest, ServiceThatCannotBeChangedFailsTheStep) {
+  startTrace();
+  failCalls("sqloChangeNTServiceConfig:2");
+  EXPECT_NE(0, run());
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=60"));
+}
+
+TEST_F(PartitionedServicesTest, ProgramPathThatCannotBeReadFailsTheStep) {
+  startTrace();
+  setString(std::string(kMach2) + "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL10\\GLOBAL_PROFILE", "KXLPATH",
+            std::string(300, 'D'));
+  EXPECT_EQ(SERVICES_RC_MACHINE_REGISTRY, run());
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=65 rc=-1913"));
+}
+
 // The library reports a missing nodes file as the warning the step tolerates:
 // nothing to save, nothing to put back, and the partitions are re-pointed.
 TEST_F(PartitionedServicesTest, MissingNodesFileIsNotAFailure) {
