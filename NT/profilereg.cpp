@@ -143,16 +143,41 @@ bool isEmptyKey(HKEY root, const char *path) {
   return empty;
 }
 
+// The length of the first key on `path` below the product root that does not
+// exist: creating `path` makes that key and the ones below it. The whole
+// length when every parent exists, or when one cannot be opened for another
+// reason (it is then never taken for one this run made).
+size_t createdFrom(HKEY root, const char *path) {
+  const size_t rootLength = sizeof kProductRoot - 1;
+  size_t length = std::strlen(path);
+  for (size_t at = rootLength + 1; at < length; ++at) {
+    if (path[at] != '\\')
+      continue;
+    std::string parent(path, at);
+    HKEY key = nullptr;
+    LONG rc = RegOpenKeyExA(root, parent.c_str(), 0, kReadAccess, &key);
+    if (rc == ERROR_SUCCESS) {
+      RegCloseKey(key);
+      continue;
+    }
+    return rc == ERROR_FILE_NOT_FOUND ? at : length;
+  }
+  return length;
+}
+
 // Deletes a key this run created, and the parents below the product root that
-// creating it made and that are empty now.
-void deleteCreatedKey(HKEY root, const char *path) {
+// are empty now, from the key of length `createdAt` on (the ones creating it
+// made; 0: any empty parent).
+void deleteCreatedKey(HKEY root, const char *path, size_t createdAt = 0) {
   SHDeleteKeyA(root, path);
   char parent[kKeyPathSize];
   if (!formatWhole(parent, sizeof parent, "%s", path))
     return;
   const size_t rootLength = sizeof kProductRoot - 1;
   for (char *cut = std::strrchr(parent, '\\');
-       cut != nullptr && static_cast<size_t>(cut - parent) > rootLength; cut = std::strrchr(parent, '\\')) {
+       cut != nullptr && static_cast<size_t>(cut - parent) > rootLength &&
+       static_cast<size_t>(cut - parent) >= createdAt;
+       cut = std::strrchr(parent, '\\')) {
     *cut = '\0';
     if (!isEmptyKey(root, parent))
       return;
@@ -165,23 +190,23 @@ void deleteCreatedKey(HKEY root, const char *path) {
 // failed upgrade must put back.
 int32_t moveKey(HKEY root, const ProfileKeys &keys, bool force) {
   const char *target = force ? keys.force : keys.current;
+  size_t createdAt = createdFrom(root, target);
   HKEY newKey = nullptr;
   DWORD disposition = 0;
   if (createKey(root, target, &newKey, &disposition) != ERROR_SUCCESS)
     return traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
   int32_t rc = 0;
-  bool copyFailed = false;
   if (!force && !sameText(keys.old, target, kKeyPathSize)) {
-    copyFailed = SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS;
-    if (copyFailed)
+    if (SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS)
       rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
-    else
-      SHDeleteKeyA(root, keys.old);
+    else if (SHDeleteKeyA(root, keys.old) != ERROR_SUCCESS)
+      rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeDropKey, KXL_RC_PROFILE_KEY);
   }
   RegCloseKey(newKey);
-  // A key this call created for a copy that failed would be taken for a move.
-  if (copyFailed && disposition == REG_CREATED_NEW_KEY)
-    deleteCreatedKey(root, target);
+  // A key this call created for a move that failed would be taken for a
+  // move; the old key is still whole. Parents that existed before stay.
+  if (rc != 0 && disposition == REG_CREATED_NEW_KEY)
+    deleteCreatedKey(root, target, createdAt);
   return rc;
 }
 

@@ -35,6 +35,26 @@ TEST_F(MoveProfile, FailedCopyKeepsOldKeyAndDropsTheKeyItCreated) {
   EXPECT_NE(std::string::npos, trace.find("exit 0x18780506 rc=-1918"));
 }
 
+// A copy or a delete of the old key that fails keeps the old key whole and
+// drops the key the move created, but never a parent that was there before.
+TEST_F(MoveProfile, FailedMoveKeepsTheParentsThatWereThere) {
+  ownBy(kOld);
+  const std::string profiles = std::string(kRoot) + "\\InstalledCopies\\" + kCurrent + "\\PROFILES";
+  for (const char *fault : {"SHCopyKeyA:1", "SHDeleteKeyA:1"}) {
+    SCOPED_TRACE(fault);
+    seedProfile(kLocal, kOld);
+    HKEY key = nullptr;
+    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, profiles.c_str(), 0, nullptr, 0,
+                                             KEY_ALL_ACCESS, nullptr, &key, nullptr));
+    RegCloseKey(key);
+    failCalls(fault);
+    EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+    failCalls(nullptr);
+    expectUntouched(kLocal, kOld, kCurrent);
+    EXPECT_TRUE(keyExists(profiles));
+  }
+}
+
 TEST_F(MoveProfile, NewKeyThatCannotBeCreatedChangesNothing) {
   ownBy(kOld);
   seedProfile(kLocal, kOld);
