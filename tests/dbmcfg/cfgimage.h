@@ -2,7 +2,7 @@
 // saved source file for the conversion.
 #pragma once
 
-#include "tests/product/world_fixture.h"
+#include "tests/support/product_world.h"
 
 #include <cstdint>
 #include <string>

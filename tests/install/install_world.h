@@ -2,7 +2,7 @@
 // lay out copies, instances, configuration files and installer registrations.
 #pragma once
 
-#include "../product/world_fixture.h"
+#include "tests/support/product_world.h"
 #include "install/ilist.h"
 #include "sim/common/installer.h"
 

@@ -2,17 +2,17 @@
 #include "NT/instfiles.h"
 #include "engn/sqo/checks.h"
 #include "engn/sqo/run.h"
-#include "fixture.h"
+#include "tests/support/product_world.h"
 
 #include <cstdio>
 #include <string>
 
 namespace {
 
-class InstanceChecksTest : public kxltest::SimWorld {
+class InstanceChecksTest : public kxltest::ProductWorld {
 protected:
   void SetUp() override {
-    SimWorld::SetUp();
+    ProductWorld::SetUp();
     setString(kIdentity, "ComputerName", "WINSRV1");
     std::memset(&options, 0, sizeof options);
     std::snprintf(options.instanceName, sizeof options.instanceName, "%s", "INST2");

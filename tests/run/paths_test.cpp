@@ -1,6 +1,6 @@
 // Paths as the run forms them: long-name expansion and joining.
 #include "NT/pathjoin.h"
-#include "world_fixture.h"
+#include "tests/support/product_world.h"
 
 #include <string>
 

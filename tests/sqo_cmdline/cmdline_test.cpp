@@ -1,6 +1,6 @@
 // parseCommandLine in a temporary world: options, values, codes.
 #include "engn/sqo/cmdline.h"
-#include "tests/product/world_fixture.h"
+#include "tests/support/product_world.h"
 
 #include <gtest/gtest.h>
 

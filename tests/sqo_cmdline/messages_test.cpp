@@ -1,7 +1,7 @@
 // Final messages: placeholder replacement, token splicing, catalog texts and
 // the fallback lines, read back from standard output.
 #include "engn/sqo/messages.h"
-#include "tests/product/world_fixture.h"
+#include "tests/support/product_world.h"
 
 #include <gtest/gtest.h>
 

@@ -1,14 +1,14 @@
 // Service states on this and other machines, and nodes files.
-#include "fixture.h"
+#include "tests/support/product_world.h"
 
 #include <cstdlib>
 
 namespace {
 
-class ServicesTest : public kxltest::SimWorld {
+class ServicesTest : public kxltest::ProductWorld {
 protected:
   void SetUp() override {
-    SimWorld::SetUp();
+    ProductWorld::SetUp();
     setString(kIdentity, "ComputerName", "WINSRV1");
   }
 };

@@ -1,5 +1,5 @@
 // The library's current instance, its audit settings file and audit events.
-#include "fixture.h"
+#include "tests/support/product_world.h"
 #include "sim/common/events.h"
 
 #include <algorithm>
@@ -9,15 +9,15 @@
 
 namespace {
 
-class AuditTest : public kxltest::SimWorld {
+class AuditTest : public kxltest::ProductWorld {
 protected:
   void SetUp() override {
-    SimWorld::SetUp();
+    ProductWorld::SetUp();
     registerInstance("INST1", "C:\\KXL\\INST1", "COPY1");
   }
   void TearDown() override {
     sqlosins("");
-    SimWorld::TearDown();
+    ProductWorld::TearDown();
   }
 
   static void writeSettings(const std::string &text) {

@@ -1,9 +1,9 @@
 // Who runs the program: administrator bits, authorization ID, content extender.
-#include "fixture.h"
+#include "tests/support/product_world.h"
 
 namespace {
 
-using AuthorityTest = kxltest::SimWorld;
+using AuthorityTest = kxltest::ProductWorld;
 
 TEST_F(AuthorityTest, AdministratorBitsComeFromTheIdentity) {
   EXPECT_EQ(0, sqloIsLocalAdmin()) << "a machine that records nothing has an ordinary user";

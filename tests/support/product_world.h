@@ -80,6 +80,14 @@ protected:
     kxlsim::resetFaults();
   }
 
+  // The "State" of a service of this machine ("") or of another one.
+  static void setServiceState(const std::string &machine, const std::string &name, DWORD state) {
+    std::string prefix = machine.empty() ? "" : "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + machine + "\\";
+    setDword(prefix + "SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name, "State", state);
+  }
+
+  static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
+
   // A copy registered under InstalledCopies with its installation path.
   static void registerCopy(const std::string &copy, const std::string &path) {
     setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\" + copy, "KXL Path Name", path);

@@ -1,5 +1,5 @@
 // Status blocks and the process control block.
-#include "world_fixture.h"
+#include "tests/support/product_world.h"
 
 #include <string>
 

@@ -2,7 +2,7 @@
 // through the Win32 surface, host files, and a current installation.
 #pragma once
 
-#include "tests/product/world_fixture.h"
+#include "tests/support/product_world.h"
 
 #include <fstream>
 #include <iterator>

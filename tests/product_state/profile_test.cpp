@@ -1,6 +1,6 @@
 // Environment values, profile variables of both registry layouts, and other
 // machines' registries.
-#include "world_fixture.h"
+#include "tests/support/product_world.h"
 
 #include <string>
 #include <vector>

@@ -1,5 +1,5 @@
 // Installed copies, the current installation and the instance registry.
-#include "world_fixture.h"
+#include "tests/support/product_world.h"
 
 #include <map>
 #include <string>
