@@ -288,15 +288,17 @@ int32_t settlePorts(const char *instanceName, PartitionRecord &record) {
 
 int32_t setInstanceVariable(const char *instanceName, uint32_t variable, const char *value) {
   char text[SQLO_PREG_VALUE_SZ];
-  ossSnprintf(text, sizeof text, "%s", value);
-  if (sqloPRegValuePE(SQLO_PREG_SET, &variable, 0, text, instanceName, SQLO_PREG_ANY_NODE, 0) != 0)
+  // A value that could not be formed is never set as an empty one.
+  if (ossSnprintf(text, sizeof text, "%s", value) < 0 ||
+      sqloPRegValuePE(SQLO_PREG_SET, &variable, 0, text, instanceName, SQLO_PREG_ANY_NODE, 0) != 0)
     return traced(kProbeVariables, ENVIRONMENT_RC_PROFILE_VALUE);
   return 0;
 }
 
 int32_t setPartitionVariables(const char *instanceName, const PartitionRecord &record) {
   char ports[2 * SQLO_PORT_TEXT_SZ];
-  ossSnprintf(ports, sizeof ports, "%s:%s", record.portStart, record.portEnd);
+  if (ossSnprintf(ports, sizeof ports, "%s:%s", record.portStart, record.portEnd) < 0)
+    return traced(kProbeVariables, ENVIRONMENT_RC_PROFILE_VALUE);
   int32_t rc = setInstanceVariable(instanceName, KXL_VAR_KXLPORTRANGE, ports);
   if (rc == 0)
     rc = setInstanceVariable(instanceName, KXL_VAR_KXLNODECOMPUTER, record.computerName);
@@ -329,12 +331,15 @@ bool writeTextFile(const char *directory, const char *name, uint32_t flags, cons
 
 int32_t writePartitionFiles(const CreatedInstance &created, const PartitionRecord &record, sqlca *ca) {
   char line[SQLO_HOSTNAME_SZ + SQLO_COMPUTERNAME_SZ + UPGRADE_NET_NAME_SZ + 16];
-  ossSnprintf(line, sizeof line, "0 %s %s 0 %s\r\n", record.hostName, record.computerName, record.netName);
-  if (!writeTextFile(created.directory, "kxlnodes.cfg", kNodesFileFlags, line))
+  // A text that could not be formed is never written as an empty file.
+  if (ossSnprintf(line, sizeof line, "0 %s %s 0 %s\r\n", record.hostName, record.computerName,
+                  record.netName) < 0 ||
+      !writeTextFile(created.directory, "kxlnodes.cfg", kNodesFileFlags, line))
     return commFailure(kProbeNodesFile, ca);
   char script[64];
-  ossSnprintf(script, sizeof script, "@echo off%sSET KXLINSTANCE=%s%s", "\r\n", created.name, "\r\n");
-  if (!writeTextFile(created.directory, "kxlprofile.bat", kProfileScriptFlags, script))
+  if (ossSnprintf(script, sizeof script, "@echo off%sSET KXLINSTANCE=%s%s", "\r\n", created.name, "\r\n") <
+          0 ||
+      !writeTextFile(created.directory, "kxlprofile.bat", kProfileScriptFlags, script))
     return commFailure(kProbeProfileScript, ca);
   return 0;
 }

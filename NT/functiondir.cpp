@@ -8,9 +8,11 @@ namespace {
 
 constexpr uint32_t kNodeTypeWithoutServer = 2;
 
-bool directoryMissing(const char *path) {
+// 0 when the directory is there, OSS_RC_PATH_NOT_FOUND when it is missing; a
+// test that fails is never taken for a directory that is there.
+uint32_t testDirectory(const char *path) {
   OSSPathParam param = {OSS_PATH_PARAM_VERSION, path, 1, 0};
-  return ossPathTest(&param) == OSS_RC_PATH_NOT_FOUND;
+  return ossPathTest(&param);
 }
 
 int32_t copyIfNeeded(const UpgradeContext &context, const char *newProfilePath, const char *oldProfilePath) {
@@ -18,8 +20,9 @@ int32_t copyIfNeeded(const UpgradeContext &context, const char *newProfilePath, 
   char newFunctions[KXL_JOINED_PATH_SZ];
   joinPath(oldFunctions, oldProfilePath, "\\function");
   joinPath(newFunctions, newProfilePath, "\\function");
-  if (!directoryMissing(newFunctions))
-    return 0;
+  uint32_t tested = testDirectory(newFunctions);
+  if (tested != OSS_RC_PATH_NOT_FOUND)
+    return static_cast<int32_t>(tested);
   if (context.nodeType == kNodeTypeWithoutServer)
     return 0;
   return sqlocopydir(newFunctions, oldFunctions, 0);

@@ -36,6 +36,7 @@ enum Probe : uint32_t {
   kProbeRestoreNodes = 50,
   kProbeServiceChange = 60,
   kProbeProgramPath = 65,
+  kProbeName = 75,
   kProbeHostName = 70,
   kProbeClusterMachine = 80,
   kProbePartitionMachine = 90,
@@ -43,6 +44,17 @@ enum Probe : uint32_t {
 };
 
 constexpr ErrorTrace traced{KXL_FN_UPGRADE_INSTANCE_SERVICES};
+
+// A name, path or value the step forms and passes on. One that could not be
+// formed ends the step: an empty one would mean "no change" to the library,
+// or name nothing.
+bool formed(int length) {
+  return length >= 0;
+}
+
+int32_t unformed() {
+  return traced(kProbeName, SQLO_RC_SYSTEM_ERROR);
+}
 
 // The cluster profile values, read before the instance is re-created and
 // written to every machine of the cluster afterwards.
@@ -122,8 +134,9 @@ void programPaths(const char *installPath, ProgramPaths &paths) {
 // or value that cannot be read is a failure, never taken for a missing one.
 int32_t machineProgramPaths(HKEY hklm, const char *copyName, ProgramPaths &paths) {
   char keyPath[64 + SQLO_COPY_NAME_SZ];
-  ossSnprintf(keyPath, sizeof keyPath, "%s\\InstalledCopies\\%s\\GLOBAL_PROFILE", "SOFTWARE\\ZAV\\KXL",
-              copyName);
+  if (!formed(ossSnprintf(keyPath, sizeof keyPath, "%s\\InstalledCopies\\%s\\GLOBAL_PROFILE",
+                          "SOFTWARE\\ZAV\\KXL", copyName)))
+    return unformed();
   HKEY key = nullptr;
   LONG rc = RegOpenKeyExA(hklm, keyPath, 0, KEY_READ, &key);
   if (rc == ERROR_FILE_NOT_FOUND)
@@ -236,15 +249,17 @@ uint32_t workstationProfileFlag() {
 }
 
 // The product libraries see the instance's port range and profile path.
-void prepareEnvironment(const ServicesStep &step) {
+int32_t prepareEnvironment(const ServicesStep &step) {
   if (step.context.var159Head[0] != '\0') {
     char ports[19];
-    ossSnprintf(ports, sizeof ports, "%s:%s", step.context.var159Head, step.context.var159Tail);
+    if (!formed(ossSnprintf(ports, sizeof ports, "%s:%s", step.context.var159Head, step.context.var159Tail)))
+      return unformed();
     sqloPutEnv(KXL_VAR_KXLPORTRANGE, ports);
     sqlo_force_refresh_env();
   }
   sqloPutEnv(KXL_VAR_KXLINSTPROF, step.options.profilePath);
   sqlo_force_refresh_env();
+  return 0;
 }
 
 bool isCopied(int32_t rc) {
@@ -252,11 +267,11 @@ bool isCopied(int32_t rc) {
 }
 
 // "<path>.mig", inside the closing quote of a quoted path.
-void savedNodesFilePath(const char *path, char *saved) {
+bool savedNodesFilePath(const char *path, char *saved) {
   size_t length = std::strlen(path);
   bool quoted = length > 0 && path[length - 1] == '"';
   int keep = static_cast<int>(quoted ? length - 1 : length);
-  ossSnprintf(saved, KXL_JOINED_PATH_SZ, "%.*s.mig%s", keep, path, quoted ? "\"" : "");
+  return formed(ossSnprintf(saved, KXL_JOINED_PATH_SZ, "%.*s.mig%s", keep, path, quoted ? "\"" : ""));
 }
 
 int32_t saveNodesFile(ServicesStep &step) {
@@ -266,7 +281,8 @@ int32_t saveNodesFile(ServicesStep &step) {
   else if (step.context.instance != nullptr)
     step.context.instance->GetInstanceDir(directory, sizeof directory);
   joinPath(step.nodesFile, directory, "\\kxlnodes.cfg");
-  savedNodesFilePath(step.nodesFile, step.savedNodesFile);
+  if (!savedNodesFilePath(step.nodesFile, step.savedNodesFile))
+    return unformed();
   int32_t rc = sqlocopy(step.nodesFile, step.savedNodesFile, 0);
   return isCopied(rc) ? 0 : traced(kProbeSaveNodes, rc);
 }
@@ -275,8 +291,8 @@ const unsigned char *firstNode(const UpgradeContext &context) {
   return context.nodeList != nullptr ? sqloNodeListFirst(context.nodeList) : nullptr;
 }
 
-void partitionServiceName(const ServicesStep &step, const unsigned char *entry, char *name) {
-  ossSnprintf(name, kServiceNameSize, "%s-%d", step.instanceName, sqloNodeNumber(entry));
+bool partitionServiceName(const ServicesStep &step, const unsigned char *entry, char *name) {
+  return formed(ossSnprintf(name, kServiceNameSize, "%s-%d", step.instanceName, sqloNodeNumber(entry)));
 }
 
 template <class Visit> int32_t forEachNode(const ServicesStep &step, Visit visit) {
@@ -293,11 +309,13 @@ template <class Visit> int32_t forEachNode(const ServicesStep &step, Visit visit
 // The service whose start type the re-created services get: the first
 // partition's, or the instance's own. A partitioned instance without a node
 // list has none.
-void chooseReferenceService(ServicesStep &step) {
+int32_t chooseReferenceService(ServicesStep &step) {
+  bool named = true;
   if (!step.partitioned())
-    ossSnprintf(step.referenceService, sizeof step.referenceService, "%s", step.instanceName);
+    named = formed(ossSnprintf(step.referenceService, sizeof step.referenceService, "%s", step.instanceName));
   else if (const unsigned char *entry = firstNode(step.context))
-    partitionServiceName(step, entry, step.referenceService);
+    named = partitionServiceName(step, entry, step.referenceService);
+  return named ? 0 : unformed();
 }
 
 int32_t readStartType(ServicesStep &step) {
@@ -336,7 +354,8 @@ int32_t recordAccounts(ServicesStep &step) {
   auto onMachine = [&](const char *machine) {
     return forEachNode(step, [&](const unsigned char *entry) {
       char service[kServiceNameSize];
-      partitionServiceName(step, entry, service);
+      if (!partitionServiceName(step, entry, service))
+        return unformed();
       return recordAccount(step, service, machine != nullptr ? machine : sqloNodeMachine(entry));
     });
   };
@@ -381,9 +400,10 @@ bool isLocalHost(const ServicesStep &step, const unsigned char *entry) {
 int32_t registerExtender(const ServicesStep &step, const unsigned char *entry, const ServiceChange &partition,
                          const char *program) {
   char service[kExtenderNameSize], display[kDisplayNameSize];
-  ossSnprintf(service, sizeof service, "KXLEXT - %s", partition.service);
-  ossSnprintf(display, sizeof display, "KXLEXT - %s - %s-%d", step.copyName, step.instanceName,
-              sqloNodeNumber(entry));
+  if (!formed(ossSnprintf(service, sizeof service, "KXLEXT - %s", partition.service)) ||
+      !formed(ossSnprintf(display, sizeof display, "KXLEXT - %s - %s-%d", step.copyName, step.instanceName,
+                          sqloNodeNumber(entry))))
+    return unformed();
   SQLO_SVC_OUT out{};
   int32_t rc = sqloRegisterNTService(partition.machine, service, display, 0, program, 0, partition.account,
                                      partition.password, kMessageLibrary, &out);
@@ -401,9 +421,10 @@ int32_t registerExtender(const ServicesStep &step, const unsigned char *entry, c
 int32_t repointPartitionServices(const ServicesStep &step, const unsigned char *entry, const char *machine,
                                  const ProgramPaths &paths, bool forced) {
   char service[kServiceNameSize], display[kDisplayNameSize];
-  partitionServiceName(step, entry, service);
-  ossSnprintf(display, sizeof display, "KXL - %s - %s-%d", step.copyName, step.instanceName,
-              sqloNodeNumber(entry));
+  if (!partitionServiceName(step, entry, service) ||
+      !formed(ossSnprintf(display, sizeof display, "KXL - %s - %s-%d", step.copyName, step.instanceName,
+                          sqloNodeNumber(entry))))
+    return unformed();
   ServiceChange change;
   change.service = service;
   change.machine = machine;
@@ -422,8 +443,7 @@ int32_t repointPartition(ServicesStep &step, const unsigned char *entry) {
   bool localHost = isLocalHost(step, entry);
   if (localHost && sqloNodePort(entry) == 0) {
     char service[kServiceNameSize];
-    partitionServiceName(step, entry, service);
-    return restoreStartType(step, service);
+    return partitionServiceName(step, entry, service) ? restoreStartType(step, service) : unformed();
   }
   ProgramPaths paths;
   programPaths(step.options.currentInstallPath, paths);
@@ -484,7 +504,8 @@ int32_t repointClusterNode(ServicesStep &step, const char *machine) {
   if (rc != 0)
     return rc;
   char display[kDisplayNameSize];
-  ossSnprintf(display, sizeof display, "KXL - %s - %s", step.copyName, step.instanceName);
+  if (!formed(ossSnprintf(display, sizeof display, "KXL - %s - %s", step.copyName, step.instanceName)))
+    return unformed();
   ServiceChange change;
   change.service = step.instanceName;
   change.machine = machine;
@@ -530,14 +551,18 @@ int32_t runServicesStep(ServicesStep &step) {
     return rc;
   uint32_t workstationFlag = workstationProfileFlag();
   int32_t newNodeType = chooseNodeType(context, step.options, context.nodeType);
-  prepareEnvironment(step);
-  ossSnprintf(step.instanceName, sizeof step.instanceName, "%s", step.options.instanceName);
-  int32_t rc = step.clustered() ? readClusterProfile(step) : 0;
+  int32_t rc = prepareEnvironment(step);
+  if (rc == 0 &&
+      !formed(ossSnprintf(step.instanceName, sizeof step.instanceName, "%s", step.options.instanceName)))
+    rc = unformed();
+  if (rc == 0 && step.clustered())
+    rc = readClusterProfile(step);
   if (rc == 0 && step.partitioned())
     rc = saveNodesFile(step);
+  if (rc == 0)
+    rc = chooseReferenceService(step);
   if (rc != 0)
     return rc;
-  chooseReferenceService(step);
   if (context.nodeType != 2 && (rc = readStartType(step)) != 0)
     return rc;
   if ((rc = recordAccounts(step)) != 0 || (rc = recreateInstance(step, newNodeType, workstationFlag)) != 0)

@@ -427,7 +427,10 @@ uint32_t ossPathTest(OSSPathParam *param) {
   if (!validPathParam(param))
     return OSS_RC_NULL_ARGUMENT;
   std::string name = unquotedPath(param->path);
-  return GetFileAttributesA(name.c_str()) != INVALID_FILE_ATTRIBUTES ? 0 : OSS_RC_PATH_NOT_FOUND;
+  if (GetFileAttributesA(name.c_str()) != INVALID_FILE_ATTRIBUTES)
+    return 0;
+  int32_t missing = 0;
+  return isMissing(name, missing) ? OSS_RC_PATH_NOT_FOUND : OSS_RC_FAILED;
 }
 
 uint32_t ossDirectoryCreate(OSSPathParam *param) {

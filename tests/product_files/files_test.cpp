@@ -217,7 +217,10 @@ TEST_F(Files, UnreadableAttributesAreNotAMissingFile) {
     EXPECT_NE(SQLO_RC_FILE_NOT_FOUND_W, rc);
     EXPECT_EQ(nullptr, handle);
   }
+  failCalls("GetFileAttributesA:1");
+  EXPECT_EQ(OSS_RC_FAILED, pathTest("C:\\src\\missing.txt"));
   failCalls(nullptr);
+  EXPECT_EQ(OSS_RC_PATH_NOT_FOUND, pathTest("C:\\src\\missing.txt"));
   EXPECT_TRUE(exists("C:\\src\\a.txt"));
   EXPECT_FALSE(exists("C:\\dst\\c.txt"));
 }

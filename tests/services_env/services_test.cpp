@@ -238,6 +238,11 @@ TEST_F(PartitionedServicesTest, AccountsAreKeptBeforeTheyChange) {
 
 TEST_F(PartitionedServicesTest, ServiceThatCannotBeChangedFailsTheStep) {
   startTrace();
+  // A name that cannot be formed ends the step before anything changes.
+  failCalls("ossSnprintf:1");
+  EXPECT_NE(0, run());
+  EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=75"));
+  EXPECT_EQ(kOldCopy, getString(instanceKey(kInstance), "Copy"));
   failCalls("sqloChangeNTServiceConfig:2");
   EXPECT_NE(0, run());
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=60"));
