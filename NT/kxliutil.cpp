@@ -227,7 +227,12 @@ using Step = StepResult (*)(DriverState &);
 
 struct DriverStep {
   Step run;
-  bool changesMachine; // the run's record is written before it
+  // The run's record is written before it. The registry clean-up, which
+  // follows the drop of the forced machines' old keys, has none of its own: a
+  // record that failed there could only fail the upgrade once those keys can
+  // no longer be put back, and a run finishing a killed one runs it again
+  // anyway (it ignores its tool's result).
+  bool changesMachine;
 };
 
 // The upgrade, in order.
@@ -239,7 +244,7 @@ constexpr DriverStep kSteps[] = {
     {upgradeSsl, true},          {rereadCopies, false},         {findUpgradedInstance, false},
     {prepareEnvironment, false}, {convertConfiguration, true},  {applyAuthenticationType, true},
     {carryFiles, true},          {copyFunctions, true},         {upgradeCluster, true},
-    {dropForcedKeys, true},      {cleanProfileRegistry, true},
+    {dropForcedKeys, true},      {cleanProfileRegistry, false},
 };
 
 constexpr uint32_t stepIndex(Step step) {
