@@ -52,19 +52,6 @@ int32_t traced(uint32_t function, uint32_t probe, int32_t rc) {
   return rc;
 }
 
-// Equal ignoring case over at most `limit` characters.
-bool sameText(const char *a, const char *b, size_t limit) {
-  for (size_t i = 0; i < limit; ++i) {
-    int ca = std::tolower(static_cast<unsigned char>(a[i]));
-    int cb = std::tolower(static_cast<unsigned char>(b[i]));
-    if (ca != cb)
-      return false;
-    if (ca == '\0')
-      return true;
-  }
-  return true;
-}
-
 // snprintf that reports whether the whole text fitted.
 template <class... Args> bool formatWhole(char *buffer, size_t size, const char *format, Args... args) {
   int length = std::snprintf(buffer, size, format, args...);
@@ -196,7 +183,7 @@ int32_t moveKey(HKEY root, const ProfileKeys &keys, bool force) {
   if (createKey(root, target, &newKey, &disposition) != ERROR_SUCCESS)
     return traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
   int32_t rc = 0;
-  if (!force && !sameText(keys.old, target, kKeyPathSize)) {
+  if (!force && !sameName(keys.old, target, kKeyPathSize)) {
     if (SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS)
       rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
     else if (SHDeleteKeyA(root, keys.old) != ERROR_SUCCESS)
@@ -238,7 +225,7 @@ int32_t revertKey(HKEY root, const ProfileKeys &keys, bool force) {
 // A key that is gone already (a run that was killed after deleting it) is
 // what the drop wants.
 int32_t dropForcedKey(HKEY root, const ProfileKeys &keys) {
-  if (sameText(keys.old, keys.force, kKeyPathSize))
+  if (sameName(keys.old, keys.force, kKeyPathSize))
     return 0;
   LONG rc = SHDeleteKeyA(root, keys.old);
   if (rc != ERROR_SUCCESS && rc != ERROR_FILE_NOT_FOUND)
@@ -283,7 +270,7 @@ struct MachineWalk {
 
   bool handledAlready(const char *machineName) const {
     for (const std::string &name : handled)
-      if (sameText(name.c_str(), machineName, SQLO_COMPUTERNAME_SZ))
+      if (sameName(name.c_str(), machineName, SQLO_COMPUTERNAME_SZ))
         return true;
     return false;
   }
@@ -354,7 +341,7 @@ private:
 
 uint8_t forceFor(const UpgradeOptions &options, const char *localHost, const unsigned char *entry) {
   bool forced = (options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) != 0 &&
-                !sameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
+                !sameName(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
   return forced ? 1 : 0;
 }
 
@@ -426,7 +413,7 @@ int32_t walkCluster(MachineWalk &walk) {
     if (end != nullptr)
       *end = '\0';
     int32_t rc = 0;
-    if (name[0] != '\0' && !sameText(name, computer, SQLO_COMPUTERNAME_SZ) && !walk.handledAlready(name))
+    if (name[0] != '\0' && !sameName(name, computer, SQLO_COMPUTERNAME_SZ) && !walk.handledAlready(name))
       rc = onMachine(walk, name, 0, kProbeClusterOpen, kProbeClusterKey);
     if (rc != 0 && !walk.keepGoing)
       return rc;
@@ -463,7 +450,7 @@ void ownerProgramPath(const UpgradeContext &context, char (&path)[kProgramPathSi
 // The machine's registry for reading: the walk's open one when it is that
 // machine's, else that machine opened anew; null when it cannot be reached.
 HKEY machineRoot(MachineWalk &walk, const char *machineName) {
-  if (walk.machine == nullptr || !sameText(walk.machine->machineName, machineName, SQLO_COMPUTERNAME_SZ)) {
+  if (walk.machine == nullptr || !sameName(walk.machine->machineName, machineName, SQLO_COMPUTERNAME_SZ)) {
     if (sqloPRegMachineOpen(machineName, &walk.machine) != 0 || walk.machine == nullptr)
       return nullptr;
   }
@@ -537,7 +524,7 @@ void repointPartitionService(MachineWalk &walk, const unsigned char *entry, uint
   how.machine = sqloNodeMachine(entry);
   how.listedAs = how.machine;
   how.remoteProgram =
-      !forceCopyName(walk.options) && !sameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
+      !forceCopyName(walk.options) && !sameName(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
   how.keepProgram = force != 0;
   char service[kServiceNameSize];
   partitionServiceName(walk, entry, service);
@@ -558,7 +545,7 @@ void repointClusterServices(MachineWalk &walk) {
   readClusterList(walk.options.instanceName, list);
   bool partitioned = walk.options.partitionedInstance == 1;
   for (char *name = std::strtok(list, " "); name != nullptr; name = std::strtok(nullptr, " ")) {
-    bool local = computer[0] != '\0' && sameText(name, computer, SQLO_COMPUTERNAME_SZ);
+    bool local = computer[0] != '\0' && sameName(name, computer, SQLO_COMPUTERNAME_SZ);
     OwnedService how;
     how.machine = local ? nullptr : name;
     how.listedAs = name;

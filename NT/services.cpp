@@ -393,7 +393,7 @@ int32_t findLocalHost(ServicesStep &step) {
 }
 
 bool isLocalHost(const ServicesStep &step, const unsigned char *entry) {
-  return sqlomcpi(sqloNodeHost(entry), step.localHost, SQLO_HOSTNAME_SZ) == 0;
+  return sameName(sqloNodeHost(entry), step.localHost, SQLO_HOSTNAME_SZ);
 }
 
 // The extender service of a partition; an existing one is changed instead.
@@ -529,7 +529,7 @@ int32_t repointSingleService(ServicesStep &step) {
   }
   local[sizeof local - 1] = '\0';
   return forEachClusterMachine(step, [&](const char *machine) {
-    if (local[0] != '\0' && sqlomcpi(machine, local, SQLO_COMPUTERNAME_SZ) == 0) {
+    if (local[0] != '\0' && sameName(machine, local, SQLO_COMPUTERNAME_SZ)) {
       writeClusterValues(step.cluster.key, step.cluster);
       return 0;
     }
@@ -580,8 +580,8 @@ int32_t runServicesStep(ServicesStep &step) {
 const char *serviceAccountBefore(const UpgradeContext &context, const char *machine, const char *service) {
   const char *onMachine = machine != nullptr ? machine : "";
   for (const ServiceAccount &kept : context.serviceAccounts)
-    if (sqlomcpi(kept.machine.c_str(), onMachine, SQLO_COMPUTERNAME_SZ) == 0 &&
-        sqlomcpi(kept.service.c_str(), service, kServiceNameSize) == 0)
+    if (sameName(kept.machine.c_str(), onMachine, SQLO_COMPUTERNAME_SZ) &&
+        sameName(kept.service.c_str(), service, kServiceNameSize))
       return kept.account.c_str();
   return nullptr;
 }

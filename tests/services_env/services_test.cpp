@@ -191,6 +191,9 @@ TEST_F(PartitionedServicesTest, PartitionsRepointedThroughTheirMachines) {
 
 TEST_F(PartitionedServicesTest, ForcedCopyNameDisablesOnlyOtherHostsPartitions) {
   options->flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
+  // This host is told from the others without the library's compare, whose
+  // failure reads as "different".
+  failCalls("sqlomcpi:1,sqlomcpi:2,sqlomcpi:3,sqlomcpi:4,sqlomcpi:5,sqlomcpi:6");
   ASSERT_EQ(0, run());
   EXPECT_EQ(4u, getDword(kMach2 + serviceKey("INST1-2"), "Start"));
   EXPECT_EQ("C:\\KXL95\\bin\\kxlsyscs.exe", getString(kMach2 + serviceKey("INST1-2"), "ImagePath"));
