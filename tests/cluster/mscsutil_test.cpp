@@ -10,13 +10,13 @@
 #include "sim/common/simfail.h"
 #include "sim/posix/modules.h"
 #include "sim/posix/world.h"
+#include "tests/support/temp_world.h"
 #include "tests/support/world_access.h"
 
 #include <gtest/gtest.h>
 
 #include <cstdlib>
 #include <fstream>
-#include <ftw.h>
 #include <memory>
 #include <set>
 #include <string>
@@ -89,10 +89,6 @@ public:
   }
 };
 
-int removeEntry(const char *path, const struct stat *, int, struct FTW *) {
-  return remove(path);
-}
-
 std::vector<std::string> names(const ClusterResourceList &list) {
   std::vector<std::string> out;
   for (const ClusterResourceEntry &entry : list)
@@ -103,24 +99,13 @@ std::vector<std::string> names(const ClusterResourceList &list) {
 class ClusterWorld : public ::testing::Test, public kxltest::WorldAccess {
 protected:
   void SetUp() override {
-    char pattern[] = "/tmp/kxlcluster.XXXXXX";
-    ASSERT_NE(mkdtemp(pattern), nullptr);
-    root_ = pattern;
-    std::ofstream(root_ + "/system.reg") << "REGEDIT4\n";
-    mkdir((root_ + "/drive_c").c_str(), 0777);
-    setenv("KXLSIM_ROOT", root_.c_str(), 1);
-    unsetenv("KXLSIM_FAIL");
-    kxlsim::posix::resetWorldRoot();
-    kxlsim::resetFaults();
+    ASSERT_FALSE(root_.empty());
+    world_.enter();
     liveHandles().clear();
   }
   void TearDown() override {
     EXPECT_TRUE(liveHandles().empty()) << liveHandles().size() << " cluster handles left open";
-    unsetenv("KXLSIM_FAIL");
-    kxlsim::resetFaults();
-    nftw(root_.c_str(), removeEntry, 16, FTW_DEPTH | FTW_PHYS);
-    unsetenv("KXLSIM_ROOT");
-    kxlsim::posix::resetWorldRoot();
+    world_.leave();
   }
 
   void installModule(const char *name) {
@@ -131,7 +116,8 @@ protected:
     kxlsim::resetFaults();
   }
 
-  std::string root_;
+  kxltestsupport::TempWorld world_{"kxlcluster"};
+  const std::string root_ = world_.root();
 };
 
 // A running node with one group, two resource types and three resources.

@@ -4,6 +4,7 @@
 #include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/world_reader.h"
 #include "tests/support/command_run.h"
+#include "tests/support/temp_world.h"
 
 #include <algorithm>
 #include <filesystem>

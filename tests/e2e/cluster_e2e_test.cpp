@@ -4,6 +4,7 @@
 // way, each followed by a plain run that then succeeds.
 #include "sim/kxlsim/scenario_parts.h"
 #include "tests/support/command_run.h"
+#include "tests/support/temp_world.h"
 
 #include <gtest/gtest.h>
 

@@ -1,6 +1,7 @@
 // The single-partition instance of the 9.5 copy upgraded in a fresh demo
 // world, seen only through the programs a user has: kxlsim to build, snapshot
 // and compare the world, and the installed command itself.
+#include "tests/support/temp_world.h"
 #include <gtest/gtest.h>
 
 #include <sys/wait.h>
@@ -102,9 +103,8 @@ file + events.jsonl (805 bytes, fnv d398b08fdd4bb417)
 class UpgradeE2eTest : public ::testing::Test {
 protected:
   void SetUp() override {
-    std::string pattern = (fs::temp_directory_path() / "kxle2e.XXXXXX").string();
-    ASSERT_NE(mkdtemp(pattern.data()), nullptr);
-    temp = pattern;
+    temp = kxltestsupport::newTempDir("kxle2e");
+    ASSERT_FALSE(temp.empty());
     world = temp + "/world";
     Command created = runShell(std::string(KXL_KXLSIM) + " create " + shellWord(world) + " --command " +
                                shellWord(KXL_COMMAND) + " 2>&1");

@@ -1,4 +1,5 @@
 #include "world_fixture.h"
+#include "tests/support/temp_world.h"
 
 #include <cstdlib>
 #include <filesystem>
@@ -15,9 +16,8 @@ InstallSources buildSources() {
 }
 
 void TempDirTest::SetUp() {
-  std::string pattern = (std::filesystem::temp_directory_path() / "kxlsim-test-XXXXXX").string();
-  ASSERT_NE(mkdtemp(pattern.data()), nullptr);
-  base_ = pattern;
+  base_ = kxltestsupport::newTempDir("kxlsim-test");
+  ASSERT_FALSE(base_.empty());
 }
 
 void TempDirTest::TearDown() {
@@ -54,8 +54,8 @@ SharedWorldCleanup *cleanup =
 
 const std::string &sharedDemoWorld() {
   static const std::string world = [] {
-    std::string pattern = (std::filesystem::temp_directory_path() / "kxlsim-demo-XXXXXX").string();
-    if (mkdtemp(pattern.data()) == nullptr)
+    std::string pattern = kxltestsupport::newTempDir("kxlsim-demo");
+    if (pattern.empty())
       return std::string();
     cleanup->base = pattern;
     std::vector<std::string> errors;

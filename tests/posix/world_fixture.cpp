@@ -5,43 +5,25 @@
 
 #include <cstdlib>
 #include <fstream>
-#include <ftw.h>
 #include <sstream>
 #include <sys/stat.h>
 #include <unistd.h>
 
 namespace kxlposixtest {
 
-namespace {
-
-int removeEntry(const char *path, const struct stat *, int, struct FTW *) {
-  return remove(path);
-}
-
-} // namespace
-
 void WorldTest::SetUp() {
   char cwd[4096];
   ASSERT_NE(getcwd(cwd, sizeof cwd), nullptr);
   startCwd_ = cwd;
-  char pattern[] = "/tmp/kxlposix.XXXXXX";
-  ASSERT_NE(mkdtemp(pattern), nullptr);
-  root_ = pattern;
-  makeFile("system.reg", "REGEDIT4\n");
-  makeDir("drive_c");
-  setenv("KXLSIM_ROOT", root_.c_str(), 1);
-  unsetenv("KXLSIM_FAIL");
+  root_ = world_.root();
+  ASSERT_FALSE(root_.empty());
   unsetenv("TMP");
   unsetenv("TEMP");
-  kxlsim::posix::resetWorldRoot();
-  kxlsim::resetFaults();
+  world_.enter();
 }
 
 void WorldTest::TearDown() {
   ASSERT_EQ(chdir(startCwd_.c_str()), 0);
-  nftw(root_.c_str(), removeEntry, 16, FTW_DEPTH | FTW_PHYS);
-  unsetenv("KXLSIM_ROOT");
-  kxlsim::posix::resetWorldRoot();
 }
 
 void WorldTest::makeDir(const std::string &relative) const {

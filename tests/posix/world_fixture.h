@@ -3,6 +3,7 @@
 #pragma once
 
 #include "platform/win32.h"
+#include "tests/support/temp_world.h"
 
 #include <gtest/gtest.h>
 
@@ -25,6 +26,10 @@ protected:
   void setMachineString(const char *key, const char *name, const std::string &value) const;
   void setMachineDword(const char *key, const char *name, DWORD value) const;
 
+private:
+  kxltestsupport::TempWorld world_{"kxlposix"};
+
+protected:
   std::string root_;
 
 private:

@@ -7,6 +7,7 @@
 #include "sim/kxlsim/world_writer.h"
 #include "sim/posix/world.h"
 #include "sim/product/state.h"
+#include "tests/support/temp_world.h"
 
 #include <cstdlib>
 #include <filesystem>
@@ -15,11 +16,6 @@
 namespace kxltest {
 
 namespace {
-
-std::string makeTempDir() {
-  std::string pattern = (std::filesystem::temp_directory_path() / "kxlprod-d-XXXXXX").string();
-  return mkdtemp(pattern.data()) != nullptr ? pattern : std::string();
-}
 
 // Building the demo world takes a while: it is built once per process and
 // every case works on a copy of it.
@@ -38,7 +34,7 @@ public:
 
 private:
   void build() {
-    base_ = makeTempDir();
+    base_ = kxltestsupport::newTempDir("kxlprod-demo");
     kxlsim::InstallSources sources;
     sources.toolsPath = KXL_TEST_TOOLS;
     sources.messageDir = KXL_TEST_MESSAGES;
@@ -60,7 +56,7 @@ void DemoWorld::SetUp() {
   unsetenv("KXLSIM_FAIL");
   unsetenv("KXLINSTANCE");
   kxlsim::resetFaults();
-  base_ = makeTempDir();
+  base_ = kxltestsupport::newTempDir("kxlprod-demo");
   ASSERT_FALSE(base_.empty());
   ASSERT_FALSE(demoTemplate->world().empty()) << "the demo world cannot be built";
   world_ = base_ + "/w";

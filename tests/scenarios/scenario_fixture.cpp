@@ -4,6 +4,7 @@
 #include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/snapshot.h"
 #include "tests/support/command_run.h"
+#include "tests/support/temp_world.h"
 
 #include <cstdlib>
 #include <filesystem>

@@ -101,11 +101,6 @@ std::string readHostFile(const std::string &path) {
   return std::string(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
 }
 
-std::string newTempDir(const std::string &stem) {
-  std::string pattern = (std::filesystem::temp_directory_path() / (stem + ".XXXXXX")).string();
-  return mkdtemp(pattern.data()) != nullptr ? pattern : std::string();
-}
-
 std::string drivePath(const std::string &worldRoot, const std::string &windowsPath) {
   std::string path =
       worldRoot + "/drive_c/" + windowsPath.substr(std::min<std::size_t>(3, windowsPath.size()));

@@ -33,9 +33,6 @@ std::vector<std::string> scrubbedEnvironment(const std::vector<std::string> &set
 // The whole content of a host file ("" when it cannot be read).
 std::string readHostFile(const std::string &path);
 
-// A new directory "<stem>.XXXXXX" in the host's temporary folder; "" on failure.
-std::string newTempDir(const std::string &stem);
-
 // Host path below `worldRoot` of a Windows path on drive C: ("C:\a\b" ->
 // "<worldRoot>/drive_c/a/b"), without a trailing "/".
 std::string drivePath(const std::string &worldRoot, const std::string &windowsPath);

@@ -15,14 +15,7 @@
 #include <cstdlib>
 #include <string>
 
-#ifndef _WIN32
-#include "sim/posix/world.h"
-
-#include <filesystem>
-#include <fstream>
-#include <unistd.h>
-#include <vector>
-#endif
+#include "tests/support/temp_world.h"
 
 namespace kxltest {
 
@@ -45,16 +38,8 @@ protected:
     if (disposable == nullptr || std::string(disposable) != "1")
       GTEST_SKIP() << "the product library cases change HKLM; set KXL_TEST_DISPOSABLE_MACHINE=1";
 #else
-    std::string pattern = (std::filesystem::temp_directory_path() / "kxlprod.XXXXXX").string();
-    std::vector<char> name(pattern.begin(), pattern.end());
-    name.push_back('\0');
-    ASSERT_NE(mkdtemp(name.data()), nullptr) << "cannot create a temporary world";
-    root_ = name.data();
-    writeHostText("system.reg", "REGEDIT4\n\n");
-    writeHostText("user.reg", "REGEDIT4\n\n");
-    std::filesystem::create_directories(std::filesystem::path(root_) / "drive_c");
-    setProcessVariable("KXLSIM_ROOT", root_.c_str());
-    kxlsim::posix::resetWorldRoot();
+    ASSERT_FALSE(world_.root().empty()) << "cannot create a temporary world";
+    world_.enter();
 #endif
     started_ = true;
     resetProcess();
@@ -67,10 +52,7 @@ protected:
 #ifdef _WIN32
     SHDeleteKeyA(HKEY_LOCAL_MACHINE, "SOFTWARE\\ZAV");
 #else
-    std::error_code ignored;
-    std::filesystem::remove_all(root_, ignored);
-    setProcessVariable("KXLSIM_ROOT", nullptr);
-    kxlsim::posix::resetWorldRoot();
+    world_.leave();
 #endif
   }
 
@@ -110,7 +92,7 @@ protected:
 #ifndef _WIN32
   // Host directory of the world.
   const std::string &worldRoot() const {
-    return root_;
+    return world_.root();
   }
 #endif
 
@@ -123,11 +105,7 @@ private:
   }
 
 #ifndef _WIN32
-  void writeHostText(const char *relative, const char *text) {
-    std::ofstream out(std::filesystem::path(root_) / relative, std::ios::binary);
-    out << text;
-  }
-  std::string root_;
+  kxltestsupport::TempWorld world_{"kxlprod"};
 #endif
   bool started_ = false;
 };

@@ -4,6 +4,7 @@
 
 #include "sim/common/simfail.h"
 #include "tests/support/command_run.h"
+#include "tests/support/temp_world.h"
 
 #include <algorithm>
 #include <cstring>

@@ -3,6 +3,7 @@
 
 #include "sim/common/simfail.h"
 #include "sim/posix/world.h"
+#include "tests/support/temp_world.h"
 
 #include <gtest/gtest.h>
 
@@ -28,24 +29,11 @@ inline void writeText(const std::string &path, const std::string &text) {
 class WorldTest : public ::testing::Test {
 protected:
   void SetUp() override {
-    std::string pattern = (std::filesystem::temp_directory_path() / "kxlworldXXXXXX").string();
-    ASSERT_NE(mkdtemp(pattern.data()), nullptr);
-    root = pattern;
-    writeText(root + "/system.reg", "REGEDIT4\n\n");
-    std::filesystem::create_directories(root + "/drive_c");
-    setenv("KXLSIM_ROOT", root.c_str(), 1);
-    unsetenv("KXLSIM_FAIL");
-    posix::resetWorldRoot();
-    resetFaults();
+    ASSERT_FALSE(world_.root().empty());
+    world_.enter();
   }
-  void TearDown() override {
-    unsetenv("KXLSIM_ROOT");
-    unsetenv("KXLSIM_FAIL");
-    posix::resetWorldRoot();
-    resetFaults();
-    std::filesystem::remove_all(root);
-  }
-  std::string root;
+  kxltestsupport::TempWorld world_{"kxlworld"};
+  const std::string root = world_.root();
 };
 
 } // namespace kxlsim::testing
