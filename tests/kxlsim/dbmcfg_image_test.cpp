@@ -60,16 +60,6 @@ TEST(DbmCfgImage, ReleaseOfEachCopyVersion) {
   EXPECT_EQ(dbmReleaseForVersion(10, 1).releaseWord, 0x0D00);
 }
 
-TEST(DbmCfgImage, TemplateNamesByNodeType) {
-  EXPECT_STREQ(dbmCfgTemplateName(1), "kxlsyssv");
-  EXPECT_STREQ(dbmCfgTemplateName(2), "kxlsysrq");
-  EXPECT_STREQ(dbmCfgTemplateName(3), "kxlsyssr");
-  EXPECT_STREQ(dbmCfgTemplateName(4), "kxlsysmp");
-  EXPECT_STREQ(dbmCfgTemplateName(5), "kxlsysst");
-  EXPECT_EQ(dbmCfgTemplateName(0), nullptr);
-  EXPECT_EQ(dbmCfgTemplateName(6), nullptr);
-}
-
 // A range rule of the configuration upgrade: a value in [lo, hi] or equal to
 // `replacement` (or to `alsoKept`) is left alone.
 struct RangeRule {

@@ -62,18 +62,6 @@ protected:
   }
 };
 
-TEST_F(InstallationsTest, InstanceRecordLayoutMatchesItsReaders) {
-  EXPECT_EQ(sizeof(OSSInstanceInfo_t), 2712u);
-  EXPECT_EQ(offsetof(OSSInstanceInfo_t, instanceName), 16u);
-  EXPECT_EQ(offsetof(OSSInstanceInfo_t, instanceDir), 144u);
-  EXPECT_EQ(offsetof(OSSInstanceInfo_t, copyName), 2576u);
-  EXPECT_EQ(sizeof(sqlca), 136u);
-  EXPECT_EQ(offsetof(sqlca, sqlcode), 12u);
-  EXPECT_EQ(offsetof(sqlca, sqlerrp), 88u);
-  EXPECT_EQ(offsetof(SQLO_EXEC_RESULT, exitCode), 4u);
-  EXPECT_EQ(sizeof(OSSPathParam), 32u);
-}
-
 TEST_F(InstallationsTest, IterationListsEveryInstanceOfEveryCopyThenEnds) {
   registerInstance("KXL", "C:\\KXL8\\KXL", "");
   registerInstance("INST1", "C:\\Program Files\\KXL\\V95\\INST1", "V95");
