@@ -67,8 +67,12 @@ LONG deleteRegValue(HKEY root, const std::string &path, const char *name) {
 }
 
 bool regKeyExists(HKEY root, const std::string &path) {
+  return regKeyOpens(root, path) == ERROR_SUCCESS;
+}
+
+LONG regKeyOpens(HKEY root, const std::string &path) {
   RegKey key;
-  return RegOpenKeyExA(root, path.c_str(), 0, KEY_QUERY_VALUE, key.out()) == ERROR_SUCCESS;
+  return RegOpenKeyExA(root, path.c_str(), 0, KEY_QUERY_VALUE, key.out());
 }
 
 LONG listSubkeys(HKEY root, const std::string &path, std::vector<std::string> &names) {

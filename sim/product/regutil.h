@@ -43,6 +43,9 @@ LONG writeRegDword(HKEY root, const std::string &path, const char *name, DWORD v
 LONG deleteRegValue(HKEY root, const std::string &path, const char *name);
 
 bool regKeyExists(HKEY root, const std::string &path);
+// Whether the key opens: ERROR_SUCCESS, ERROR_FILE_NOT_FOUND when it is not
+// there, any other code when that cannot be told (never taken for either).
+LONG regKeyOpens(HKEY root, const std::string &path);
 
 // Subkey names of `root`\`path` in enumeration order. A missing key gives an
 // empty list and ERROR_SUCCESS; other failures are returned.

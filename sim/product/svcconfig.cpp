@@ -31,6 +31,13 @@ bool given(const char *text) {
   return text != nullptr && text[0] != '\0';
 }
 
+int32_t codeForRegistry(LONG rc, SQLO_SVC_OUT *out) {
+  if (rc == ERROR_SUCCESS)
+    return 0;
+  report(out, static_cast<int32_t>(rc));
+  return SQLO_RC_SYSTEM_ERROR;
+}
+
 // The key of an existing service; the code to return when there is none.
 int32_t existingServiceKey(const char *serviceName, const char *machine, std::string &key,
                            SQLO_SVC_OUT *out) {
@@ -42,11 +49,13 @@ int32_t existingServiceKey(const char *serviceName, const char *machine, std::st
     return SQLO_RC_MACHINE_UNREACHABLE;
   }
   key = kxlprod::serviceKeyPath(prefix, serviceName);
-  if (!kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, key)) {
+  // A key that cannot be read is never taken for a service that is not there.
+  LONG rc = kxlprod::regKeyOpens(HKEY_LOCAL_MACHINE, key);
+  if (rc == ERROR_FILE_NOT_FOUND) {
     report(out, ERROR_SERVICE_DOES_NOT_EXIST);
     return SQLO_RC_SVC_NOT_FOUND;
   }
-  return 0;
+  return codeForRegistry(rc, out);
 }
 
 // A value that is absent keeps its default; any other failed read is the
@@ -91,13 +100,6 @@ LONG applySettings(const std::string &key, uint32_t startType, const char *progr
     if (rc == ERROR_SUCCESS && given(value))
       rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, key, name, value);
   return rc;
-}
-
-int32_t codeForRegistry(LONG rc, SQLO_SVC_OUT *out) {
-  if (rc == ERROR_SUCCESS)
-    return 0;
-  report(out, static_cast<int32_t>(rc));
-  return SQLO_RC_SYSTEM_ERROR;
 }
 
 } // namespace
@@ -162,10 +164,13 @@ int32_t sqloRegisterNTService(const char *machine, const char *serviceName, cons
     return SQLO_RC_MACHINE_UNREACHABLE;
   }
   std::string key = kxlprod::serviceKeyPath(prefix, serviceName);
-  if (kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, key)) {
+  LONG opens = kxlprod::regKeyOpens(HKEY_LOCAL_MACHINE, key);
+  if (opens == ERROR_SUCCESS) {
     report(out, SQLO_RC_SVC_EXISTS);
     return SQLO_RC_SVC_EXISTS;
   }
+  if (opens != ERROR_FILE_NOT_FOUND)
+    return codeForRegistry(opens, out);
   // Only the start types of a program service are kept; any other value
   // (0 included) registers the service to be started on demand.
   bool serviceStart = startType >= SQLO_SVC_AUTO_START && startType <= SQLO_SVC_DISABLED;

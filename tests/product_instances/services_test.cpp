@@ -61,6 +61,13 @@ TEST_F(Services, ChangeOnAnotherMachineGoesToItsSubtree) {
   EXPECT_NE(0, sqloChangeNTServiceConfig("INST1", nullptr, SQLO_SVC_NO_CHANGE, 4, SQLO_SVC_NO_CHANGE, nullptr,
                                          nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out));
   EXPECT_EQ(getDword(std::string(kServices) + "INST1", "Start"), 2u);
+  // A service key that cannot be read is a failure, never a service that is
+  // not there (which callers may pass over).
+  failCalls("RegOpenKeyExA:1");
+  EXPECT_EQ(SQLO_RC_SYSTEM_ERROR,
+            sqloChangeNTServiceConfig("INST1", nullptr, SQLO_SVC_NO_CHANGE, 4, SQLO_SVC_NO_CHANGE, nullptr,
+                                      nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out));
+  EXPECT_EQ(getDword(std::string(kServices) + "INST1", "Start"), 2u);
 }
 
 TEST_F(Services, RegisterCreatesOnceAndReportsAnExistingService) {
