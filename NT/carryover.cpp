@@ -1,5 +1,6 @@
 #include "NT/carryover.h"
 
+#include "NT/kxliutil.h"
 #include "NT/pathjoin.h"
 #include "platform/kxlsys.h"
 
@@ -19,20 +20,32 @@ constexpr CarriedFile kCarriedFiles[] = {
 
 } // namespace
 
-void keepAuditSettings(DriverState &state) {
+StepResult keepAuditSettings(DriverState &state) {
   char instanceDir[KXL_JOINED_PATH_SZ];
   joinPath(instanceDir, state.options.profilePath, state.instanceName);
   joinPath(state.auditFile, instanceDir, "security\\kxlaudit.cfg");
   joinPath(state.auditCopyFile, instanceDir, "security\\kxlauditcopy.cfg");
-  sqlocopy(state.auditFile, state.auditCopyFile, 0);
+  int32_t rc = sqlocopy(state.auditFile, state.auditCopyFile, 0);
+  // Also a copy that stopped half way is this run's to remove.
+  state.auditCopyMade = !carriedOrAbsent(rc) || rc == 0;
+  return carriedOrAbsent(rc) ? stepDone() : stepFailed(kProbeKeepAudit, rc);
 }
 
-void putBackAuditSettings(const DriverState &state) {
-  sqlocopy(state.auditCopyFile, state.auditFile, 0);
+StepResult putBackAuditSettings(const DriverState &state) {
+  int32_t rc = sqlocopy(state.auditCopyFile, state.auditFile, 0);
+  return carriedOrAbsent(rc) ? stepDone() : stepFailed(kProbePutBackAudit, rc);
 }
 
-void dropAuditCopy(const DriverState &state) {
-  sqlodelete(state.auditCopyFile, 0);
+bool dropAuditCopy(const DriverState &state) {
+  int32_t rc = 0;
+  for (int attempt = 0; attempt < 2; ++attempt) {
+    rc = sqlodelete(state.auditCopyFile, 0);
+    if (carriedOrAbsent(rc))
+      return true;
+  }
+  pdLog(PD_LEVEL_WARNING, KXL_FN_UPGRADE_INSTANCE, kProbeAuditCopyKept, rc,
+        "the copy %s of the audit settings could not be removed", state.auditCopyFile);
+  return false;
 }
 
 // A missing file comes as an error or as a warning, a missing folder as its own code.

@@ -11,15 +11,26 @@ inline constexpr uint32_t kProbeCarryClassicCfg = 160;
 inline constexpr uint32_t kProbeCarryRsm = 170;
 inline constexpr uint32_t kProbeCarryMetadata = 180;
 
+// Trace points of the audit settings kept aside around the services step.
+inline constexpr uint32_t kProbeKeepAudit = 85;
+inline constexpr uint32_t kProbePutBackAudit = 93;
+inline constexpr uint32_t kProbeAuditCopyKept = 350; // diagnostic log only
+
 // Forms the two audit file paths under "<options' profile path>\<instance>\security"
-// and copies kxlaudit.cfg to kxlauditcopy.cfg. The file may be missing.
-void keepAuditSettings(DriverState &state);
+// and copies kxlaudit.cfg to kxlauditcopy.cfg. A missing file (auditing off)
+// needs no copy; a copy that cannot be made fails the step before the
+// services step could overwrite the settings.
+StepResult keepAuditSettings(DriverState &state);
 
-// Copies kxlauditcopy.cfg back over kxlaudit.cfg (it may be missing).
-void putBackAuditSettings(const DriverState &state);
+// Copies kxlauditcopy.cfg back over kxlaudit.cfg. No copy (none was kept)
+// leaves kxlaudit.cfg as it is; any other failure fails the step, so the
+// settings are never lost with the copy.
+StepResult putBackAuditSettings(const DriverState &state);
 
-// Deletes kxlauditcopy.cfg.
-void dropAuditCopy(const DriverState &state);
+// Deletes kxlauditcopy.cfg, a second time when the first try fails; a copy
+// that stays is named in the diagnostic log (point 350) and the upgrade
+// stands. False when it could not be removed.
+bool dropAuditCopy(const DriverState &state);
 
 // True for the copy results that mean the optional file was copied or absent.
 bool carriedOrAbsent(int32_t rc);

@@ -55,6 +55,7 @@ struct DriverState {
   char profileCopyDir[KXL_JOINED_PATH_SZ] = {}; // the instance directory's copy
   char newFunctionDir[KXL_JOINED_PATH_SZ] = {}; // the function directory's copy
   bool profilePathCreated = false;              // options.profilePath itself
+  bool auditCopyMade = false;                   // auditCopyFile, made by this call
 };
 
 // Outcome of one step: rc 0 for success, else the result and its trace point.

@@ -67,16 +67,25 @@ bool isInstanceActive(UpgradeContext &context, UpgradeOptions &options) {
 bool hasNodeTypeTemplate(UpgradeContext &, UpgradeOptions &options, uint32_t nodeType) {
   pdtEntry(KXL_FN_HAS_NODE_TYPE_TEMPLATE);
   bool found = false;
-  if (nodeType >= 1 && nodeType <= 5) {
-    char folder[KXL_JOINED_PATH_SZ], path[KXL_JOINED_PATH_SZ];
-    joinPath(folder, options.currentInstallPath, "CFG");
-    joinPath(path, folder, kTemplates[nodeType - 1]);
-    SQLO_FHANDLE handle = nullptr;
-    if (sqloopenp(path, kTemplateOpenFlags, kTemplateOpenMode, &handle, 0) == 0) {
-      sqloclose(handle);
-      found = true;
-    }
-  }
+  lookForNodeTypeTemplate(options, nodeType, found);
   pdtExit(KXL_FN_HAS_NODE_TYPE_TEMPLATE, found ? 1 : 0, 0);
   return found;
+}
+
+int32_t lookForNodeTypeTemplate(const UpgradeOptions &options, uint32_t nodeType, bool &found) {
+  found = false;
+  if (nodeType < 1 || nodeType > 5)
+    return 0;
+  char folder[KXL_JOINED_PATH_SZ], path[KXL_JOINED_PATH_SZ];
+  joinPath(folder, options.currentInstallPath, "CFG");
+  joinPath(path, folder, kTemplates[nodeType - 1]);
+  SQLO_FHANDLE handle = nullptr;
+  int32_t rc = sqloopenp(path, kTemplateOpenFlags, kTemplateOpenMode, &handle, 0);
+  if (rc == SQLO_RC_FILE_NOT_FOUND || rc == SQLO_RC_PATH_NOT_FOUND)
+    return 0;
+  if (rc != 0)
+    return rc;
+  sqloclose(handle);
+  found = true;
+  return 0;
 }

@@ -18,3 +18,7 @@ bool isInstanceActive(UpgradeContext &context, UpgradeOptions &options);
 
 // True when the current copy's template of `nodeType` (1 to 5) can be opened.
 bool hasNodeTypeTemplate(UpgradeContext &context, UpgradeOptions &options, uint32_t nodeType);
+
+// Whether the template of `nodeType` is there: 0 and `found`, or the open's
+// own failure when it could not be told (anything but a missing file).
+int32_t lookForNodeTypeTemplate(const UpgradeOptions &options, uint32_t nodeType, bool &found);

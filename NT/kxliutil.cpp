@@ -113,8 +113,7 @@ StepResult moveProfile(DriverState &state) {
 }
 
 StepResult keepAudit(DriverState &state) {
-  keepAuditSettings(state);
-  return stepDone();
+  return keepAuditSettings(state);
 }
 
 StepResult upgradeServices(DriverState &state) {
@@ -122,9 +121,11 @@ StepResult upgradeServices(DriverState &state) {
   return rc != 0 ? stepFailed(kProbeServices, rc) : stepDone();
 }
 
-// kxlauditcopy.cfg is left in place when the tool fails.
+// kxlauditcopy.cfg is left in place when the tool fails; the undo removes it.
 StepResult upgradeAudit(DriverState &state) {
-  putBackAuditSettings(state);
+  StepResult putBack = putBackAuditSettings(state);
+  if (failed(putBack))
+    return putBack;
   int32_t rc = runAuditTool();
   if (rc != 0)
     return stepFailed(kProbeAuditTool, rc);
@@ -319,13 +320,16 @@ int32_t undo(DriverState &state, const StepResult &failure) {
     complete = revertInstanceProfile(state.context, state.options) == 0 && complete;
   if (failure.rc < 0 && state.backupComplete)
     complete = restoreBackup(state) && complete;
+  // The restore copies the backup over the directory: it removes no file.
+  if (state.auditCopyMade)
+    complete = dropAuditCopy(state) && complete;
   // A copy the instance is still registered in stays where it is.
   if (dropped)
     complete = removeProfileCopies(state) && complete;
   releaseCopies(state);
   reportUndo(state, changed, complete);
   removeBackup(state);
-  removeRunRecord(state);
+  closeRunRecord(state);
   return failure.rc;
 }
 
@@ -359,7 +363,7 @@ int32_t runSteps(DriverState &state, uint32_t from) {
   }
   releaseCopies(state);
   removeBackup(state);
-  removeRunRecord(state);
+  closeRunRecord(state);
   return 0;
 }
 
@@ -392,6 +396,11 @@ KilledRunFound findKilledRun(UpgradeContext &context, const UpgradeOptions &opti
   RecordRead read = readRunRecord(path, recorded);
   if (read == RecordRead::none)
     return KilledRunFound::none;
+  // A run that ended but whose record could not be removed left nothing to take up.
+  if (read == RecordRead::read && recorded.step == kRunRecordEnded) {
+    removeRunRecordFile(path);
+    return KilledRunFound::none;
+  }
   InstallCopy *oldCopy = nullptr;
   bool usable = read == RecordRead::read && recorded.step < std::size(kSteps) &&
                 context.copies->Find(recorded.oldCopyName, &oldCopy) == 0 &&

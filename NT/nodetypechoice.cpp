@@ -3,6 +3,9 @@
 #include "NT/instfiles.h"
 #include "platform/kxlsys.h"
 
+#include <algorithm>
+#include <iterator>
+
 namespace {
 
 // After the requested type: the partitioned server first, then the other
@@ -11,14 +14,19 @@ constexpr uint32_t kFallbackOrder[] = {4, 1, 3, 5, 2};
 
 } // namespace
 
-int32_t chooseNodeType(UpgradeContext &context, UpgradeOptions &options, uint32_t requested) {
+int32_t chooseNodeType(UpgradeContext &, UpgradeOptions &options, uint32_t requested) {
   pdtEntry(KXL_FN_CHOOSE_NODE_TYPE);
-  if (hasNodeTypeTemplate(context, options, requested)) {
-    pdtExit(KXL_FN_CHOOSE_NODE_TYPE, requested, 0);
-    return static_cast<int32_t>(requested);
-  }
-  for (uint32_t nodeType : kFallbackOrder) {
-    if (hasNodeTypeTemplate(context, options, nodeType)) {
+  uint32_t order[1 + std::size(kFallbackOrder)] = {requested};
+  std::copy(std::begin(kFallbackOrder), std::end(kFallbackOrder), order + 1);
+  for (uint32_t nodeType : order) {
+    bool found = false;
+    int32_t rc = lookForNodeTypeTemplate(options, nodeType, found);
+    if (rc != 0) {
+      pdtError(KXL_FN_CHOOSE_NODE_TYPE, 20, rc);
+      pdtExit(KXL_FN_CHOOSE_NODE_TYPE, rc, 20);
+      return rc;
+    }
+    if (found) {
       pdtExit(KXL_FN_CHOOSE_NODE_TYPE, nodeType, 0);
       return static_cast<int32_t>(nodeType);
     }

@@ -1,5 +1,6 @@
 #include "NT/runrecord.h"
 
+#include "NT/kxliutil.h"
 #include "NT/pathjoin.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
@@ -175,9 +176,21 @@ bool writeRunRecord(DriverState &state) {
   return false;
 }
 
-void removeRunRecord(const DriverState &state) {
-  if (state.recordPath[0] != '\0')
-    DeleteFileA(state.recordPath);
+bool removeRunRecordFile(const char *path) {
+  for (int attempt = 0; attempt < 2; ++attempt)
+    if (DeleteFileA(path) || GetLastError() == ERROR_FILE_NOT_FOUND)
+      return true;
+  return false;
+}
+
+void closeRunRecord(DriverState &state) {
+  if (state.recordPath[0] == '\0')
+    return;
+  state.step = kRunRecordEnded;
+  writeRunRecord(state);
+  if (!removeRunRecordFile(state.recordPath))
+    pdLog(PD_LEVEL_WARNING, KXL_FN_UPGRADE_INSTANCE, kProbeRunRecord, 0,
+          "the record %s of this run, which has ended, could not be removed", state.recordPath);
 }
 
 RecordRead readRunRecord(const char *path, DriverState &state) {

@@ -22,8 +22,17 @@ void runRecordPath(char *buffer, const char *currentCopyPath, const char *instan
 // table); false when it could not be written whole (the old record stays).
 bool writeRunRecord(DriverState &state);
 
-// Removes the record of `state`'s run.
-void removeRunRecord(const DriverState &state);
+// The step of a record whose run has ended: the next run removes it and goes
+// on as usual.
+inline constexpr uint32_t kRunRecordEnded = 0xFFFFFFFFu;
+
+// Marks the record of `state`'s run as ended, then removes it (a second time
+// when the first try fails). A record that stays is named in the diagnostic
+// log; marked as ended, it makes the next run neither undo nor finish anything.
+void closeRunRecord(DriverState &state);
+
+// Removes a record file; true when it is gone.
+bool removeRunRecordFile(const char *path);
 
 enum class RecordRead { none, read, damaged };
 

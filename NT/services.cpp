@@ -28,6 +28,7 @@ constexpr const char kClusterInstanceProfile[] = "KXLINSTPROF";
 
 enum Probe : uint32_t {
   kProbeCopyName = 5,
+  kProbeNodeTemplate = 7,
   kProbeClusterName = 10,
   kProbeSaveNodes = 20,
   kProbeServiceConfig = 30,
@@ -551,6 +552,8 @@ int32_t runServicesStep(ServicesStep &step) {
     return rc;
   uint32_t workstationFlag = workstationProfileFlag();
   int32_t newNodeType = chooseNodeType(context, step.options, context.nodeType);
+  if (newNodeType < 0)
+    return traced(kProbeNodeTemplate, newNodeType);
   int32_t rc = prepareEnvironment(step);
   if (rc == 0 &&
       !formed(ossSnprintf(step.instanceName, sizeof step.instanceName, "%s", step.options.instanceName)))
