@@ -15,6 +15,8 @@ namespace {
 constexpr long long kAccessDenied = static_cast<int32_t>(0x870F0003u);
 constexpr long long kExecFailed = static_cast<int32_t>(0x870F0140u);
 constexpr long long kPathNotFound = static_cast<int32_t>(0x870F0011u);
+constexpr long long kIoError = static_cast<int32_t>(0x870F0004u);
+constexpr long long kPathTestFailed = static_cast<int32_t>(0x90000002u);
 
 // The partitions' services run under this account already.
 const std::vector<std::string> kPartitioned = {"-u", ".\\kxlsvc,secret", "INST2"};
@@ -166,6 +168,16 @@ TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
       // The forced machine's old profile key cannot be deleted or reached.
       {withArgs({"-forcecn"}, kNewAccount), "SHDeleteKeyA:2", 210, -1918},
       {withArgs({"-forcecn"}, kNewAccount), "sqloPRegMachineOpen:4", 210, -1913},
+      // A template that cannot be looked for is not a missing one (which
+      // would make the instance partitioned).
+      {{"INST1"}, "sqloopenp:6", 90, kIoError},
+      // Audit settings kept aside in the instance's own directory: never lost,
+      // and their copy never left behind.
+      {{"-p", kOldCopy, "INST1"}, "GetFileAttributesA:23", 85, kAccessDenied},
+      {{"-p", kOldCopy, "INST1"}, "sqlocopy:4", 93, kIoError},
+      {{"-install", "-p", kOldCopy, "INST1"}, "sqloexec2:1", 95, kExecFailed},
+      // A function directory that cannot be tested is neither there nor missing.
+      {{"INST1"}, "ossPathTest:5", 190, kPathTestFailed},
   };
   for (const Case &c : cases) {
     SCOPED_TRACE(std::string(c.fault) + " " + c.args.front() + " " + c.args.back());

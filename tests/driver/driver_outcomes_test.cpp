@@ -130,18 +130,24 @@ TEST_F(DriverOutcomeTest, MissingOptionalFilesAndCleanupFailureDoNotFailTheUpgra
   EXPECT_FALSE(exists(std::string(kNewInstanceDir) + "\\cfg\\kxldj.ini"));
 }
 
-// The backup goes once the instance is upgraded: a removal stopped half way
-// (a listing that failed, a removal that failed once) is tried again, and
-// only a lasting failure keeps it, named in the diagnostic log. The upgrade
-// stays completed, and a rerun finds the instance on the current copy.
-TEST_F(DriverOutcomeTest, BackupIsRemovedAfterAFailedRemoval) {
+// What a completed upgrade no longer needs goes: the backup, the copy of the
+// audit settings, the run's record. A removal stopped half way (a listing that
+// failed, a removal that failed once) is tried again, and only a lasting
+// failure keeps the leftover, named in the diagnostic log. The upgrade stays
+// completed, and a rerun finds the instance on the current copy (a record
+// that stayed is marked ended: the rerun removes it and undoes nothing).
+TEST_F(DriverOutcomeTest, LeftoversOfACompletedUpgradeAreRemovedOrNamed) {
+  const std::string auditCopy = std::string(kNewInstanceDir) + "\\security\\kxlauditcopy.cfg";
+  const std::string record = std::string(kCurrentCopy) + "\\CFG\\kxliupgrade-INST1.run";
   struct Case {
     const char *fault;
-    bool kept;
+    bool backupKept;
+    std::string fileKept; // "" none
   } cases[] = {
-      {"FindNextFileA:93", false}, // the last listing of the backup's removal
-      {"sqlodeletedir:1", false},
-      {"sqlodeletedir:1,sqlodeletedir:2", true},
+      {"FindNextFileA:93", false, ""}, // the last listing of the backup's removal
+      {"sqlodeletedir:1", false, ""},  {"sqlodeletedir:1,sqlodeletedir:2", true, ""},
+      {"sqlodelete:1", false, ""},     {"sqlodelete:1,sqlodelete:2", false, auditCopy},
+      {"DeleteFileA:8", false, ""},    {"DeleteFileA:8,DeleteFileA:9", false, record},
   };
   for (const Case &c : cases) {
     SCOPED_TRACE(c.fault);
@@ -150,10 +156,18 @@ TEST_F(DriverOutcomeTest, BackupIsRemovedAfterAFailedRemoval) {
     EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
     EXPECT_TRUE(outcome.failures.empty()) << outcome.trace;
     EXPECT_EQ(stringValue("SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1", "Copy"), "KXL101");
-    EXPECT_EQ(hasBackup(tempEntries()), c.kept);
-    EXPECT_EQ(outcome.diagnostics.find("could not be removed") != std::string::npos, c.kept)
+    EXPECT_EQ(hasBackup(tempEntries()), c.backupKept);
+    for (const std::string &file : {auditCopy, record})
+      EXPECT_EQ(exists(file), file == c.fileKept) << file;
+    bool named = c.backupKept || !c.fileKept.empty();
+    EXPECT_EQ(outcome.diagnostics.find("could not be removed") != std::string::npos, named)
         << outcome.diagnostics;
+    if (!c.fileKept.empty()) {
+      std::string name = c.fileKept.substr(c.fileKept.rfind('\\'));
+      EXPECT_NE(outcome.diagnostics.find(name), std::string::npos) << outcome.diagnostics;
+    }
     EXPECT_EQ(run({"-q", "INST1"}).exitCode, -1949 & 0xFF) << "a rerun finds it on the current copy";
+    EXPECT_FALSE(exists(record));
   }
 }
 

@@ -75,6 +75,23 @@ TEST_F(InstallationsTest, IterationListsEveryInstanceOfEveryCopyThenEnds) {
   EXPECT_EQ(found["INST2"], "\\\\SRV\\SHARE\\INST2|V101");
 }
 
+// A value that is there but cannot be read is a failure: an entry whose copy
+// could not be read is never an instance of the version-8 installation (no
+// copy), nor one that has gone since the list was opened (no directory).
+TEST_F(InstallationsTest, EntryThatCannotBeReadFailsTheIteration) {
+  const std::string key = "SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1";
+  OSSInstanceInfo_t info{};
+  for (const char *unreadable : {"Copy", "Directory"}) {
+    SCOPED_TRACE(unreadable);
+    registerInstance("INST1", "C:\\P\\INST1", "V95");
+    setDword(key, unreadable, 1);
+    uint32_t end = 0;
+    EXPECT_TRUE(allInstances(end).empty());
+    EXPECT_EQ(end, OSS_RC_FAILED);
+    EXPECT_EQ(OSS_RC_FAILED, ossGetInstanceInfo("INST1", 0, nullptr, &info, false));
+  }
+}
+
 TEST_F(InstallationsTest, EmptyRegistryEndsAtOnceAndEndIsRepeated) {
   OSSInstanceListHandle handle = nullptr;
   ASSERT_EQ(0u, ossOpenInstanceList("KXL", &handle, false, false));
