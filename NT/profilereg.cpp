@@ -172,6 +172,24 @@ void deleteCreatedKey(HKEY root, const char *path, size_t createdAt = 0) {
   }
 }
 
+enum class OldKey { deleted, putBack, bothKept };
+
+// The old key goes once it is copied. A delete that fails may have removed
+// part of it (subkeys go one by one): the copy is put back over it, so that
+// the old key is whole when the move fails. When even that fails, both keys
+// stay.
+OldKey deleteOldKey(HKEY root, const ProfileKeys &keys, const char *target) {
+  if (SHDeleteKeyA(root, keys.old) == ERROR_SUCCESS)
+    return OldKey::deleted;
+  HKEY oldKey = nullptr;
+  DWORD disposition = 0;
+  if (createKey(root, keys.old, &oldKey, &disposition) != ERROR_SUCCESS)
+    return OldKey::bothKept;
+  bool putBack = SHCopyKeyA(root, target, oldKey, 0) == ERROR_SUCCESS;
+  RegCloseKey(oldKey);
+  return putBack ? OldKey::putBack : OldKey::bothKept;
+}
+
 // In force mode the old key stays until the whole upgrade has succeeded
 // (dropForcedProfileKeys): it holds the machine's profile values, which a
 // failed upgrade must put back.
@@ -183,16 +201,19 @@ int32_t moveKey(HKEY root, const ProfileKeys &keys, bool force) {
   if (createKey(root, target, &newKey, &disposition) != ERROR_SUCCESS)
     return traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
   int32_t rc = 0;
+  bool bothKept = false;
   if (!force && !sameName(keys.old, target, kKeyPathSize)) {
-    if (SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS)
+    if (SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS) {
       rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
-    else if (SHDeleteKeyA(root, keys.old) != ERROR_SUCCESS)
+    } else if (OldKey old = deleteOldKey(root, keys, target); old != OldKey::deleted) {
       rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeDropKey, KXL_RC_PROFILE_KEY);
+      bothKept = old == OldKey::bothKept;
+    }
   }
   RegCloseKey(newKey);
   // A key this call created for a move that failed would be taken for a
-  // move; the old key is still whole. Parents that existed before stay.
-  if (rc != 0 && disposition == REG_CREATED_NEW_KEY)
+  // move; the old key is whole again. Parents that existed before stay.
+  if (rc != 0 && !bothKept && disposition == REG_CREATED_NEW_KEY)
     deleteCreatedKey(root, target, createdAt);
   return rc;
 }

@@ -168,6 +168,10 @@ TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
       // The forced machine's old profile key cannot be deleted or reached.
       {withArgs({"-forcecn"}, kNewAccount), "SHDeleteKeyA:2", 210, -1918},
       {withArgs({"-forcecn"}, kNewAccount), "sqloPRegMachineOpen:4", 210, -1913},
+      // A profile key move that fails leaves the old key whole and the keys
+      // above the new one that were there before (an empty PROFILES key).
+      {{"INST1"}, "SHCopyKeyA:1", 80, 0},
+      {{"INST1"}, "SHDeleteKeyA:1", 80, 0},
       // A template that cannot be looked for is not a missing one (which
       // would make the instance partitioned).
       {{"INST1"}, "sqloopenp:6", 90, kIoError},
