@@ -20,6 +20,7 @@ constexpr uint32_t kProbeTarget = 20;
 constexpr uint32_t kProbeNodeTypes = 30;
 constexpr uint32_t kProbeWrite = 40;
 constexpr uint32_t kProbeMemory = 50;
+constexpr uint32_t kProbePlatform = 60;
 
 using enum Converter;
 
@@ -86,6 +87,8 @@ int32_t upgradeDbmConfig(const char *targetPath, const char *sourcePath) {
   ServerInputs inputs;
   if (needsServerInputs(converter))
     inputs = readServerInputs(releaseCode(work->source.image));
+  if (inputs.platformFailure != 0)
+    return fail(kProbePlatform, inputs.platformFailure);
   if (int32_t rc = convertImages(work->target.image, work->source.image, inputs); rc != 0)
     return fail(kProbeNodeTypes, rc);
   if (int32_t rc = writeTarget(targetPath, work->target); rc != 0)

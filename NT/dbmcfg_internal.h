@@ -70,6 +70,9 @@ struct ServerInputs {
   // there is nothing to divide by (no partition table, no entry for the current
   // partition, or a sum that is not positive).
   uint32_t partitionDivisor = 0;
+  // The platform's failure to say where a parameter is (0 none): never taken
+  // for a parameter it does not know, which has no index.
+  int32_t platformFailure = 0;
 };
 // Asks the platform for what a source of this release code needs.
 ServerInputs readServerInputs(uint16_t sourceRelease);

@@ -14,12 +14,17 @@ constexpr uint32_t kTokenB = 79;
 constexpr uint32_t kExtraAgentsVariable = 253;
 constexpr int64_t kSharedHostPartitions = 2; // added when the control block's flag is set
 
-// The index of a parameter inside the flag area, or -1.
-int32_t flagIndex(uint32_t token) {
+// The index of a parameter inside the flag area, or -1 (also for a parameter
+// the platform does not know); a lookup that fails otherwise goes to `failure`.
+int32_t flagIndex(uint32_t token, int32_t &failure) {
   SQLF_PARAM_INFO info{};
   int32_t index = -1;
-  if (sqlf_get_param_info(token, 0, &info, &index) != 0)
+  int32_t rc = sqlf_get_param_info(token, 0, &info, &index);
+  if (rc != 0) {
+    if (rc != SQLO_RC_NOT_FOUND && failure == 0)
+      failure = rc;
     return -1;
+  }
   return index >= 0 && index < static_cast<int32_t>(kFlagAreaSize) ? index : -1;
 }
 
@@ -95,8 +100,8 @@ uint32_t partitionDivisor() {
 ServerInputs readServerInputs(uint16_t sourceRelease) {
   ServerInputs inputs;
   if (sourceRelease < kRelease12) {
-    inputs.flagIndex803 = flagIndex(kTokenA);
-    inputs.flagIndex79 = flagIndex(kTokenB);
+    inputs.flagIndex803 = flagIndex(kTokenA, inputs.platformFailure);
+    inputs.flagIndex79 = flagIndex(kTokenB, inputs.platformFailure);
   }
   if (sourceRelease < kRelease11)
     inputs.partitionDivisor = partitionDivisor();

@@ -81,11 +81,19 @@ bool prepareRun(const char *program, const char *argBlock, uint32_t flags, std::
   return line.size() <= kMaxCommandLine;
 }
 
+// A wait that fails is tried once more: the program is to have ended when the
+// call returns, or it would go on changing files while its caller undoes them.
+bool waitForEnd(HANDLE process) {
+  for (int attempt = 0; attempt < 2; ++attempt)
+    if (WaitForSingleObject(process, INFINITE) == WAIT_OBJECT_0)
+      return true;
+  return false;
+}
+
 int32_t waitForProgram(const PROCESS_INFORMATION &process, SQLO_EXEC_RESULT *result) {
   int32_t rc = 0;
   DWORD exitCode = 0;
-  if (WaitForSingleObject(process.hProcess, INFINITE) != WAIT_OBJECT_0 ||
-      !GetExitCodeProcess(process.hProcess, &exitCode)) {
+  if (!waitForEnd(process.hProcess) || !GetExitCodeProcess(process.hProcess, &exitCode)) {
     rc = SQLO_RC_SYSTEM_ERROR;
   }
   if (result != nullptr && rc == 0) {

@@ -184,6 +184,21 @@ TEST_F(ConvertTest, SameTypeMergeOfAnOldPartitionedSource) {
   EXPECT_EQ(2.5f, rf32(out, 3120));
 }
 
+// A flag index the platform cannot give for another reason than an unknown
+// parameter is never taken for "no flag": the conversion fails, the target
+// stays as it was.
+TEST_F(ConvertTest, ParameterLookupThatFailsFailsTheConversion) {
+  Bytes target = serverTarget().sealed();
+  Bytes out;
+  for (const char *fault : {"sqlf_get_param_info:1", "sqlf_get_param_info:2"}) {
+    SCOPED_TRACE(fault);
+    failCalls(fault);
+    EXPECT_EQ(SQLO_RC_SYSTEM_ERROR, convert(target, serverSource(4, 0x0A00).sealed(), &out));
+    failCalls("");
+    EXPECT_EQ(target, out);
+  }
+}
+
 TEST_F(ConvertTest, PartitionDivisorCases) {
   Bytes table = partitionTable();
   sqlz_krcbp->partitionTable = reinterpret_cast<const SQLO_NODELIST *>(table.data());

@@ -101,6 +101,20 @@ TEST_F(Programs, AProgramThatCannotStartIsAnError) {
   EXPECT_EQ(SQLO_RC_EXEC_FAILED, sqloexec2("argdump.exe", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
   EXPECT_EQ(0, sqloexec2("argdump.exe", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
 }
+
+// The call returns only once the program has ended: a wait that fails is
+// tried again, so that the program never goes on changing files while its
+// caller undoes them; only a wait that fails twice is an error.
+TEST_F(Programs, AFailedWaitIsTriedAgain) {
+  SQLO_EXEC_RESULT result{};
+  failCalls("WaitForSingleObject:1");
+  EXPECT_EQ(0, sqloexec2("argdump.exe -x", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
+  EXPECT_EQ(7u, result.exitCode);
+  EXPECT_EQ("-x\n", kxltest::hostFileText(dumpPath_));
+  failCalls("WaitForSingleObject:1,WaitForSingleObject:2");
+  EXPECT_NE(0, sqloexec2("argdump.exe", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
+  failCalls(nullptr);
+}
 #endif
 
 } // namespace
