@@ -5,6 +5,7 @@
 #pragma once
 
 #include "NT/pathjoin.h"
+#include "cluster/clusterstep.h"
 #include "platform/kxlsys.h"
 #include "upgrade/records.h"
 
@@ -56,6 +57,9 @@ struct DriverState {
   char newFunctionDir[KXL_JOINED_PATH_SZ] = {}; // the function directory's copy
   bool profilePathCreated = false;              // options.profilePath itself
   bool auditCopyMade = false;                   // auditCopyFile, made by this call
+
+  // What the cluster step changed, noted before each change.
+  ClusterJournal clusterJournal;
 };
 
 // Outcome of one step: rc 0 for success, else the result and its trace point.

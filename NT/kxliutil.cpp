@@ -205,7 +205,8 @@ StepResult copyFunctions(DriverState &state) {
 StepResult upgradeCluster(DriverState &state) {
   if (!state.context.instance->isClustered)
     return stepDone();
-  int32_t rc = upgradeClusterInstance(state.context, kToCurrentServerType, state.options);
+  int32_t rc = upgradeClusterInstance(state.context, kToCurrentServerType, state.options,
+                                      state.clusterJournal, [&state] { return writeRunRecord(state); });
   return rc != 0 ? stepFailed(kProbeCluster, rc) : stepDone();
 }
 
@@ -311,11 +312,15 @@ void reportUndo(DriverState &state, bool changed, bool complete) {
 int32_t undo(DriverState &state, const StepResult &failure) {
   pdtError(KXL_FN_UPGRADE_INSTANCE, failure.probe, failure.rc);
   bool recreated = state.context.recreatedNodeType != 0;
-  bool changed = recreated || state.profileMoved || state.profileCopyDir[0] != '\0';
-  // The re-creation first: it put the current copy's profile key and the
+  const ClusterJournal &cluster = state.clusterJournal;
+  bool changed = recreated || state.profileMoved || state.profileCopyDir[0] != '\0' ||
+                 cluster.typeRegistered || !cluster.resources.empty();
+  // The cluster's resources first: the last step puts back its own changes.
+  bool clusterBack = undoClusterConversion(cluster) == 0;
+  // The re-creation next: it put the current copy's profile key and the
   // services as they were after the move, which the revert then undoes.
   bool dropped = dropRecreatedInstance(state);
-  bool complete = dropped;
+  bool complete = dropped && clusterBack;
   if (state.profileMoved)
     complete = revertInstanceProfile(state.context, state.options) == 0 && complete;
   if (failure.rc < 0 && state.backupComplete)

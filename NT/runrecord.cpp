@@ -71,6 +71,8 @@ const NumberField kNumbers[] = {
      [](DriverState &s, uint32_t v) { s.backupChosen = v != 0; }},
     {"backupComplete", [](const DriverState &s) { return uint32_t(s.backupComplete); },
      [](DriverState &s, uint32_t v) { s.backupComplete = v != 0; }},
+    {"clusterTypeRegistered", [](const DriverState &s) { return uint32_t(s.clusterJournal.typeRegistered); },
+     [](DriverState &s, uint32_t v) { s.clusterJournal.typeRegistered = v != 0; }},
 };
 
 bool addLine(std::string &text, const char *key, const char *value) {
@@ -78,17 +80,6 @@ bool addLine(std::string &text, const char *key, const char *value) {
     return false;
   text.append(key).append("=").append(value).append("\n");
   return true;
-}
-
-bool recordText(DriverState &state, std::string &text) {
-  text = std::string(kHeader) + "\n";
-  bool ok = addLine(text, "step", std::to_string(state.step).c_str());
-  for (const TextField &field : kTexts)
-    ok = ok && addLine(text, field.key, field.at(state));
-  for (const NumberField &field : kNumbers)
-    ok = ok && addLine(text, field.key, std::to_string(field.get(state)).c_str());
-  text.append(kEnd).append("\n");
-  return ok;
 }
 
 bool writeWhole(const char *path, const std::string &text) {
@@ -154,6 +145,90 @@ bool parseNumber(const std::string &text, uint32_t &value) {
   return number <= 0xFFFFFFFFull;
 }
 
+// The cluster step's journal: a count, then per resource its name, group,
+// type, monitor and dependencies under keys numbered from 0.
+std::string numberedKey(const char *stem, std::size_t index) {
+  return stem + std::to_string(index);
+}
+
+std::string dependencyKey(std::size_t resource, std::size_t dependency) {
+  return numberedKey("clusterDependency", resource) + "." + std::to_string(dependency);
+}
+
+bool addNumber(std::string &text, const std::string &key, std::size_t value) {
+  return addLine(text, key.c_str(), std::to_string(value).c_str());
+}
+
+bool clusterText(const ClusterJournal &journal, std::string &text) {
+  bool ok = addNumber(text, "clusterResources", journal.resources.size());
+  for (std::size_t i = 0; ok && i < journal.resources.size(); ++i) {
+    const ClusterResourceFacts &resource = journal.resources[i];
+    ok = addLine(text, numberedKey("clusterResource", i).c_str(), resource.entry.name) &&
+         addLine(text, numberedKey("clusterGroup", i).c_str(), resource.entry.group) &&
+         addLine(text, numberedKey("clusterType", i).c_str(), resource.type) &&
+         addNumber(text, numberedKey("clusterMonitor", i), resource.separateMonitor ? 1 : 0) &&
+         addNumber(text, numberedKey("clusterDependencies", i), resource.dependencies.size());
+    for (std::size_t j = 0; ok && j < resource.dependencies.size(); ++j)
+      ok = addLine(text, dependencyKey(i, j).c_str(), resource.dependencies[j].name);
+  }
+  return ok;
+}
+
+// A text of the record into a field of `size` bytes; false when missing or too long.
+bool takeText(const std::map<std::string, std::string> &values, const std::string &key, char *field,
+              std::size_t size) {
+  auto found = values.find(key);
+  if (found == values.end() || found->second.size() >= size)
+    return false;
+  std::memcpy(field, found->second.c_str(), found->second.size() + 1);
+  return true;
+}
+
+bool takeNumber(const std::map<std::string, std::string> &values, const std::string &key, uint32_t &value) {
+  auto found = values.find(key);
+  return found != values.end() && parseNumber(found->second, value);
+}
+
+// Counts beyond this are not a record this command wrote.
+constexpr uint32_t kMaxJournalEntries = 4096;
+
+bool readClusterJournal(const std::map<std::string, std::string> &values, ClusterJournal &journal) {
+  uint32_t count = 0;
+  if (!takeNumber(values, "clusterResources", count) || count > kMaxJournalEntries)
+    return false;
+  journal.resources.assign(count, ClusterResourceFacts{});
+  for (std::size_t i = 0; i < count; ++i) {
+    ClusterResourceFacts &resource = journal.resources[i];
+    uint32_t monitor = 0, dependencies = 0;
+    resource.exists = true;
+    if (!takeText(values, numberedKey("clusterResource", i), resource.entry.name, kClusterNameChars) ||
+        !takeText(values, numberedKey("clusterGroup", i), resource.entry.group, kClusterNameChars) ||
+        !takeText(values, numberedKey("clusterType", i), resource.type, kClusterNameChars) ||
+        !takeNumber(values, numberedKey("clusterMonitor", i), monitor) || monitor > 1 ||
+        !takeNumber(values, numberedKey("clusterDependencies", i), dependencies) ||
+        dependencies > kMaxJournalEntries)
+      return false;
+    resource.separateMonitor = monitor != 0;
+    resource.dependencies.assign(dependencies, ClusterResourceEntry{});
+    for (std::size_t j = 0; j < dependencies; ++j)
+      if (!takeText(values, dependencyKey(i, j), resource.dependencies[j].name, kClusterNameChars))
+        return false;
+  }
+  return true;
+}
+
+bool recordText(DriverState &state, std::string &text) {
+  text = std::string(kHeader) + "\n";
+  bool ok = addLine(text, "step", std::to_string(state.step).c_str());
+  for (const TextField &field : kTexts)
+    ok = ok && addLine(text, field.key, field.at(state));
+  for (const NumberField &field : kNumbers)
+    ok = ok && addLine(text, field.key, std::to_string(field.get(state)).c_str());
+  ok = ok && clusterText(state.clusterJournal, text);
+  text.append(kEnd).append("\n");
+  return ok;
+}
+
 } // namespace
 
 void runRecordPath(char *buffer, const char *currentCopyPath, const char *instanceName) {
@@ -201,18 +276,17 @@ RecordRead readRunRecord(const char *path, DriverState &state) {
   std::map<std::string, std::string> values;
   if (!parseRecord(text, values) || !parseNumber(values["step"], state.step))
     return RecordRead::damaged;
-  for (const TextField &field : kTexts) {
-    auto found = values.find(field.key);
-    if (found == values.end() || found->second.size() >= field.size)
+  for (const TextField &field : kTexts)
+    if (!takeText(values, field.key, field.at(state), field.size))
       return RecordRead::damaged;
-    std::memcpy(field.at(state), found->second.c_str(), found->second.size() + 1);
-  }
   for (const NumberField &field : kNumbers) {
     uint32_t value = 0;
-    if (!parseNumber(values[field.key], value))
+    if (!takeNumber(values, field.key, value))
       return RecordRead::damaged;
     field.set(state, value);
   }
+  if (!readClusterJournal(values, state.clusterJournal))
+    return RecordRead::damaged;
   std::memcpy(state.recordPath, path, std::strlen(path) + 1);
   return RecordRead::read;
 }

@@ -24,12 +24,16 @@ constexpr size_t kPathSize = 261;
 constexpr uint32_t kProbeApi = 10;
 constexpr uint32_t kProbeType = 20;
 constexpr uint32_t kProbeName = 30;
+constexpr uint32_t kProbeNodes = 35;   // the nodes file could not be read
+constexpr uint32_t kProbeRead = 40;    // the cluster's state could not be read
+constexpr uint32_t kProbeJournal = 45; // the journal could not be saved
 constexpr uint32_t kProbeDeleteResult = 47;
 constexpr uint32_t kProbeDelete = 50;
 constexpr uint32_t kProbeGone = 60;
 constexpr uint32_t kProbeBackWithoutDependencies = 65;
 constexpr uint32_t kProbeBack = 70;
 constexpr uint32_t kProbeDependencies = 80;
+constexpr uint32_t kProbeUndo = 90; // a resource or the type could not be put back
 
 // A short ASCII constant as the cluster API's wide text.
 template <size_t N> struct Wide {
@@ -39,6 +43,11 @@ template <size_t N> struct Wide {
   }
   WCHAR chars[N];
 };
+
+const WCHAR *newTypeName() {
+  static const Wide name(kNewType);
+  return name.chars;
+}
 
 int32_t failed(uint32_t probe, int32_t rc) {
   pdtError(KXL_FN_UPGRADE_CLUSTER_INSTANCE, probe, rc);
@@ -82,6 +91,7 @@ public:
       list_ = nullptr;
     }
   }
+  bool read() const { return list_ != nullptr; }
   ~NodesFile() { std::free(list_); }
   NodesFile(const NodesFile &) = delete;
   NodesFile &operator=(const NodesFile &) = delete;
@@ -112,18 +122,26 @@ private:
   SQLO_NODELIST *list_ = nullptr;
 };
 
+enum class Membership { member, other, unreadable };
+
 // Whether a listed resource is the instance's: its name, or for a
 // partitioned instance one of its partitions' names (the nodes file read
-// afresh for each resource tested).
-bool isInstanceResource(const ClusterResourceEntry &resource, const IKXLINSTANCE &instance,
-                        const UpgradeOptions &options) {
+// afresh for each resource tested; a file that cannot be read names no
+// partition, and ends the step rather than pass the resource over).
+Membership instanceResource(const ClusterResourceEntry &resource, const IKXLINSTANCE &instance,
+                            const UpgradeOptions &options) {
   pdtEntry(KXL_FN_IS_INSTANCE_RESOURCE);
-  bool member = false;
-  if (options.partitionedInstance == 0)
-    member = sameName(resource.name, options.instanceName);
-  else
-    member = NodesFile(instance, options).namesPartition(options.instanceName, resource.name);
-  pdtExit(KXL_FN_IS_INSTANCE_RESOURCE, member ? 1 : 0, 0);
+  Membership member = Membership::other;
+  if (options.partitionedInstance == 0) {
+    member = sameName(resource.name, options.instanceName) ? Membership::member : Membership::other;
+  } else {
+    NodesFile nodes(instance, options);
+    if (!nodes.read())
+      member = Membership::unreadable;
+    else if (nodes.namesPartition(options.instanceName, resource.name))
+      member = Membership::member;
+  }
+  pdtExit(KXL_FN_IS_INSTANCE_RESOURCE, member == Membership::member ? 1 : 0, 0);
   return member;
 }
 
@@ -133,6 +151,10 @@ struct Conversion {
   const char *fromType;
   const char *toType;
 };
+
+Conversion conversionOf(MSCSUtil &cluster, int32_t toServerType) {
+  return {cluster, toServerType != 0 ? kOldType : kNewType, toServerType != 0 ? kNewType : kOldType};
+}
 
 // A handle that CreateResource returned, closed when done with.
 class CreatedResource {
@@ -148,58 +170,136 @@ private:
   HRESOURCE handle_;
 };
 
+DWORD monitorOf(const ClusterResourceFacts &resource) {
+  return resource.separateMonitor ? CLUSTER_RESOURCE_SEPARATE_MONITOR : CLUSTER_RESOURCE_DEFAULT_MONITOR;
+}
+
+bool createAs(MSCSUtil &cluster, const ClusterResourceFacts &resource, const char *type, DWORD flags) {
+  return bool(CreatedResource(
+      cluster, cluster.CreateResource(resource.entry.group, resource.entry.name, type, flags)));
+}
+
 // Puts a resource whose new-type creation failed back under its old type
-// with its dependencies.
-int32_t putBack(const Conversion &step, const ClusterResourceEntry &resource,
-                const ClusterResourceList &dependencies) {
-  CreatedResource back(step.cluster,
-                       step.cluster.CreateResource(resource.group, resource.name, step.fromType));
-  if (!back)
+// with its monitor and dependencies.
+int32_t putBack(const Conversion &step, const ClusterResourceFacts &resource) {
+  if (!createAs(step.cluster, resource, step.fromType, monitorOf(resource)))
     return failed(kProbeGone, CLUSTER_RC_NOT_RECREATED);
-  if (step.cluster.AddResourceDependencies(resource.name, dependencies) != 0)
+  if (step.cluster.AddResourceDependencies(resource.entry.name, resource.dependencies) != 0)
     return failed(kProbeBackWithoutDependencies, CLUSTER_RC_NOT_RECREATED);
   return failed(kProbeBack, CLUSTER_RC_NOT_CONVERTED);
 }
 
 // Deletes one resource and creates it anew under the new type, in its group,
 // with the dependencies it had.
-int32_t convert(const Conversion &step, const ClusterResourceEntry &resource) {
-  ClusterResourceList dependencies = step.cluster.GetResourceDependencies(resource.name);
-  int32_t deleted = step.cluster.DeleteResource(resource.name);
+int32_t convert(const Conversion &step, const ClusterResourceFacts &resource) {
+  int32_t deleted = step.cluster.DeleteResource(resource.entry.name);
   if (deleted != 0) {
     pdtError(KXL_FN_UPGRADE_CLUSTER_INSTANCE, kProbeDeleteResult, deleted);
     return failed(kProbeDelete, CLUSTER_RC_NOT_DELETED);
   }
-  CreatedResource created(step.cluster,
-                          step.cluster.CreateResource(resource.group, resource.name, step.toType));
-  if (!created)
-    return putBack(step, resource, dependencies);
-  if (step.cluster.AddResourceDependencies(resource.name, dependencies) != 0)
+  if (!createAs(step.cluster, resource, step.toType, CLUSTER_RESOURCE_SEPARATE_MONITOR))
+    return putBack(step, resource);
+  if (step.cluster.AddResourceDependencies(resource.entry.name, resource.dependencies) != 0)
     return failed(kProbeDependencies, CLUSTER_RC_NOT_CONVERTED);
   return 0;
 }
 
-int32_t convertInstanceResources(MSCSUtil &cluster, const UpgradeContext &context, int32_t toServerType,
-                                 const UpgradeOptions &options) {
-  if (cluster.LoadClusterApi() != 0)
-    return failed(kProbeApi, CLUSTER_RC_NO_API);
-  static const Wide newType(kNewType);
+// Whether `now` holds the first of `all`'s dependencies, in their order: the
+// rest can then be added to give them all in order.
+bool isPrefix(const ClusterResourceList &now, const ClusterResourceList &all) {
+  if (now.size() > all.size())
+    return false;
+  for (std::size_t i = 0; i < now.size(); ++i)
+    if (!sameName(now[i].name, all[i].name))
+      return false;
+  return true;
+}
+
+// Brings a journaled resource, in whatever state a killed run or a failure
+// left it, to `type` in its group with every dependency it had, in order. A
+// resource of another type, or whose dependencies are not the first of its
+// own in order, is deleted and created anew.
+int32_t settle(MSCSUtil &cluster, const ClusterResourceFacts &recorded, const char *type, DWORD flags) {
+  ClusterResourceFacts now;
+  if (cluster.ReadResource(recorded.entry.name, now) != 0)
+    return failed(kProbeRead, CLUSTER_RC_NOT_CONVERTED);
+  bool fits = std::strcmp(now.type, type) == 0 && isPrefix(now.dependencies, recorded.dependencies);
+  if (now.exists && !fits) {
+    if (cluster.DeleteResource(recorded.entry.name) != 0)
+      return failed(kProbeDelete, CLUSTER_RC_NOT_DELETED);
+    now = ClusterResourceFacts{};
+  }
+  if (!now.exists && !createAs(cluster, recorded, type, flags))
+    return failed(kProbeGone, CLUSTER_RC_NOT_RECREATED);
+  ClusterResourceList missing(recorded.dependencies.begin() + std::ptrdiff_t(now.dependencies.size()),
+                              recorded.dependencies.end());
+  if (cluster.AddResourceDependencies(recorded.entry.name, missing) != 0)
+    return failed(kProbeDependencies, CLUSTER_RC_NOT_CONVERTED);
+  return 0;
+}
+
+// Registers the new type, noting first in the journal when this run is the
+// one that registers it.
+int32_t registerNewType(MSCSUtil &cluster, ClusterJournal &journal, const ClusterJournalSave &save) {
   static const Wide newTypeDll(kNewTypeDll);
-  if (cluster.CreateResourceType(newType.chars, newType.chars, newTypeDll.chars, kLooksAlivePollMs,
+  int32_t registered = cluster.ResourceTypeExists(newTypeName());
+  if (registered < 0)
+    return failed(kProbeType, CLUSTER_RC_NOT_CONVERTED);
+  if (registered == 0 && !journal.typeRegistered) {
+    journal.typeRegistered = true;
+    if (!save())
+      return failed(kProbeJournal, CLUSTER_RC_NOT_CONVERTED);
+  }
+  if (cluster.CreateResourceType(newTypeName(), newTypeName(), newTypeDll.chars, kLooksAlivePollMs,
                                  kIsAlivePollMs) != 0)
     return failed(kProbeType, CLUSTER_RC_NOT_CONVERTED);
+  return 0;
+}
+
+// The facts of a listed resource of the instance, noted in the journal
+// before the resource is touched.
+int32_t noteResource(const Conversion &step, const ClusterResourceEntry &resource, ClusterJournal &journal,
+                     const ClusterJournalSave &save) {
+  ClusterResourceFacts facts;
+  // Listed as of the from type a moment ago: anything else is a failed read.
+  if (step.cluster.IsResourceOfType(resource.name, step.fromType) == 0 ||
+      step.cluster.ReadResource(resource.name, facts) != 0 || !facts.exists)
+    return failed(kProbeRead, CLUSTER_RC_NOT_CONVERTED);
+  journal.resources.push_back(facts);
+  if (!save())
+    return failed(kProbeJournal, CLUSTER_RC_NOT_CONVERTED);
+  return 0;
+}
+
+int32_t convertInstanceResources(MSCSUtil &cluster, const UpgradeContext &context, int32_t toServerType,
+                                 const UpgradeOptions &options, ClusterJournal &journal,
+                                 const ClusterJournalSave &save) {
+  if (cluster.LoadClusterApi() != 0)
+    return failed(kProbeApi, CLUSTER_RC_NO_API);
+  if (int32_t rc = registerNewType(cluster, journal, save); rc != 0)
+    return rc;
   char name[kInstanceNameSize] = {};
   if (context.instance == nullptr || context.instance->GetName(name, sizeof name) != 0)
     return failed(kProbeName, CLUSTER_RC_NOT_CONVERTED);
   pdtData1(KXL_FN_UPGRADE_CLUSTER_INSTANCE, kProbeName, PD_TYPE_STRING, sizeof name, name);
 
-  Conversion step{cluster, toServerType != 0 ? kOldType : kNewType, toServerType != 0 ? kNewType : kOldType};
-  for (const ClusterResourceEntry &resource : cluster.GetResourcesOfType(step.fromType)) {
-    if (!isInstanceResource(resource, *context.instance, options) ||
-        cluster.IsResourceOfType(resource.name, step.fromType) == 0)
+  Conversion step = conversionOf(cluster, toServerType);
+  // What an earlier, killed run had begun is finished first.
+  for (const ClusterResourceFacts &resource : journal.resources)
+    if (int32_t rc = settle(cluster, resource, step.toType, CLUSTER_RESOURCE_SEPARATE_MONITOR); rc != 0)
+      return rc;
+  ClusterResourceList resources;
+  if (cluster.GetResourcesOfType(step.fromType, resources) != 0)
+    return failed(kProbeRead, CLUSTER_RC_NOT_CONVERTED);
+  for (const ClusterResourceEntry &resource : resources) {
+    Membership member = instanceResource(resource, *context.instance, options);
+    if (member == Membership::unreadable)
+      return failed(kProbeNodes, CLUSTER_RC_NOT_CONVERTED);
+    if (member == Membership::other)
       continue;
-    int32_t rc = convert(step, resource);
-    if (rc != 0)
+    if (int32_t rc = noteResource(step, resource, journal, save); rc != 0)
+      return rc;
+    if (int32_t rc = convert(step, journal.resources.back()); rc != 0)
       return rc;
   }
   return 0;
@@ -207,11 +307,32 @@ int32_t convertInstanceResources(MSCSUtil &cluster, const UpgradeContext &contex
 
 } // namespace
 
-int32_t upgradeClusterInstance(UpgradeContext &context, int32_t toServerType, UpgradeOptions &options) {
+int32_t upgradeClusterInstance(UpgradeContext &context, int32_t toServerType, UpgradeOptions &options,
+                               ClusterJournal &journal, const ClusterJournalSave &save) {
   pdtEntry(KXL_FN_UPGRADE_CLUSTER_INSTANCE);
   // Owned for exactly the step's duration: the modules are freed on every way out.
   MSCSUtil cluster;
-  int32_t rc = convertInstanceResources(cluster, context, toServerType, options);
+  int32_t rc = convertInstanceResources(cluster, context, toServerType, options, journal, save);
   pdtExit(KXL_FN_UPGRADE_CLUSTER_INSTANCE, rc, 0);
   return rc;
+}
+
+int32_t upgradeClusterInstance(UpgradeContext &context, int32_t toServerType, UpgradeOptions &options) {
+  ClusterJournal journal;
+  return upgradeClusterInstance(context, toServerType, options, journal, [] { return true; });
+}
+
+int32_t undoClusterConversion(const ClusterJournal &journal) {
+  if (!journal.typeRegistered && journal.resources.empty())
+    return 0;
+  MSCSUtil cluster;
+  if (cluster.LoadClusterApi() != 0)
+    return failed(kProbeUndo, -1);
+  int32_t rc = 0;
+  for (auto resource = journal.resources.rbegin(); resource != journal.resources.rend(); ++resource)
+    if (settle(cluster, *resource, resource->type, monitorOf(*resource)) != 0)
+      rc = -1;
+  if (journal.typeRegistered && cluster.DeleteResourceType(newTypeName()) != 0)
+    rc = -1;
+  return rc != 0 ? failed(kProbeUndo, rc) : 0;
 }

@@ -1,5 +1,8 @@
 #include "cluster/mscsutil.h"
 
+#include <algorithm>
+#include <cstring>
+#include <iterator>
 #include <string>
 
 namespace {
@@ -44,9 +47,13 @@ bool toWide(const char *text, WCHAR *out, int capacity) {
   return false;
 }
 
-void toNarrow(const WCHAR *text, char *out, int capacity) {
-  if (WideCharToMultiByte(CP_ACP, 0, text, -1, out, capacity, nullptr, nullptr) == 0)
-    out[0] = 0;
+// False (and `out` empty) when the text cannot be converted: a name that
+// could not be read, never an empty one.
+bool toNarrow(const WCHAR *text, char *out, int capacity) {
+  if (WideCharToMultiByte(CP_ACP, 0, text, -1, out, capacity, nullptr, nullptr) != 0)
+    return true;
+  out[0] = 0;
+  return false;
 }
 
 // Length of a wide string held in `capacity` characters; `capacity` when unterminated.
@@ -69,17 +76,77 @@ bool copyName(WCHAR *field, const WCHAR *name, size_t nameCapacity) {
   return true;
 }
 
-ClusterResourceEntry makeEntry(const WCHAR *name, const WCHAR *group) {
-  ClusterResourceEntry entry;
+// An entry of both forms of a name and its group; false when either cannot be converted.
+bool makeEntry(const WCHAR *name, const WCHAR *group, ClusterResourceEntry &entry) {
+  entry = ClusterResourceEntry{};
   copyName(entry.wideName, name, kClusterNameChars);
   copyName(entry.wideGroup, group, kClusterNameChars);
-  toNarrow(entry.wideName, entry.name, kClusterNameChars);
-  toNarrow(entry.wideGroup, entry.group, kClusterNameChars);
-  return entry;
+  bool named = toNarrow(entry.wideName, entry.name, kClusterNameChars);
+  return (toNarrow(entry.wideGroup, entry.group, kClusterNameChars) || group[0] == 0) && named;
 }
 
 bool sameText(const WCHAR *left, const WCHAR *right) {
   return std::basic_string_view<WCHAR>(left) == std::basic_string_view<WCHAR>(right);
+}
+
+WCHAR foldAscii(WCHAR c) {
+  return c >= 'A' && c <= 'Z' ? static_cast<WCHAR>(c - 'A' + 'a') : c;
+}
+
+// Cluster object names compare ignoring case.
+bool sameName(const WCHAR *left, const WCHAR *right) {
+  for (; *left != 0 && foldAscii(*left) == foldAscii(*right); ++left, ++right) {
+  }
+  return foldAscii(*left) == foldAscii(*right);
+}
+
+// Reads one DWORD of a property list at `at`, moving past it; false past the end.
+bool takeDword(const std::vector<unsigned char> &list, size_t &at, DWORD &value) {
+  if (list.size() < 4 || at > list.size() - 4)
+    return false;
+  value = DWORD(list[at]) | DWORD(list[at + 1]) << 8 | DWORD(list[at + 2]) << 16 | DWORD(list[at + 3]) << 24;
+  at += 4;
+  return true;
+}
+
+// Skips a value of `bytes` bytes padded to whole DWORDs; false past the end.
+bool skipPadded(const std::vector<unsigned char> &list, size_t &at, DWORD bytes) {
+  size_t padded = (size_t(bytes) + 3) / 4 * 4;
+  if (padded > list.size() - at)
+    return false;
+  at += padded;
+  return true;
+}
+
+// The DWORD property `wanted` of a property list; false when the list does not hold it.
+bool dwordProperty(const std::vector<unsigned char> &list, const char16_t *wanted, DWORD &value) {
+  size_t at = 0;
+  DWORD count = 0;
+  if (!takeDword(list, at, count))
+    return false;
+  for (DWORD i = 0; i < count; ++i) {
+    DWORD syntax = 0, bytes = 0;
+    if (!takeDword(list, at, syntax) || syntax != CLUSPROP_SYNTAX_NAME || !takeDword(list, at, bytes))
+      return false;
+    size_t nameAt = at;
+    if (!skipPadded(list, at, bytes))
+      return false;
+    std::u16string name(bytes / 2, u'\0');
+    std::memcpy(name.data(), list.data() + nameAt, name.size() * 2);
+    name.resize(std::char_traits<char16_t>::length(name.c_str()));
+    DWORD valueSyntax = 0, valueBytes = 0;
+    if (!takeDword(list, at, valueSyntax) || !takeDword(list, at, valueBytes))
+      return false;
+    size_t valueAt = at;
+    if (!skipPadded(list, at, valueBytes))
+      return false;
+    if (name == wanted && valueSyntax == CLUSPROP_SYNTAX_LIST_VALUE_DWORD && valueBytes == 4)
+      return takeDword(list, valueAt, value);
+    DWORD endMark = 0;
+    if (!takeDword(list, at, endMark) || endMark != CLUSPROP_SYNTAX_ENDMARK)
+      return false;
+  }
+  return false;
 }
 
 } // namespace
@@ -163,48 +230,152 @@ int32_t MSCSUtil::CreateResourceType(LPCWSTR typeName, LPCWSTR displayName, LPCW
   return rc == ERROR_SUCCESS || rc == kAlreadyExists ? 0 : -1;
 }
 
-ClusterResourceList MSCSUtil::GetResourcesOfType(const char *typeName) {
-  ClusterResourceList found;
-  WCHAR wideType[kClusterNameChars];
-  if (!toWide(typeName, wideType, kClusterNameChars) || !IsNodeRunning())
-    return found;
+int32_t MSCSUtil::ResourceTypeExists(LPCWSTR typeName) {
   Opened cluster(openCluster(nullptr), closeCluster);
   if (!cluster)
-    return found;
-  Opened listing(clusterOpenEnum(cluster.get(), CLUSTER_ENUM_RESOURCE), clusterCloseEnum);
-  if (!listing)
-    return found;
-  WCHAR name[kClusterNameChars];
-  DWORD objectType = 0;
-  // Any failure ends the listing, a name too long for an entry included.
-  for (DWORD index = 0;; ++index) {
-    DWORD size = kClusterNameChars;
-    if (clusterEnum(listing.get(), index, &objectType, name, &size) != ERROR_SUCCESS)
-      break;
-    AppendIfOfType(cluster.get(), name, wideType, found);
-  }
-  return found;
+    return -1;
+  Opened listing(clusterResourceTypeOpenEnum(cluster.get(), typeName, CLUSTER_RESOURCE_TYPE_ENUM_NODES),
+                 clusterResourceTypeCloseEnum);
+  if (listing)
+    return 1;
+  return GetLastError() == ERROR_RESOURCE_TYPE_NOT_FOUND ? 0 : -1;
 }
 
-void MSCSUtil::AppendIfOfType(HCLUSTER cluster, const WCHAR *name, const WCHAR *wideType,
+int32_t MSCSUtil::DeleteResourceType(LPCWSTR typeName) {
+  Opened cluster(openCluster(nullptr), closeCluster);
+  if (!cluster)
+    return -1;
+  DWORD rc = deleteClusterResourceType(cluster.get(), typeName);
+  return rc == ERROR_SUCCESS || rc == ERROR_RESOURCE_TYPE_NOT_FOUND ? 0 : -1;
+}
+
+template <typename Visit> bool MSCSUtil::ForEachResource(HCLUSTER cluster, Visit visit) {
+  Opened listing(clusterOpenEnum(cluster, CLUSTER_ENUM_RESOURCE), clusterCloseEnum);
+  if (!listing)
+    return false;
+  WCHAR name[kClusterNameChars];
+  DWORD objectType = 0;
+  for (DWORD index = 0;; ++index) {
+    DWORD size = kClusterNameChars;
+    DWORD rc = clusterEnum(listing.get(), index, &objectType, name, &size);
+    if (rc == ERROR_NO_MORE_ITEMS)
+      return true;
+    if (rc == ERROR_MORE_DATA)
+      continue; // no resource of the upgrade has such a name
+    if (rc != ERROR_SUCCESS)
+      return false;
+    if (!visit(name))
+      return true;
+  }
+}
+
+int32_t MSCSUtil::GetResourcesOfType(const char *typeName, ClusterResourceList &found) {
+  found.clear();
+  WCHAR wideType[kClusterNameChars];
+  if (!toWide(typeName, wideType, kClusterNameChars) || !IsNodeRunning())
+    return -1;
+  Opened cluster(openCluster(nullptr), closeCluster);
+  if (!cluster)
+    return -1;
+  bool read = true;
+  bool listed = ForEachResource(cluster.get(), [&](const WCHAR *name) {
+    read = AppendIfOfType(cluster.get(), name, wideType, found);
+    return read;
+  });
+  return listed && read ? 0 : -1;
+}
+
+bool MSCSUtil::ReadType(HRESOURCE resource, WCHAR (&type)[kClusterNameChars]) {
+  std::fill(std::begin(type), std::end(type), WCHAR(0));
+  DWORD returned = 0;
+  if (clusterResourceControl(resource, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type,
+                             sizeof type, &returned) != ERROR_SUCCESS)
+    return false;
+  type[kClusterNameChars - 1] = 0;
+  return true;
+}
+
+bool MSCSUtil::ReadGroup(HRESOURCE resource, WCHAR (&group)[kClusterNameChars]) {
+  std::fill(std::begin(group), std::end(group), WCHAR(0));
+  DWORD groupSize = kClusterNameChars;
+  if (getClusterResourceState(resource, nullptr, nullptr, group, &groupSize) == ClusterResourceStateUnknown)
+    return false;
+  group[kClusterNameChars - 1] = 0;
+  return true;
+}
+
+bool MSCSUtil::ReadSeparateMonitor(HRESOURCE resource, bool &separate) {
+  std::vector<unsigned char> properties(kLongNameChars);
+  DWORD returned = 0;
+  DWORD rc = clusterResourceControl(resource, nullptr, CLUSCTL_RESOURCE_GET_COMMON_PROPERTIES, nullptr, 0,
+                                    properties.data(), DWORD(properties.size()), &returned);
+  if (rc == ERROR_MORE_DATA) {
+    properties.resize(returned);
+    rc = clusterResourceControl(resource, nullptr, CLUSCTL_RESOURCE_GET_COMMON_PROPERTIES, nullptr, 0,
+                                properties.data(), DWORD(properties.size()), &returned);
+  }
+  DWORD value = 0;
+  if (rc != ERROR_SUCCESS || returned > properties.size())
+    return false;
+  properties.resize(returned);
+  if (!dwordProperty(properties, u"SeparateMonitor", value))
+    return false;
+  separate = value != 0;
+  return true;
+}
+
+bool MSCSUtil::AppendIfOfType(HCLUSTER cluster, const WCHAR *name, const WCHAR *wideType,
                               ClusterResourceList &found) {
   Opened resource(openClusterResource(cluster, name), closeClusterResource);
-  if (!resource)
-    return;
-  WCHAR type[kClusterNameChars] = {};
-  DWORD returned = 0;
-  // A type that cannot be read matches nothing.
-  if (clusterResourceControl(resource.get(), nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type,
-                             sizeof type, &returned) != ERROR_SUCCESS)
-    return;
-  type[kClusterNameChars - 1] = 0;
+  WCHAR type[kClusterNameChars];
+  if (!resource || !ReadType(resource.get(), type))
+    return false;
   if (!sameText(type, wideType))
-    return;
-  WCHAR group[kClusterNameChars] = {};
-  DWORD groupSize = kClusterNameChars;
-  getClusterResourceState(resource.get(), nullptr, nullptr, group, &groupSize);
-  group[kClusterNameChars - 1] = 0;
-  found.push_back(makeEntry(name, group));
+    return true;
+  WCHAR group[kClusterNameChars];
+  if (!ReadGroup(resource.get(), group))
+    return false;
+  ClusterResourceEntry entry;
+  if (!makeEntry(name, group, entry))
+    return false;
+  found.push_back(entry);
+  return true;
+}
+
+int32_t MSCSUtil::IsListed(HCLUSTER cluster, const WCHAR *name) {
+  bool listed = false;
+  if (!ForEachResource(cluster, [&](const WCHAR *listedAs) {
+        listed = sameName(listedAs, name);
+        return !listed;
+      }))
+    return -1;
+  return listed ? 1 : 0;
+}
+
+int32_t MSCSUtil::ReadResource(const char *name, ClusterResourceFacts &facts) {
+  facts = ClusterResourceFacts{};
+  WCHAR wideName[kClusterNameChars];
+  if (!toWide(name, wideName, kClusterNameChars) || !IsNodeRunning())
+    return -1;
+  Opened cluster(openCluster(nullptr), closeCluster);
+  if (!cluster)
+    return -1;
+  int32_t listed = IsListed(cluster.get(), wideName);
+  if (listed < 0)
+    return -1;
+  facts.exists = listed == 1;
+  return !facts.exists || ReadListedResource(cluster.get(), wideName, facts) ? 0 : -1;
+}
+
+bool MSCSUtil::ReadListedResource(HCLUSTER cluster, const WCHAR *name, ClusterResourceFacts &facts) {
+  Opened resource(openClusterResource(cluster, name), closeClusterResource);
+  WCHAR type[kClusterNameChars], group[kClusterNameChars];
+  if (!resource || !ReadType(resource.get(), type) || !ReadGroup(resource.get(), group) ||
+      !ReadSeparateMonitor(resource.get(), facts.separateMonitor))
+    return false;
+  if (!toNarrow(type, facts.type, kClusterNameChars) || !makeEntry(name, group, facts.entry))
+    return false;
+  return GetResourceDependencies(facts.entry.name, facts.dependencies) == 0;
 }
 
 int32_t MSCSUtil::IsResourceOfType(const char *name, const char *typeName) {
@@ -222,33 +393,39 @@ int32_t MSCSUtil::IsResourceOfType(const char *name, const char *typeName) {
   return resUtilResourceTypesEqual(wideType, resource.get()) ? 1 : 0;
 }
 
-ClusterResourceList MSCSUtil::GetResourceDependencies(const char *name) {
-  ClusterResourceList dependencies;
+int32_t MSCSUtil::GetResourceDependencies(const char *name, ClusterResourceList &dependencies) {
+  dependencies.clear();
   WCHAR wideName[kClusterNameChars];
   if (!toWide(name, wideName, kClusterNameChars))
-    return dependencies;
+    return -1;
   Opened cluster(openCluster(nullptr), closeCluster);
   if (!cluster)
-    return dependencies;
+    return -1;
   Opened resource(openClusterResource(cluster.get(), wideName), closeClusterResource);
   if (!resource)
-    return dependencies;
+    return -1;
   Opened listing(clusterResourceOpenEnum(resource.get(), CLUSTER_RESOURCE_ENUM_DEPENDS),
                  clusterResourceCloseEnum);
   if (!listing)
-    return dependencies;
+    return -1;
   WCHAR dependency[kLongNameChars];
   static const WCHAR noGroup[1] = {0};
   DWORD type = 0;
   for (DWORD index = 0;; ++index) {
     DWORD size = kLongNameChars;
-    if (clusterResourceEnum(listing.get(), index, &type, dependency, &size) != ERROR_SUCCESS)
-      break;
+    DWORD rc = clusterResourceEnum(listing.get(), index, &type, dependency, &size);
+    if (rc == ERROR_NO_MORE_ITEMS)
+      return 0;
+    if (rc != ERROR_SUCCESS)
+      return -1;
     // A name longer than an entry holds is left out rather than cut into another name.
-    if (boundedLength(dependency, kLongNameChars) < static_cast<size_t>(kClusterNameChars))
-      dependencies.push_back(makeEntry(dependency, noGroup));
+    if (boundedLength(dependency, kLongNameChars) >= static_cast<size_t>(kClusterNameChars))
+      continue;
+    ClusterResourceEntry entry;
+    if (!makeEntry(dependency, noGroup, entry))
+      return -1;
+    dependencies.push_back(entry);
   }
-  return dependencies;
 }
 
 int32_t MSCSUtil::DeleteResource(const char *name) {
@@ -267,7 +444,8 @@ int32_t MSCSUtil::DeleteResource(const char *name) {
   return deleteClusterResource(resource.get()) == ERROR_SUCCESS ? 0 : -1;
 }
 
-HRESOURCE MSCSUtil::CreateResource(const char *groupName, const char *name, const char *typeName) {
+HRESOURCE MSCSUtil::CreateResource(const char *groupName, const char *name, const char *typeName,
+                                   DWORD flags) {
   WCHAR wideGroup[kClusterNameChars];
   WCHAR wideName[kClusterNameChars];
   WCHAR wideType[kClusterNameChars];
@@ -280,7 +458,7 @@ HRESOURCE MSCSUtil::CreateResource(const char *groupName, const char *name, cons
   Opened group(openClusterGroup(cluster.get(), wideGroup), closeClusterGroup);
   if (!group)
     return nullptr;
-  return createClusterResource(group.get(), wideName, wideType, CLUSTER_RESOURCE_SEPARATE_MONITOR);
+  return createClusterResource(group.get(), wideName, wideType, flags);
 }
 
 void MSCSUtil::CloseResource(HRESOURCE resource) {
@@ -299,11 +477,19 @@ int32_t MSCSUtil::AddResourceDependencies(const char *name, const ClusterResourc
     return -1;
   int32_t result = 0;
   for (const ClusterResourceEntry &entry : dependencies) {
+    // By the narrow name, which every entry has (a journal read back holds no other).
     WCHAR dependencyName[kClusterNameChars];
-    copyName(dependencyName, entry.wideName, kClusterNameChars);
-    Opened dependency(openClusterResource(cluster.get(), dependencyName), closeClusterResource);
-    if (!dependency)
+    if (!toWide(entry.name, dependencyName, kClusterNameChars)) {
+      result = -1;
       continue;
+    }
+    Opened dependency(openClusterResource(cluster.get(), dependencyName), closeClusterResource);
+    // A dependency that is gone is passed over; one the cluster still lists is not.
+    if (!dependency) {
+      if (IsListed(cluster.get(), dependencyName) != 0)
+        result = -1;
+      continue;
+    }
     if (addClusterResourceDependency(resource.get(), dependency.get()) != ERROR_SUCCESS)
       result = -1;
   }

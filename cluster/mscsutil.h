@@ -25,6 +25,16 @@ struct ClusterResourceEntry {
 
 using ClusterResourceList = std::vector<ClusterResourceEntry>;
 
+// What the cluster holds of one resource: whether it is listed and, when it
+// is, its type, its group (in `entry`), its monitor and its dependencies.
+struct ClusterResourceFacts {
+  bool exists = false;
+  ClusterResourceEntry entry;
+  char type[kClusterNameChars] = {};
+  bool separateMonitor = false;
+  ClusterResourceList dependencies;
+};
+
 class MSCSUtil {
 public:
   MSCSUtil() = default;
@@ -40,17 +50,30 @@ public:
   // Registers a resource type; one that already exists counts as registered. 0 or -1.
   int32_t CreateResourceType(LPCWSTR typeName, LPCWSTR displayName, LPCWSTR dllName, DWORD looksAlivePollMs,
                              DWORD isAlivePollMs);
-  // The resources whose type name is exactly `typeName`, in enumeration order.
-  ClusterResourceList GetResourcesOfType(const char *typeName);
+  // Whether a resource type is registered: 1 or 0; -1 when that cannot be told.
+  int32_t ResourceTypeExists(LPCWSTR typeName);
+  // Unregisters a resource type that no resource uses; one that is not
+  // registered counts as removed. 0 or -1.
+  int32_t DeleteResourceType(LPCWSTR typeName);
+  // The resources whose type name is exactly `typeName`, in enumeration order
+  // (a name too long for an entry is passed over). 0, or -1 when the listing
+  // or a listed resource's type or group cannot be read.
+  int32_t GetResourcesOfType(const char *typeName, ClusterResourceList &found);
   // Nonzero when resource `name` is of type `typeName`.
   int32_t IsResourceOfType(const char *name, const char *typeName);
-  // The resources `name` depends on, in enumeration order, with empty groups.
-  ClusterResourceList GetResourceDependencies(const char *name);
+  // The resources `name` depends on, in enumeration order, with empty groups;
+  // a name longer than an entry holds is left out. 0, or -1 when the resource
+  // or its listing cannot be read.
+  int32_t GetResourceDependencies(const char *name, ClusterResourceList &dependencies);
+  // Reads resource `name` (its name ignoring case): not listed gives 0 with
+  // `facts.exists` false. -1 when the listing or any fact cannot be read.
+  int32_t ReadResource(const char *name, ClusterResourceFacts &facts);
   // Deletes a resource; one that cannot be opened counts as deleted. 0 or -1.
   int32_t DeleteResource(const char *name);
-  // Creates a resource in its own monitor: its open handle, or null. The
-  // caller releases a non-null handle with CloseResource.
-  HRESOURCE CreateResource(const char *groupName, const char *name, const char *typeName);
+  // Creates a resource, in its own monitor unless `flags` say otherwise: its
+  // open handle, or null. The caller releases a non-null handle with CloseResource.
+  HRESOURCE CreateResource(const char *groupName, const char *name, const char *typeName,
+                           DWORD flags = CLUSTER_RESOURCE_SEPARATE_MONITOR);
   // Releases a handle that CreateResource returned.
   void CloseResource(HRESOURCE resource);
   // Makes `name` depend on each listed resource that can be opened. 0, or -1
@@ -102,6 +125,17 @@ private:
   bool BindClusapi();
   bool BindResutils();
   bool IsNodeRunning();
-  // Appends resource `name` to `found` when its type name is exactly `wideType`.
-  void AppendIfOfType(HCLUSTER cluster, const WCHAR *name, const WCHAR *wideType, ClusterResourceList &found);
+  // Appends resource `name` to `found` when its type name is exactly
+  // `wideType`; false when its type or group cannot be read.
+  bool AppendIfOfType(HCLUSTER cluster, const WCHAR *name, const WCHAR *wideType, ClusterResourceList &found);
+  // Calls `visit` for each resource name the cluster lists (a name too long
+  // for an entry passed over) until it returns false; false when the listing fails.
+  template <typename Visit> bool ForEachResource(HCLUSTER cluster, Visit visit);
+  bool ReadListedResource(HCLUSTER cluster, const WCHAR *name, ClusterResourceFacts &facts);
+  // Whether the cluster lists resource `name` (ignoring case): 1 or 0; -1 when the listing fails.
+  int32_t IsListed(HCLUSTER cluster, const WCHAR *name);
+  // A resource's type name, its group's name and its monitor; false when not read.
+  bool ReadType(HRESOURCE resource, WCHAR (&type)[kClusterNameChars]);
+  bool ReadGroup(HRESOURCE resource, WCHAR (&group)[kClusterNameChars]);
+  bool ReadSeparateMonitor(HRESOURCE resource, bool &separate);
 };

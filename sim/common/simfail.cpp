@@ -41,6 +41,7 @@ FaultPlan &thePlan() {
   return *plan;
 }
 std::atomic<bool> inactive{false}; // loaded, and nothing to fail, kill or count
+thread_local int serviceDepth = 0; // inside a simulated service's entry point
 
 // One "name:n" entry; malformed entries (no name, n not a positive number) are ignored.
 void addEntry(const std::string &entry, CallPlan &into) {
@@ -128,8 +129,8 @@ struct CallFate {
 };
 
 // Counts the call and tells whether it is to fail or to be killed.
-CallFate countCall(const char *name) {
-  if (inactive || name == nullptr)
+CallFate countCall(const char *name, bool hook) {
+  if (inactive || name == nullptr || (serviceDepth > 0 && !hook))
     return {};
   std::lock_guard<std::mutex> lock(planMutex);
   if (!thePlan().loaded)
@@ -147,19 +148,27 @@ void killNow() {
 }
 
 bool shouldFail(const char *functionName) {
-  CallFate fate = countCall(functionName);
+  CallFate fate = countCall(functionName, false);
   if (fate.kill)
     killNow();
   return fate.fail;
 }
 
 void killPoint(const char *hookName) {
-  if (countCall(hookName).kill)
+  if (countCall(hookName, true).kill)
     killNow();
 }
 
 bool killDue(const char *hookName) {
-  return countCall(hookName).kill;
+  return countCall(hookName, true).kill;
+}
+
+ServiceCall::ServiceCall(const char *entryPoint) : failing_(shouldFail(entryPoint)) {
+  ++serviceDepth;
+}
+
+ServiceCall::~ServiceCall() {
+  --serviceDepth;
 }
 
 void resetFaults() {

@@ -38,6 +38,23 @@ void killPoint(const char *hookName);
 bool killDue(const char *hookName);
 [[noreturn]] void killNow();
 
+// One call of an entry point of a simulated system service (the cluster),
+// counted and failed as the entry point. While it runs, the platform
+// functions the service calls on its own behalf are neither counted nor
+// failed: on Windows they run in the service's process, out of reach of the
+// command's faults. Hooks (kill points) still count.
+class ServiceCall {
+public:
+  explicit ServiceCall(const char *entryPoint);
+  ~ServiceCall();
+  ServiceCall(const ServiceCall &) = delete;
+  ServiceCall &operator=(const ServiceCall &) = delete;
+  bool failing() const { return failing_; }
+
+private:
+  bool failing_;
+};
+
 // Clears the call counters and re-reads the settings (for tests that change them).
 void resetFaults();
 

@@ -95,25 +95,49 @@ bool readMultiString(HKEY root, const std::string &path, const char *value, std:
   return true;
 }
 
-LONG writeString(HKEY root, const std::string &path, const char *value, const std::string &data) {
-  return writeRaw(root, path, value, REG_SZ, data + '\0');
+KeyValue stringValue(const char *name, const std::string &data) {
+  return {name, REG_SZ, data + '\0'};
 }
 
-LONG writeDword(HKEY root, const std::string &path, const char *value, DWORD data) {
+KeyValue dwordValue(const char *name, DWORD data) {
   std::string bytes(4, '\0');
   for (int i = 0; i < 4; ++i)
     bytes[static_cast<size_t>(i)] = static_cast<char>((data >> (8 * i)) & 0xFF);
-  return writeRaw(root, path, value, REG_DWORD, bytes);
+  return {name, REG_DWORD, bytes};
 }
 
-LONG writeMultiString(HKEY root, const std::string &path, const char *value,
-                      const std::vector<std::string> &data) {
+KeyValue multiStringValue(const char *name, const std::vector<std::string> &data) {
   std::string bytes;
   for (const std::string &item : data)
     bytes += item + '\0';
   bytes += '\0';
-  return writeRaw(root, path, value, REG_MULTI_SZ, bytes);
+  return {name, REG_MULTI_SZ, bytes};
 }
+
+LONG writeString(HKEY root, const std::string &path, const char *value, const std::string &data) {
+  KeyValue v = stringValue(value, data);
+  return writeRaw(root, path, value, v.type, v.data);
+}
+
+LONG writeDword(HKEY root, const std::string &path, const char *value, DWORD data) {
+  KeyValue v = dwordValue(value, data);
+  return writeRaw(root, path, value, v.type, v.data);
+}
+
+LONG writeMultiString(HKEY root, const std::string &path, const char *value,
+                      const std::vector<std::string> &data) {
+  KeyValue v = multiStringValue(value, data);
+  return writeRaw(root, path, value, v.type, v.data);
+}
+
+#ifdef _WIN32
+LONG writeKey(HKEY root, const std::string &path, const std::vector<KeyValue> &values) {
+  for (const KeyValue &value : values)
+    if (LONG rc = writeRaw(root, path, value.name.c_str(), value.type, value.data); rc != ERROR_SUCCESS)
+      return rc;
+  return ERROR_SUCCESS;
+}
+#endif
 
 std::vector<std::string> subkeys(HKEY root, const std::string &path) {
   std::vector<std::string> names;

@@ -36,6 +36,22 @@ LONG writeString(HKEY root, const std::string &path, const char *value, const st
 LONG writeDword(HKEY root, const std::string &path, const char *value, DWORD data);
 LONG writeMultiString(HKEY root, const std::string &path, const char *value,
                       const std::vector<std::string> &data);
+// One value of a key written whole by writeKey: its name, type and raw data.
+struct KeyValue {
+  std::string name;
+  DWORD type = REG_NONE;
+  std::string data;
+};
+KeyValue stringValue(const char *name, const std::string &data);
+KeyValue dwordValue(const char *name, DWORD data);
+KeyValue multiStringValue(const char *name, const std::vector<std::string> &data);
+
+// Creates the key at `path` (or keeps it) and sets `values` in one change of
+// the simulated machine's registry: another process, or a kill, sees all of
+// them or none, as with the cluster service's own database on Windows. In the
+// Windows build, where the store is the system's, value by value.
+LONG writeKey(HKEY root, const std::string &path, const std::vector<KeyValue> &values);
+
 // Names of the subkeys, in the registry's order.
 std::vector<std::string> subkeys(HKEY root, const std::string &path);
 // Name and data of every string value, in the registry's order.

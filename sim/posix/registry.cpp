@@ -7,6 +7,7 @@
 #include "platform/win32.h"
 #include "sim/common/simfail.h"
 #include "sim/posix/regfile.h"
+#include "sim/posix/reghelp.h"
 #include "sim/posix/world.h"
 
 #include <cstring>
@@ -259,6 +260,27 @@ bool injectedFailure(const char *function) {
 }
 
 } // namespace
+
+// One change of the hive: the key (created when missing) and every value.
+LONG reg::writeKey(HKEY root, const std::string &path, const std::vector<KeyValue> &values) {
+  std::lock_guard<std::recursive_mutex> lock(registryMutex);
+  OpenKey base, target;
+  if (LONG rc = resolveSubKey(root, path.c_str(), 0, base, target); rc != ERROR_SUCCESS)
+    return rc;
+  for (const KeyValue &value : values)
+    if (!isStorableName(value.name))
+      return ERROR_INVALID_PARAMETER;
+  return hiveFile(target.hiveId).change([&](const hive::Key &root, hive::Change &change) -> LONG {
+    if (LONG rc = checkBase(root, base); rc != ERROR_SUCCESS)
+      return rc;
+    if (hive::findKey(root, target.path) == nullptr)
+      change.createKey(target.path);
+    for (const KeyValue &value : values)
+      change.setValue(target.path,
+                      {value.name, value.type, std::vector<BYTE>(value.data.begin(), value.data.end())});
+    return ERROR_SUCCESS;
+  });
+}
 
 } // namespace kxlsim::posix
 

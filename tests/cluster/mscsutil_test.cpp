@@ -152,13 +152,23 @@ protected:
     ClusterResourceList out;
     for (const char *name : list) {
       ClusterResourceEntry entry;
-      for (size_t i = 0; name[i] != 0; ++i)
-        entry.wideName[i] = static_cast<unsigned char>(name[i]);
+      std::snprintf(entry.name, sizeof entry.name, "%s", name);
       out.push_back(entry);
     }
     return out;
   }
   void stopNode() { setDword(kCluster, "NodeState", 3); }
+  // What a listing gave ("name@group" each), or "failed" when it reported a failure.
+  std::vector<std::string> ofType(const char *type) {
+    ClusterResourceList found;
+    return util.GetResourcesOfType(type, found) == 0 ? names(found) : std::vector<std::string>{"failed"};
+  }
+  std::vector<std::string> dependenciesOf(const char *name) {
+    ClusterResourceList found;
+    return util.GetResourceDependencies(name, found) == 0 ? names(found) : std::vector<std::string>{"failed"};
+  }
+  const std::vector<std::string> failed{"failed"};
+  const std::vector<std::string> none;
 
   ProbedMSCSUtil util;
 };
@@ -222,15 +232,16 @@ TEST_F(ClusterOps, RegistersATypeOnceAndOnlyOnARunningNode) {
 }
 
 TEST_F(ClusterOps, ListsResourcesOfExactlyTheTypeInEnumerationOrder) {
-  ClusterResourceList found = util.GetResourcesOfType("KXL Server");
+  ClusterResourceList found;
+  ASSERT_EQ(util.GetResourcesOfType("KXL Server", found), 0);
   EXPECT_EQ(names(found), (std::vector<std::string>{"A-inst@G2", "C-inst@G1"}))
       << "a type differing only in case is not listed";
   ASSERT_EQ(found.size(), 2u);
   EXPECT_EQ(std::u16string(found[1].wideName), u"C-inst");
   EXPECT_EQ(std::u16string(found[1].wideGroup), u"G1");
-  EXPECT_TRUE(util.GetResourcesOfType("No Type").empty());
+  EXPECT_EQ(ofType("No Type"), none);
   stopNode();
-  EXPECT_TRUE(util.GetResourcesOfType("KXL Server").empty());
+  EXPECT_EQ(ofType("KXL Server"), failed);
 }
 
 TEST_F(ClusterOps, TestsTheTypeOfAResource) {
@@ -244,14 +255,15 @@ TEST_F(ClusterOps, TestsTheTypeOfAResource) {
 TEST_F(ClusterOps, ListsDependenciesWithEmptyGroupsAndLeavesOutOverlongNames) {
   const std::string overlong(70, 'x');
   setDependsOn("C-inst", std::string("B-disk\0", 7) + overlong + std::string("\0A-inst\0\0", 9));
-  EXPECT_EQ(names(util.GetResourceDependencies("C-inst")), (std::vector<std::string>{"B-disk@", "A-inst@"}));
-  ClusterResourceList dependencies = util.GetResourceDependencies("C-inst");
+  EXPECT_EQ(dependenciesOf("C-inst"), (std::vector<std::string>{"B-disk@", "A-inst@"}));
+  ClusterResourceList dependencies;
+  ASSERT_EQ(util.GetResourceDependencies("C-inst", dependencies), 0);
   ASSERT_FALSE(dependencies.empty());
   EXPECT_EQ(dependencies[0].wideGroup[0], 0);
-  EXPECT_TRUE(util.GetResourceDependencies("B-disk").empty());
-  EXPECT_TRUE(util.GetResourceDependencies("Missing").empty());
+  EXPECT_EQ(dependenciesOf("B-disk"), none);
+  EXPECT_EQ(dependenciesOf("Missing"), failed);
   stopNode();
-  EXPECT_TRUE(util.GetResourceDependencies("C-inst").empty()) << "no cluster to open";
+  EXPECT_EQ(dependenciesOf("C-inst"), failed) << "no cluster to open";
 }
 
 TEST_F(ClusterOps, DeletesResourcesAndCountsAMissingOneAsDeleted) {
@@ -286,24 +298,25 @@ TEST_F(ClusterOps, CreatesResourcesInTheirOwnMonitor) {
 TEST_F(ClusterOps, AddsEachDependencyThatCanBeOpenedAndReportsFailedOnes) {
   EXPECT_EQ(util.AddResourceDependencies("C-inst", {}), 0);
   EXPECT_EQ(util.AddResourceDependencies("C-inst", entries({"B-disk", "Gone", "D-case"})), 0);
-  EXPECT_EQ(names(util.GetResourceDependencies("C-inst")), (std::vector<std::string>{"B-disk@", "D-case@"}));
+  EXPECT_EQ(dependenciesOf("C-inst"), (std::vector<std::string>{"B-disk@", "D-case@"}));
   // C-inst would close a cycle; D-case -> B-disk still goes in.
   EXPECT_EQ(util.AddResourceDependencies("D-case", entries({"C-inst", "B-disk"})), -1);
-  EXPECT_EQ(names(util.GetResourceDependencies("D-case")), (std::vector<std::string>{"B-disk@"}));
+  EXPECT_EQ(dependenciesOf("D-case"), (std::vector<std::string>{"B-disk@"}));
   EXPECT_EQ(util.AddResourceDependencies("A-inst", entries({"B-disk"})), -1) << "B-disk is in another group";
-  EXPECT_TRUE(util.GetResourceDependencies("A-inst").empty());
+  EXPECT_EQ(dependenciesOf("A-inst"), none);
   EXPECT_EQ(util.AddResourceDependencies("Missing", entries({"B-disk"})), -1);
-  EXPECT_EQ(util.AddResourceDependencies("C-inst", util.GetResourceDependencies("C-inst")), -1)
-      << "each already exists";
+  ClusterResourceList dependencies;
+  ASSERT_EQ(util.GetResourceDependencies("C-inst", dependencies), 0);
+  EXPECT_EQ(util.AddResourceDependencies("C-inst", dependencies), -1) << "each already exists";
 }
 
 TEST_F(ClusterOps, FailedOpensLeaveNoHandleOpen) {
   failCalls("OpenCluster:1,OpenCluster:2,OpenCluster:3,OpenCluster:4,OpenCluster:5,OpenCluster:6,"
             "OpenCluster:7");
   EXPECT_EQ(util.CreateResourceType(u"T", u"T", u"t.dll", 1, 1), -1);
-  EXPECT_TRUE(util.GetResourcesOfType("KXL Server").empty());
+  EXPECT_EQ(ofType("KXL Server"), failed);
   EXPECT_EQ(util.IsResourceOfType("C-inst", "KXL Server"), 0);
-  EXPECT_TRUE(util.GetResourceDependencies("C-inst").empty());
+  EXPECT_EQ(dependenciesOf("C-inst"), failed);
   EXPECT_EQ(util.DeleteResource("C-inst"), -1);
   EXPECT_EQ(util.CreateResource("G1", "X", "KXL Server"), nullptr);
   EXPECT_EQ(util.AddResourceDependencies("C-inst", entries({"B-disk"})), -1);
@@ -311,17 +324,55 @@ TEST_F(ClusterOps, FailedOpensLeaveNoHandleOpen) {
   EXPECT_TRUE(liveHandles().empty());
 
   failCalls("ClusterOpenEnum:1,ClusterResourceOpenEnum:1,OpenClusterResource:2,OpenClusterGroup:1");
-  EXPECT_TRUE(util.GetResourcesOfType("KXL Server").empty());
+  EXPECT_EQ(ofType("KXL Server"), failed);
   setDependsOn("C-inst", std::string("B-disk\0\0", 8));
-  EXPECT_TRUE(util.GetResourceDependencies("C-inst").empty());
+  EXPECT_EQ(dependenciesOf("C-inst"), failed);
   EXPECT_EQ(util.AddResourceDependencies("C-inst", entries({"A-inst"})), -1);
   EXPECT_EQ(util.CreateResource("G1", "X", "KXL Server"), nullptr);
   EXPECT_TRUE(liveHandles().empty());
 }
 
-TEST_F(ClusterOps, AResourceWhoseTypeCannotBeReadIsNotListed) {
-  failCalls("ClusterResourceControl:1");
-  EXPECT_EQ(names(util.GetResourcesOfType("KXL Server")), (std::vector<std::string>{"C-inst@G1"}));
+// A failed read is reported, never taken for a value: a listing cut short, a
+// type or group that cannot be read, a name that cannot be converted.
+TEST_F(ClusterOps, ReadsThatFailAreReported) {
+  for (const char *plan : {"ClusterResourceControl:1", "ClusterEnum:2", "GetClusterResourceState:1",
+                           "OpenClusterResource:1", "WideCharToMultiByte:1"}) {
+    failCalls(plan);
+    EXPECT_EQ(ofType("KXL Server"), failed) << plan;
+  }
+  setDependsOn("C-inst", std::string("B-disk\0\0", 8));
+  for (const char *plan : {"ClusterResourceEnum:1", "WideCharToMultiByte:1"}) {
+    failCalls(plan);
+    EXPECT_EQ(dependenciesOf("C-inst"), failed) << plan;
+  }
+  ClusterResourceFacts facts;
+  for (const char *plan : {"ClusterEnum:1", "ClusterResourceControl:2", "OpenClusterResource:1"}) {
+    failCalls(plan);
+    EXPECT_EQ(util.ReadResource("C-inst", facts), -1) << plan;
+  }
+  failCalls("OpenClusterResource:2");
+  EXPECT_EQ(util.AddResourceDependencies("D-case", entries({"B-disk"})), -1)
+      << "a listed dependency that cannot be opened is not passed over";
+}
+
+// The facts the journal keeps: type, group, monitor and dependencies; a
+// resource the cluster does not list reads as absent.
+TEST_F(ClusterOps, ReadsAResourceWhole) {
+  setDependsOn("C-inst", std::string("B-disk\0\0", 8));
+  setDword(kResources + "C-inst", "SeparateMonitor", 1);
+  ClusterResourceFacts facts;
+  ASSERT_EQ(util.ReadResource("c-INST", facts), 0);
+  EXPECT_TRUE(facts.exists);
+  EXPECT_STREQ(facts.type, "KXL Server");
+  EXPECT_STREQ(facts.entry.group, "G1");
+  EXPECT_TRUE(facts.separateMonitor);
+  EXPECT_EQ(names(facts.dependencies), (std::vector<std::string>{"B-disk@"}));
+  ASSERT_EQ(util.ReadResource("Missing", facts), 0);
+  EXPECT_FALSE(facts.exists);
+  EXPECT_EQ(util.ResourceTypeExists(u"KXL Server"), 1);
+  EXPECT_EQ(util.ResourceTypeExists(u"No Type"), 0);
+  EXPECT_EQ(util.DeleteResourceType(u"Physical Disk"), -1) << "B-disk is of that type";
+  EXPECT_EQ(util.DeleteResourceType(u"No Type"), 0);
 }
 
 // The step asked for the old type converts the other way: the instance's
@@ -337,7 +388,7 @@ TEST_F(ClusterOps, StepConvertsBackWhenAskedForTheOldType) {
   EXPECT_EQ(upgradeClusterInstance(context, 0, options), 0);
   context.instance = nullptr;
   EXPECT_EQ(getString(kResources + "C-inst", "Type"), "KXL");
-  EXPECT_EQ(names(util.GetResourceDependencies("C-inst")), (std::vector<std::string>{"B-disk@"}));
+  EXPECT_EQ(dependenciesOf("C-inst"), (std::vector<std::string>{"B-disk@"}));
   EXPECT_EQ(getString(kResources + "A-inst", "Type"), "KXL Server");
   EXPECT_TRUE(keyExists(kCluster + "\\ResourceTypes\\KXL Server"));
 }

@@ -215,12 +215,39 @@ DWORD controlText(const std::string &text, LPVOID out, DWORD capacity, LPDWORD r
                       returned);
 }
 
+void appendDword(std::string &list, DWORD value) {
+  for (int i = 0; i < 4; ++i)
+    list.push_back(static_cast<char>((value >> (8 * i)) & 0xFF));
+}
+
+// The common properties of a resource as a property list: the count, then
+// each property's name and value, each entry padded to whole DWORDs and the
+// property closed by an end mark. Only "SeparateMonitor" is kept.
+DWORD commonProperties(const std::string &resource, LPVOID out, DWORD capacity, LPDWORD returned) {
+  DWORD separate = 0;
+  reg::readDword(HKEY_LOCAL_MACHINE, resourceKey(resource), "SeparateMonitor", separate);
+  std::u16string name = u"SeparateMonitor";
+  std::string list;
+  appendDword(list, 1);
+  appendDword(list, CLUSPROP_SYNTAX_NAME);
+  DWORD nameBytes = static_cast<DWORD>((name.size() + 1) * sizeof(char16_t));
+  appendDword(list, nameBytes);
+  list.append(reinterpret_cast<const char *>(name.c_str()), nameBytes);
+  list.append((4 - nameBytes % 4) % 4, '\0');
+  appendDword(list, CLUSPROP_SYNTAX_LIST_VALUE_DWORD);
+  appendDword(list, sizeof(DWORD));
+  appendDword(list, separate);
+  appendDword(list, CLUSPROP_SYNTAX_ENDMARK);
+  return copyOutBytes(list.data(), static_cast<DWORD>(list.size()), out, capacity, returned);
+}
+
 } // namespace
 
 KXL_MODULE_ENTRY_POINTS(clusapi)
 
 DWORD WINAPI MoveClusterGroup(HGROUP hGroup, HNODE hDestinationNode) {
-  if (kxlsim::shouldFail("MoveClusterGroup"))
+  kxlsim::ServiceCall call("MoveClusterGroup");
+  if (call.failing())
     return ERROR_CLUSTER_NODE_NOT_FOUND;
   GroupObject *group = liveGroup(hGroup);
   if (group == nullptr)
@@ -234,7 +261,8 @@ DWORD WINAPI MoveClusterGroup(HGROUP hGroup, HNODE hDestinationNode) {
 }
 
 HCLUSTER WINAPI OpenCluster(LPCWSTR lpszClusterName) {
-  if (kxlsim::shouldFail("OpenCluster"))
+  kxlsim::ServiceCall call("OpenCluster");
+  if (call.failing())
     return failWith(RPC_S_SERVER_UNAVAILABLE, HCLUSTER{nullptr});
   std::string name, clusterName;
   if (lpszClusterName != nullptr) {
@@ -249,25 +277,29 @@ HCLUSTER WINAPI OpenCluster(LPCWSTR lpszClusterName) {
 }
 
 BOOL WINAPI CloseCluster(HCLUSTER hCluster) {
-  if (kxlsim::shouldFail("CloseCluster"))
+  kxlsim::ServiceCall call("CloseCluster");
+  if (call.failing())
     return failWith(ERROR_INVALID_HANDLE, FALSE);
   return closeObject<ClusterObject>(asHandle(hCluster));
 }
 
 HGROUP WINAPI OpenClusterGroup(HCLUSTER hCluster, LPCWSTR lpszGroupName) {
-  if (kxlsim::shouldFail("OpenClusterGroup"))
+  kxlsim::ServiceCall call("OpenClusterGroup");
+  if (call.failing())
     return failWith(ERROR_GROUP_NOT_FOUND, HGROUP{nullptr});
   return openNamed<HGROUP, GroupObject>(hCluster, lpszGroupName, kGroupsKey, ERROR_GROUP_NOT_FOUND);
 }
 
 BOOL WINAPI CloseClusterGroup(HGROUP hGroup) {
-  if (kxlsim::shouldFail("CloseClusterGroup"))
+  kxlsim::ServiceCall call("CloseClusterGroup");
+  if (call.failing())
     return failWith(ERROR_INVALID_HANDLE, FALSE);
   return closeObject<GroupObject>(asHandle(hGroup));
 }
 
 HNODE WINAPI OpenClusterNode(HCLUSTER hCluster, LPCWSTR lpszNodeName) {
-  if (kxlsim::shouldFail("OpenClusterNode"))
+  kxlsim::ServiceCall call("OpenClusterNode");
+  if (call.failing())
     return failWith(ERROR_CLUSTER_NODE_NOT_FOUND, HNODE{nullptr});
   std::string name;
   if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
@@ -284,13 +316,15 @@ HNODE WINAPI OpenClusterNode(HCLUSTER hCluster, LPCWSTR lpszNodeName) {
 }
 
 BOOL WINAPI CloseClusterNode(HNODE hNode) {
-  if (kxlsim::shouldFail("CloseClusterNode"))
+  kxlsim::ServiceCall call("CloseClusterNode");
+  if (call.failing())
     return failWith(ERROR_INVALID_HANDLE, FALSE);
   return closeObject<NodeObject>(asHandle(hNode));
 }
 
 HCLUSENUM WINAPI ClusterOpenEnum(HCLUSTER hCluster, DWORD dwType) {
-  if (kxlsim::shouldFail("ClusterOpenEnum"))
+  kxlsim::ServiceCall call("ClusterOpenEnum");
+  if (call.failing())
     return failWith(ERROR_NOT_ENOUGH_MEMORY, HCLUSENUM{nullptr});
   if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
     return failWith(ERROR_INVALID_HANDLE, HCLUSENUM{nullptr});
@@ -308,19 +342,22 @@ HCLUSENUM WINAPI ClusterOpenEnum(HCLUSTER hCluster, DWORD dwType) {
 
 DWORD WINAPI ClusterEnum(HCLUSENUM hEnum, DWORD dwIndex, LPDWORD lpdwType, LPWSTR lpszName,
                          LPDWORD lpcchName) {
-  if (kxlsim::shouldFail("ClusterEnum"))
+  kxlsim::ServiceCall call("ClusterEnum");
+  if (call.failing())
     return ERROR_NOT_ENOUGH_MEMORY;
   return enumerate(asHandle(hEnum), EnumKind::Cluster, dwIndex, lpdwType, lpszName, lpcchName);
 }
 
 DWORD WINAPI ClusterCloseEnum(HCLUSENUM hEnum) {
-  if (kxlsim::shouldFail("ClusterCloseEnum"))
+  kxlsim::ServiceCall call("ClusterCloseEnum");
+  if (call.failing())
     return ERROR_INVALID_HANDLE;
   return closeEnumeration(asHandle(hEnum), EnumKind::Cluster);
 }
 
 CLUSTER_GROUP_STATE WINAPI GetClusterGroupState(HGROUP hGroup, LPWSTR lpszNodeName, LPDWORD lpcchNodeName) {
-  if (kxlsim::shouldFail("GetClusterGroupState"))
+  kxlsim::ServiceCall call("GetClusterGroupState");
+  if (call.failing())
     return failWith(ERROR_INVALID_HANDLE, ClusterGroupStateUnknown);
   GroupObject *group = liveGroup(hGroup);
   if (group == nullptr)
@@ -334,7 +371,8 @@ CLUSTER_GROUP_STATE WINAPI GetClusterGroupState(HGROUP hGroup, LPWSTR lpszNodeNa
 }
 
 HGROUPENUM WINAPI ClusterGroupOpenEnum(HGROUP hGroup, DWORD dwType) {
-  if (kxlsim::shouldFail("ClusterGroupOpenEnum"))
+  kxlsim::ServiceCall call("ClusterGroupOpenEnum");
+  if (call.failing())
     return failWith(ERROR_NOT_ENOUGH_MEMORY, HGROUPENUM{nullptr});
   GroupObject *group = liveGroup(hGroup);
   if (group == nullptr)
@@ -349,20 +387,23 @@ HGROUPENUM WINAPI ClusterGroupOpenEnum(HGROUP hGroup, DWORD dwType) {
 
 DWORD WINAPI ClusterGroupEnum(HGROUPENUM hGroupEnum, DWORD dwIndex, LPDWORD lpdwType, LPWSTR lpszResourceName,
                               LPDWORD lpcchName) {
-  if (kxlsim::shouldFail("ClusterGroupEnum"))
+  kxlsim::ServiceCall call("ClusterGroupEnum");
+  if (call.failing())
     return ERROR_NOT_ENOUGH_MEMORY;
   return enumerate(asHandle(hGroupEnum), EnumKind::Group, dwIndex, lpdwType, lpszResourceName, lpcchName);
 }
 
 DWORD WINAPI ClusterGroupCloseEnum(HGROUPENUM hGroupEnum) {
-  if (kxlsim::shouldFail("ClusterGroupCloseEnum"))
+  kxlsim::ServiceCall call("ClusterGroupCloseEnum");
+  if (call.failing())
     return ERROR_INVALID_HANDLE;
   return closeEnumeration(asHandle(hGroupEnum), EnumKind::Group);
 }
 
 DWORD WINAPI ClusterResourceControl(HRESOURCE hResource, HNODE, DWORD dwControlCode, LPVOID, DWORD,
                                     LPVOID lpOutBuffer, DWORD cbOutBufferSize, LPDWORD lpBytesReturned) {
-  if (kxlsim::shouldFail("ClusterResourceControl"))
+  kxlsim::ServiceCall call("ClusterResourceControl");
+  if (call.failing())
     return ERROR_RESOURCE_NOT_FOUND;
   if (lpBytesReturned != nullptr)
     *lpBytesReturned = 0;
@@ -374,13 +415,16 @@ DWORD WINAPI ClusterResourceControl(HRESOURCE hResource, HNODE, DWORD dwControlC
     return controlText(resourceField(resource->name, "Type"), lpOutBuffer, cbOutBufferSize, lpBytesReturned);
   case CLUSCTL_RESOURCE_GET_NAME:
     return controlText(resource->name, lpOutBuffer, cbOutBufferSize, lpBytesReturned);
+  case CLUSCTL_RESOURCE_GET_COMMON_PROPERTIES:
+    return commonProperties(resource->name, lpOutBuffer, cbOutBufferSize, lpBytesReturned);
   default:
     return ERROR_INVALID_FUNCTION;
   }
 }
 
 DWORD WINAPI OnlineClusterGroup(HGROUP hGroup, HNODE) {
-  if (kxlsim::shouldFail("OnlineClusterGroup"))
+  kxlsim::ServiceCall call("OnlineClusterGroup");
+  if (call.failing())
     return ERROR_INVALID_HANDLE;
   GroupObject *group = liveGroup(hGroup);
   if (group == nullptr)
@@ -390,7 +434,8 @@ DWORD WINAPI OnlineClusterGroup(HGROUP hGroup, HNODE) {
 }
 
 DWORD WINAPI OfflineClusterGroup(HGROUP hGroup) {
-  if (kxlsim::shouldFail("OfflineClusterGroup"))
+  kxlsim::ServiceCall call("OfflineClusterGroup");
+  if (call.failing())
     return ERROR_INVALID_HANDLE;
   GroupObject *group = liveGroup(hGroup);
   if (group == nullptr)
@@ -400,7 +445,8 @@ DWORD WINAPI OfflineClusterGroup(HGROUP hGroup) {
 }
 
 DWORD WINAPI DeleteClusterGroup(HGROUP hGroup) {
-  if (kxlsim::shouldFail("DeleteClusterGroup"))
+  kxlsim::ServiceCall call("DeleteClusterGroup");
+  if (call.failing())
     return ERROR_INVALID_HANDLE;
   GroupObject *group = liveGroup(hGroup);
   if (group == nullptr)
@@ -412,7 +458,8 @@ DWORD WINAPI DeleteClusterGroup(HGROUP hGroup) {
 }
 
 HRESENUM WINAPI ClusterResourceOpenEnum(HRESOURCE hResource, DWORD dwType) {
-  if (kxlsim::shouldFail("ClusterResourceOpenEnum"))
+  kxlsim::ServiceCall call("ClusterResourceOpenEnum");
+  if (call.failing())
     return failWith(ERROR_NOT_ENOUGH_MEMORY, HRESENUM{nullptr});
   ResourceObject *resource = liveResource(hResource);
   if (resource == nullptr)
@@ -429,13 +476,15 @@ HRESENUM WINAPI ClusterResourceOpenEnum(HRESOURCE hResource, DWORD dwType) {
 
 DWORD WINAPI ClusterResourceEnum(HRESENUM hResEnum, DWORD dwIndex, LPDWORD lpdwType, LPWSTR lpszName,
                                  LPDWORD lpcchName) {
-  if (kxlsim::shouldFail("ClusterResourceEnum"))
+  kxlsim::ServiceCall call("ClusterResourceEnum");
+  if (call.failing())
     return ERROR_NOT_ENOUGH_MEMORY;
   return enumerate(asHandle(hResEnum), EnumKind::Resource, dwIndex, lpdwType, lpszName, lpcchName);
 }
 
 DWORD WINAPI AddClusterResourceDependency(HRESOURCE hResource, HRESOURCE hDependsOn) {
-  if (kxlsim::shouldFail("AddClusterResourceDependency"))
+  kxlsim::ServiceCall call("AddClusterResourceDependency");
+  if (call.failing())
     return ERROR_RESOURCE_NOT_FOUND;
   ResourceObject *resource = liveResource(hResource);
   ResourceObject *provider = resource == nullptr ? nullptr : liveResource(hDependsOn);
@@ -456,33 +505,38 @@ DWORD WINAPI AddClusterResourceDependency(HRESOURCE hResource, HRESOURCE hDepend
 }
 
 HRESOURCE WINAPI OpenClusterResource(HCLUSTER hCluster, LPCWSTR lpszResourceName) {
-  if (kxlsim::shouldFail("OpenClusterResource"))
+  kxlsim::ServiceCall call("OpenClusterResource");
+  if (call.failing())
     return failWith(ERROR_RESOURCE_NOT_FOUND, HRESOURCE{nullptr});
   return openNamed<HRESOURCE, ResourceObject>(hCluster, lpszResourceName, kResourcesKey,
                                               ERROR_RESOURCE_NOT_FOUND);
 }
 
 BOOL WINAPI CloseClusterResource(HRESOURCE hResource) {
-  if (kxlsim::shouldFail("CloseClusterResource"))
+  kxlsim::ServiceCall call("CloseClusterResource");
+  if (call.failing())
     return failWith(ERROR_INVALID_HANDLE, FALSE);
   return closeObject<ResourceObject>(asHandle(hResource));
 }
 
 DWORD WINAPI OnlineClusterResource(HRESOURCE hResource) {
-  if (kxlsim::shouldFail("OnlineClusterResource"))
+  kxlsim::ServiceCall call("OnlineClusterResource");
+  if (call.failing())
     return ERROR_RESOURCE_NOT_FOUND;
   return changeResourceState(hResource, ClusterResourceOnline);
 }
 
 DWORD WINAPI OfflineClusterResource(HRESOURCE hResource) {
-  if (kxlsim::shouldFail("OfflineClusterResource"))
+  kxlsim::ServiceCall call("OfflineClusterResource");
+  if (call.failing())
     return ERROR_RESOURCE_NOT_FOUND;
   return changeResourceState(hResource, ClusterResourceOffline);
 }
 
 // Only an offline resource that nothing depends on can be deleted.
 DWORD WINAPI DeleteClusterResource(HRESOURCE hResource) {
-  if (kxlsim::shouldFail("DeleteClusterResource"))
+  kxlsim::ServiceCall call("DeleteClusterResource");
+  if (call.failing())
     return ERROR_RESOURCE_NOT_FOUND;
   ResourceObject *resource = liveResource(hResource);
   if (resource == nullptr)
@@ -497,7 +551,8 @@ DWORD WINAPI DeleteClusterResource(HRESOURCE hResource) {
 
 HRESOURCE WINAPI CreateClusterResource(HGROUP hGroup, LPCWSTR lpszResourceName, LPCWSTR lpszResourceType,
                                        DWORD dwFlags) {
-  if (kxlsim::shouldFail("CreateClusterResource"))
+  kxlsim::ServiceCall call("CreateClusterResource");
+  if (call.failing())
     return failWith(ERROR_NOT_ENOUGH_MEMORY, HRESOURCE{nullptr});
   GroupObject *group = liveGroup(hGroup);
   if (group == nullptr)
@@ -509,17 +564,12 @@ HRESOURCE WINAPI CreateClusterResource(HGROUP hGroup, LPCWSTR lpszResourceName, 
     return failWith(ERROR_RESOURCE_TYPE_NOT_FOUND, HRESOURCE{nullptr});
   if (findObject(kResourcesKey, name, stored))
     return failWith(ERROR_OBJECT_ALREADY_EXISTS, HRESOURCE{nullptr});
-  std::string key = resourceKey(name);
-  LONG rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "Type", type);
-  if (rc == ERROR_SUCCESS)
-    rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "Group", group->name);
-  if (rc == ERROR_SUCCESS)
-    rc = reg::writeMultiString(HKEY_LOCAL_MACHINE, key, "DependsOn", {});
-  if (rc == ERROR_SUCCESS)
-    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "State", ClusterResourceOffline);
-  if (rc == ERROR_SUCCESS)
-    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "SeparateMonitor",
-                         dwFlags & CLUSTER_RESOURCE_SEPARATE_MONITOR);
+  // The cluster database takes a new resource whole.
+  LONG rc =
+      reg::writeKey(HKEY_LOCAL_MACHINE, resourceKey(name),
+                    {reg::stringValue("Type", type), reg::stringValue("Group", group->name),
+                     reg::multiStringValue("DependsOn", {}), reg::dwordValue("State", ClusterResourceOffline),
+                     reg::dwordValue("SeparateMonitor", dwFlags & CLUSTER_RESOURCE_SEPARATE_MONITOR)});
   if (rc != ERROR_SUCCESS)
     return failWith(static_cast<DWORD>(rc), HRESOURCE{nullptr});
   auto resource = std::make_unique<ResourceObject>();
@@ -530,7 +580,8 @@ HRESOURCE WINAPI CreateClusterResource(HGROUP hGroup, LPCWSTR lpszResourceName, 
 CLUSTER_RESOURCE_STATE WINAPI GetClusterResourceState(HRESOURCE hResource, LPWSTR lpszNodeName,
                                                       LPDWORD lpcchNodeName, LPWSTR lpszGroupName,
                                                       LPDWORD lpcchGroupName) {
-  if (kxlsim::shouldFail("GetClusterResourceState"))
+  kxlsim::ServiceCall call("GetClusterResourceState");
+  if (call.failing())
     return failWith(ERROR_RESOURCE_NOT_FOUND, ClusterResourceStateUnknown);
   ResourceObject *resource = liveResource(hResource);
   if (resource == nullptr)
@@ -544,7 +595,8 @@ CLUSTER_RESOURCE_STATE WINAPI GetClusterResourceState(HRESOURCE hResource, LPWST
 }
 
 DWORD WINAPI DeleteClusterResourceType(HCLUSTER hCluster, LPCWSTR lpszResourceTypeName) {
-  if (kxlsim::shouldFail("DeleteClusterResourceType"))
+  kxlsim::ServiceCall call("DeleteClusterResourceType");
+  if (call.failing())
     return ERROR_RESOURCE_TYPE_NOT_FOUND;
   if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
     return ERROR_INVALID_HANDLE;
@@ -559,7 +611,8 @@ DWORD WINAPI DeleteClusterResourceType(HCLUSTER hCluster, LPCWSTR lpszResourceTy
 DWORD WINAPI CreateClusterResourceType(HCLUSTER hCluster, LPCWSTR lpszResourceTypeName,
                                        LPCWSTR lpszDisplayName, LPCWSTR lpszResourceTypeDll,
                                        DWORD dwLooksAlivePollInterval, DWORD dwIsAlivePollInterval) {
-  if (kxlsim::shouldFail("CreateClusterResourceType"))
+  kxlsim::ServiceCall call("CreateClusterResourceType");
+  if (call.failing())
     return ERROR_NOT_ENOUGH_MEMORY;
   if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
     return ERROR_INVALID_HANDLE;
@@ -569,20 +622,17 @@ DWORD WINAPI CreateClusterResourceType(HCLUSTER hCluster, LPCWSTR lpszResourceTy
     return ERROR_INVALID_PARAMETER;
   if (findObject(kTypesKey, type, stored))
     return ERROR_ALREADY_EXISTS;
-  std::string key = std::string(kTypesKey) + "\\" + type;
-  LONG rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "DisplayName", display);
-  if (rc == ERROR_SUCCESS)
-    rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "DllName", dll);
-  if (rc == ERROR_SUCCESS)
-    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "LooksAlivePollInterval", dwLooksAlivePollInterval);
-  if (rc == ERROR_SUCCESS)
-    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "IsAlivePollInterval", dwIsAlivePollInterval);
-  return static_cast<DWORD>(rc);
+  return static_cast<DWORD>(
+      reg::writeKey(HKEY_LOCAL_MACHINE, std::string(kTypesKey) + "\\" + type,
+                    {reg::stringValue("DisplayName", display), reg::stringValue("DllName", dll),
+                     reg::dwordValue("LooksAlivePollInterval", dwLooksAlivePollInterval),
+                     reg::dwordValue("IsAlivePollInterval", dwIsAlivePollInterval)}));
 }
 
 HRESTYPEENUM WINAPI ClusterResourceTypeOpenEnum(HCLUSTER hCluster, LPCWSTR lpszResourceTypeName,
                                                 DWORD dwType) {
-  if (kxlsim::shouldFail("ClusterResourceTypeOpenEnum"))
+  kxlsim::ServiceCall call("ClusterResourceTypeOpenEnum");
+  if (call.failing())
     return failWith(ERROR_NOT_ENOUGH_MEMORY, HRESTYPEENUM{nullptr});
   if (lookupHandleAs<ClusterObject>(asHandle(hCluster)) == nullptr)
     return failWith(ERROR_INVALID_HANDLE, HRESTYPEENUM{nullptr});
@@ -599,26 +649,30 @@ HRESTYPEENUM WINAPI ClusterResourceTypeOpenEnum(HCLUSTER hCluster, LPCWSTR lpszR
 
 DWORD WINAPI ClusterResourceTypeEnum(HRESTYPEENUM hResTypeEnum, DWORD dwIndex, LPDWORD lpdwType,
                                      LPWSTR lpszName, LPDWORD lpcchName) {
-  if (kxlsim::shouldFail("ClusterResourceTypeEnum"))
+  kxlsim::ServiceCall call("ClusterResourceTypeEnum");
+  if (call.failing())
     return ERROR_NOT_ENOUGH_MEMORY;
   return enumerate(asHandle(hResTypeEnum), EnumKind::ResourceType, dwIndex, lpdwType, lpszName, lpcchName);
 }
 
 DWORD WINAPI ClusterResourceTypeCloseEnum(HRESTYPEENUM hResTypeEnum) {
-  if (kxlsim::shouldFail("ClusterResourceTypeCloseEnum"))
+  kxlsim::ServiceCall call("ClusterResourceTypeCloseEnum");
+  if (call.failing())
     return ERROR_INVALID_HANDLE;
   return closeEnumeration(asHandle(hResTypeEnum), EnumKind::ResourceType);
 }
 
 DWORD WINAPI ClusterResourceCloseEnum(HRESENUM hResEnum) {
-  if (kxlsim::shouldFail("ClusterResourceCloseEnum"))
+  kxlsim::ServiceCall call("ClusterResourceCloseEnum");
+  if (call.failing())
     return ERROR_INVALID_HANDLE;
   return closeEnumeration(asHandle(hResEnum), EnumKind::Resource);
 }
 
 // The local node, or another machine of the world by its computer name.
 DWORD WINAPI GetNodeClusterState(LPCWSTR lpszNodeName, LPDWORD pdwClusterState) {
-  if (kxlsim::shouldFail("GetNodeClusterState"))
+  kxlsim::ServiceCall call("GetNodeClusterState");
+  if (call.failing())
     return RPC_S_SERVER_UNAVAILABLE;
   if (pdwClusterState == nullptr)
     return ERROR_INVALID_PARAMETER;

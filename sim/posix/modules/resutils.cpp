@@ -56,7 +56,8 @@ KXL_MODULE_ENTRY_POINTS(resutils)
 DWORD WINAPI ResUtilStartResourceService(LPCWSTR pszServiceName, LPSC_HANDLE phServiceHandle) {
   if (phServiceHandle != nullptr)
     *phServiceHandle = nullptr;
-  if (kxlsim::shouldFail("ResUtilStartResourceService"))
+  kxlsim::ServiceCall call("ResUtilStartResourceService");
+  if (call.failing())
     return ERROR_ACCESS_DENIED;
   std::string key;
   if (!serviceKey(pszServiceName, key))
@@ -68,7 +69,8 @@ DWORD WINAPI ResUtilStartResourceService(LPCWSTR pszServiceName, LPSC_HANDLE phS
 }
 
 DWORD WINAPI ResUtilStopResourceService(LPCWSTR pszServiceName) {
-  if (kxlsim::shouldFail("ResUtilStopResourceService"))
+  kxlsim::ServiceCall call("ResUtilStopResourceService");
+  if (call.failing())
     return ERROR_ACCESS_DENIED;
   std::string key;
   if (!serviceKey(pszServiceName, key))
@@ -78,7 +80,8 @@ DWORD WINAPI ResUtilStopResourceService(LPCWSTR pszServiceName) {
 
 // Type names compare ignoring case, as the cluster service treats them.
 BOOL WINAPI ResUtilResourceTypesEqual(LPCWSTR lpszResourceTypeName, HRESOURCE hResource) {
-  if (kxlsim::shouldFail("ResUtilResourceTypesEqual"))
+  kxlsim::ServiceCall call("ResUtilResourceTypesEqual");
+  if (call.failing())
     return FALSE;
   std::string wanted, actual;
   if (!narrowName(lpszResourceTypeName, wanted) || !resourceType(hResource, actual))
