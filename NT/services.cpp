@@ -42,6 +42,7 @@ enum Probe : uint32_t {
   kProbeClusterMachine = 80,
   kProbePartitionMachine = 90,
   kProbeSingleMachine = 210,
+  kProbeClusterProfile = 220, // the cluster profile cannot be read or written
 };
 
 constexpr ErrorTrace traced{KXL_FN_UPGRADE_INSTANCE_SERVICES};
@@ -168,36 +169,48 @@ void clusterProfileKeyPath(const ServicesStep &step, char *path, size_t size) {
   ossSnprintf(path, size, "Cluster\\ZAV\\KXL\\PROFILES\\%s", step.instanceName);
 }
 
-bool readClusterValue(HKEY key, const char *name, char *value) {
-  DWORD size = kClusterValueSize;
-  LONG rc = RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(value), &size);
-  value[size < kClusterValueSize ? size : kClusterValueSize] = '\0';
-  return rc == ERROR_SUCCESS;
+// A key or value that is not there is missing; any other failure is a failed read.
+bool missing(LONG rc) {
+  return rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND;
 }
 
-void writeClusterValue(HKEY key, const char *name, const char *value) {
-  RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value),
-                 static_cast<DWORD>(std::strlen(value) + 1));
+// ERROR_SUCCESS with the value, a missing code, or the failure.
+LONG readClusterValue(HKEY key, const char *name, char *value) {
+  DWORD size = kClusterValueSize;
+  LONG rc = RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(value), &size);
+  value[rc == ERROR_SUCCESS && size < kClusterValueSize ? size : 0] = '\0';
+  return rc;
+}
+
+LONG writeClusterValue(HKEY key, const char *name, const char *value) {
+  return RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value),
+                        static_cast<DWORD>(std::strlen(value) + 1));
 }
 
 // Values that were missing before the re-creation are not invented afterwards.
-void writeClusterValues(HKEY key, const ClusterProfile &cluster) {
+int32_t writeClusterValues(HKEY key, const ClusterProfile &cluster) {
   if (key == nullptr)
-    return;
-  if (cluster.hasList)
-    writeClusterValue(key, kClusterList, cluster.list);
-  if (cluster.hasInstanceProfile)
-    writeClusterValue(key, kClusterInstanceProfile, cluster.instanceProfile);
+    return 0;
+  if ((cluster.hasList && writeClusterValue(key, kClusterList, cluster.list) != ERROR_SUCCESS) ||
+      (cluster.hasInstanceProfile &&
+       writeClusterValue(key, kClusterInstanceProfile, cluster.instanceProfile) != ERROR_SUCCESS))
+    return traced(kProbeClusterProfile, SERVICES_RC_MACHINE_REGISTRY);
+  return 0;
 }
 
-void writeMachineClusterValues(const ServicesStep &step) {
+// A machine without the instance's cluster profile key gets none.
+int32_t writeMachineClusterValues(const ServicesStep &step) {
   char path[64];
   clusterProfileKeyPath(step, path, sizeof path);
   HKEY key = nullptr;
-  if (RegOpenKeyExA(step.machine->hklm, path, 0, KEY_ALL_ACCESS, &key) != ERROR_SUCCESS)
-    return;
-  writeClusterValues(key, step.cluster);
+  LONG opened = RegOpenKeyExA(step.machine->hklm, path, 0, KEY_ALL_ACCESS, &key);
+  if (missing(opened))
+    return 0;
+  if (opened != ERROR_SUCCESS)
+    return traced(kProbeClusterProfile, SERVICES_RC_MACHINE_REGISTRY);
+  int32_t rc = writeClusterValues(key, step.cluster);
   RegCloseKey(key);
+  return rc;
 }
 
 int32_t readClusterProfile(ServicesStep &step) {
@@ -208,13 +221,17 @@ int32_t readClusterProfile(ServicesStep &step) {
   char path[64];
   clusterProfileKeyPath(step, path, sizeof path);
   ClusterProfile &cluster = step.cluster;
-  if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_ALL_ACCESS, &cluster.key) != ERROR_SUCCESS) {
+  LONG opened = RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_ALL_ACCESS, &cluster.key);
+  if (opened != ERROR_SUCCESS) {
     cluster.key = nullptr;
-    return 0;
+    return missing(opened) ? 0 : traced(kProbeClusterProfile, SERVICES_RC_MACHINE_REGISTRY);
   }
-  cluster.hasList = readClusterValue(cluster.key, kClusterList, cluster.list);
-  cluster.hasInstanceProfile =
-      readClusterValue(cluster.key, kClusterInstanceProfile, cluster.instanceProfile);
+  LONG list = readClusterValue(cluster.key, kClusterList, cluster.list);
+  LONG profile = readClusterValue(cluster.key, kClusterInstanceProfile, cluster.instanceProfile);
+  if ((list != ERROR_SUCCESS && !missing(list)) || (profile != ERROR_SUCCESS && !missing(profile)))
+    return traced(kProbeClusterProfile, SERVICES_RC_MACHINE_REGISTRY);
+  cluster.hasList = list == ERROR_SUCCESS;
+  cluster.hasInstanceProfile = profile == ERROR_SUCCESS;
   return 0;
 }
 
@@ -224,7 +241,8 @@ template <class Visit> int32_t forEachClusterMachine(const ServicesStep &step, V
   if (!step.cluster.hasList)
     return 0;
   char names[kClusterValueSize + 1];
-  ossSnprintf(names, sizeof names, "%s", step.cluster.list);
+  if (!formed(ossSnprintf(names, sizeof names, "%s", step.cluster.list)))
+    return unformed();
   for (char *name = names; *name != '\0';) {
     char *end = name + std::strcspn(name, " ");
     bool last = *end == '\0';
@@ -474,9 +492,7 @@ int32_t repointClusterMachine(ServicesStep &step, const char *machine) {
     rc = forEachNode(step, [&](const unsigned char *entry) {
       return repointPartitionServices(step, entry, machine, paths, forceCopyName);
     });
-  if (rc == 0)
-    writeMachineClusterValues(step);
-  return rc;
+  return rc != 0 ? rc : writeMachineClusterValues(step);
 }
 
 int32_t repointPartitions(ServicesStep &step) {
@@ -498,7 +514,8 @@ int32_t repointClusterNode(ServicesStep &step, const char *machine) {
   int32_t rc = openMachine(step, machine, kProbeSingleMachine);
   if (rc != 0)
     return rc;
-  writeMachineClusterValues(step);
+  if ((rc = writeMachineClusterValues(step)) != 0)
+    return rc;
   ProgramPaths paths;
   programPaths(step.options.currentInstallPath, paths);
   rc = machineProgramPaths(step.machine->hklm, step.copyName, paths);
@@ -530,10 +547,8 @@ int32_t repointSingleService(ServicesStep &step) {
   }
   local[sizeof local - 1] = '\0';
   return forEachClusterMachine(step, [&](const char *machine) {
-    if (local[0] != '\0' && sameName(machine, local, SQLO_COMPUTERNAME_SZ)) {
-      writeClusterValues(step.cluster.key, step.cluster);
-      return 0;
-    }
+    if (local[0] != '\0' && sameName(machine, local, SQLO_COMPUTERNAME_SZ))
+      return writeClusterValues(step.cluster.key, step.cluster);
     return repointClusterNode(step, machine);
   });
 }

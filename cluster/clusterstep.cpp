@@ -77,6 +77,8 @@ bool nodesFilePath(const IKXLINSTANCE &instance, char (&path)[kPathSize]) {
   return true;
 }
 
+enum class Membership { member, other, unreadable };
+
 // A node list read from the instance's nodes file for one membership test,
 // released when the test is done.
 class NodesFile {
@@ -91,38 +93,37 @@ public:
       list_ = nullptr;
     }
   }
-  bool read() const { return list_ != nullptr; }
   ~NodesFile() { std::free(list_); }
   NodesFile(const NodesFile &) = delete;
   NodesFile &operator=(const NodesFile &) = delete;
 
-  // True when one partition's name ("%s-%d": instance name, node number) is
-  // `resource`, ignoring case. The walk goes by the header's count and first
-  // entry and by each entry's own length, and never leaves the block.
-  bool namesPartition(const char *instanceName, const char *resource) const {
+  // Whether one partition's name ("%s-%d": instance name, node number) is
+  // `resource`, ignoring case; unreadable when the list could not be read or
+  // a name formed. The walk goes by the header's count and first entry and by
+  // each entry's own length, and never leaves the block.
+  Membership namesPartition(const char *instanceName, const char *resource) const {
     if (list_ == nullptr)
-      return false;
+      return Membership::unreadable;
     const unsigned char *block = reinterpret_cast<const unsigned char *>(list_);
     size_t size = sqloNodeListSize(list_);
     size_t offset = sqloLe32(list_, SQLO_NODELIST_HDR_FIRST);
     for (int32_t left = sqloNodeListCount(list_); left > 0; --left) {
       if (offset > size || size - offset < SQLO_NODE_NUMBER + 2)
-        return false;
+        return Membership::other;
       const unsigned char *entry = block + offset;
       char partition[kPartitionNameSize];
-      ossSnprintf(partition, sizeof partition, "%s-%d", instanceName, int(sqloNodeNumber(entry)));
+      if (ossSnprintf(partition, sizeof partition, "%s-%d", instanceName, int(sqloNodeNumber(entry))) < 0)
+        return Membership::unreadable;
       if (sameName(partition, resource))
-        return true;
+        return Membership::member;
       offset += sqloNodeLength(entry);
     }
-    return false;
+    return Membership::other;
   }
 
 private:
   SQLO_NODELIST *list_ = nullptr;
 };
-
-enum class Membership { member, other, unreadable };
 
 // Whether a listed resource is the instance's: its name, or for a
 // partitioned instance one of its partitions' names (the nodes file read
@@ -135,11 +136,7 @@ Membership instanceResource(const ClusterResourceEntry &resource, const IKXLINST
   if (options.partitionedInstance == 0) {
     member = sameName(resource.name, options.instanceName) ? Membership::member : Membership::other;
   } else {
-    NodesFile nodes(instance, options);
-    if (!nodes.read())
-      member = Membership::unreadable;
-    else if (nodes.namesPartition(options.instanceName, resource.name))
-      member = Membership::member;
+    member = NodesFile(instance, options).namesPartition(options.instanceName, resource.name);
   }
   pdtExit(KXL_FN_IS_INSTANCE_RESOURCE, member == Membership::member ? 1 : 0, 0);
   return member;
