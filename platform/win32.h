@@ -43,6 +43,13 @@ typedef union _ULARGE_INTEGER {
   } u;
   uint64_t QuadPart;
 } ULARGE_INTEGER, *PULARGE_INTEGER;
+typedef union _LARGE_INTEGER {
+  struct {
+    uint32_t LowPart;
+    int32_t HighPart;
+  } u;
+  int64_t QuadPart;
+} LARGE_INTEGER, *PLARGE_INTEGER;
 typedef uintptr_t ULONG_PTR;
 typedef intptr_t LONG_PTR;
 typedef ULONG_PTR DWORD_PTR;
@@ -127,6 +134,7 @@ typedef struct _OVERLAPPED OVERLAPPED, *LPOVERLAPPED;
 #define ERROR_UNKNOWN_PRODUCT 1605L
 #define ERROR_UNKNOWN_PROPERTY 1608L
 #define ERROR_BAD_CONFIGURATION 1610L
+#define ERROR_REQUEST_ABORTED 1235L
 #define ERROR_CLUSTER_NODE_NOT_FOUND 5042L
 #define ERROR_CLUSTER_RESOURCE_NOT_FOUND 5007L
 #define ERROR_CLUSTER_GROUP_NOT_FOUND 5013L
@@ -286,6 +294,21 @@ BOOL CreateDirectoryA(LPCSTR lpPathName, LPSECURITY_ATTRIBUTES lpSecurityAttribu
 BOOL RemoveDirectoryA(LPCSTR lpPathName);
 BOOL DeleteFileA(LPCSTR lpFileName);
 BOOL CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, BOOL bFailIfExists);
+// Progress of CopyFileExA: the routine is called once the copy has begun and
+// after each piece of the content; it answers with one of PROGRESS_*.
+#define PROGRESS_CONTINUE 0
+#define PROGRESS_CANCEL 1
+#define PROGRESS_STOP 2
+#define PROGRESS_QUIET 3
+#define CALLBACK_CHUNK_FINISHED 0x00000000
+#define CALLBACK_STREAM_SWITCH 0x00000001
+#define COPY_FILE_FAIL_IF_EXISTS 0x00000001
+typedef DWORD(CALLBACK *LPPROGRESS_ROUTINE)(LARGE_INTEGER TotalFileSize, LARGE_INTEGER TotalBytesTransferred,
+                                            LARGE_INTEGER StreamSize, LARGE_INTEGER StreamBytesTransferred,
+                                            DWORD dwStreamNumber, DWORD dwCallbackReason, HANDLE hSourceFile,
+                                            HANDLE hDestinationFile, LPVOID lpData);
+BOOL CopyFileExA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, LPPROGRESS_ROUTINE lpProgressRoutine,
+                 LPVOID lpData, LPBOOL pbCancel, DWORD dwCopyFlags);
 BOOL MoveFileExA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, DWORD dwFlags);
 HANDLE CreateFileA(LPCSTR lpFileName, DWORD dwDesiredAccess, DWORD dwShareMode,
                    LPSECURITY_ATTRIBUTES lpSecurityAttributes, DWORD dwCreationDisposition,

@@ -20,6 +20,7 @@
 #include <sys/ioctl.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
+#include <sys/xattr.h>
 #include <unistd.h>
 #include <vector>
 
@@ -84,9 +85,11 @@ struct FindObject : HandleObject {
   bool closableByCloseHandle() const override { return false; }
 };
 
-bool fillFindData(const std::string &directory, const std::string &name, WIN32_FIND_DATAA &data) {
+// `folder` is the listed folder opened, so each entry costs one lookup in it
+// rather than a walk of the whole path.
+bool fillFindData(int folder, const std::string &name, WIN32_FIND_DATAA &data) {
   struct stat info {};
-  if (name.size() >= MAX_PATH || stat((directory + "/" + name).c_str(), &info) != 0)
+  if (name.size() >= MAX_PATH || fstatat(folder, name.c_str(), &info, 0) != 0)
     return false;
   std::memset(&data, 0, sizeof data);
   data.dwFileAttributes = attributesOf(info);
@@ -179,53 +182,195 @@ bool startTransfer(const char *function, LPCSTR from, LPCSTR to, std::string &so
   return startOnExisting(function, from, source, info) && mapPath(to, target);
 }
 
-// Shares the source's blocks where the file system can (FICLONE), else lets
-// the kernel copy (copy_file_range), else reads and writes large blocks.
-bool copyFileContents(int from, int to) {
-  if (ioctl(to, FICLONE, from) == 0)
-    return true;
-  bool started = false;
+// What a content copy tells its caller's progress routine, as CopyFileExA
+// does: the bytes copied so far after each piece, until it is told to be quiet.
+class CopyReport {
+public:
+  CopyReport(LPPROGRESS_ROUTINE routine, LPVOID data, LPBOOL cancel)
+      : routine_(routine), data_(data), cancel_(cancel) {}
+
+  void sized(off_t total) { total_ = total; }
+
+  // False when the caller stops the copy (its cancel flag, or its answer).
+  bool tell(off_t done, DWORD reason) {
+    if (cancel_ != nullptr && *cancel_)
+      return false;
+    if (routine_ == nullptr || quiet_)
+      return true;
+    LARGE_INTEGER total{}, copied{};
+    total.QuadPart = total_;
+    copied.QuadPart = done;
+    DWORD answer = routine_(total, copied, total, copied, 1, reason, nullptr, nullptr, data_);
+    quiet_ = answer == PROGRESS_QUIET;
+    return answer == PROGRESS_CONTINUE || answer == PROGRESS_QUIET;
+  }
+
+private:
+  LPPROGRESS_ROUTINE routine_;
+  LPVOID data_;
+  LPBOOL cancel_;
+  off_t total_ = 0;
+  bool quiet_ = false;
+};
+
+enum class CopyOutcome { Copied, Failed, Stopped };
+
+// The kernel's copy piece by piece, so the caller hears of a large file's
+// progress; Failed with errno at EXDEV and the like when it is not offered.
+CopyOutcome kernelCopy(int from, int to, CopyReport &report, bool &started) {
+  constexpr size_t kPiece = size_t(64) << 20;
+  off_t done = 0;
   for (;;) {
-    ssize_t got = copy_file_range(from, nullptr, to, nullptr, size_t(1) << 30, 0);
+    ssize_t got = copy_file_range(from, nullptr, to, nullptr, kPiece, 0);
     if (got < 0 && errno == EINTR)
       continue;
+    if (got < 0)
+      return CopyOutcome::Failed;
     if (got == 0)
-      return true;
-    if (got < 0) {
-      if (started || (errno != EXDEV && errno != EINVAL && errno != ENOSYS && errno != EOPNOTSUPP))
-        return false;
-      break; // not offered here: copy by hand
-    }
+      return CopyOutcome::Copied;
     started = true;
+    done += got;
+    if (!report.tell(done, CALLBACK_CHUNK_FINISHED))
+      return CopyOutcome::Stopped;
   }
+}
+
+CopyOutcome copyByHand(int from, int to, CopyReport &report) {
   std::vector<char> chunk(size_t(1) << 20);
+  off_t done = 0;
   for (;;) {
     ssize_t got = read(from, chunk.data(), chunk.size());
     if (got < 0 && errno == EINTR)
       continue;
     if (got <= 0)
-      return got == 0;
-    for (ssize_t done = 0; done < got;) {
-      ssize_t put = write(to, chunk.data() + done, static_cast<size_t>(got - done));
+      return got == 0 ? CopyOutcome::Copied : CopyOutcome::Failed;
+    for (ssize_t put = 0, offset = 0; offset < got; offset += put) {
+      put = write(to, chunk.data() + offset, static_cast<size_t>(got - offset));
       if (put < 0 && errno == EINTR)
-        continue;
-      if (put <= 0)
-        return false;
-      done += put;
+        put = 0;
+      else if (put <= 0)
+        return CopyOutcome::Failed;
     }
+    done += got;
+    if (!report.tell(done, CALLBACK_CHUNK_FINISHED))
+      return CopyOutcome::Stopped;
+  }
+}
+
+// Shares the source's blocks where the file system can (FICLONE), else lets
+// the kernel copy (copy_file_range), else reads and writes large blocks.
+CopyOutcome copyFileContents(int from, int to, off_t size, CopyReport &report) {
+  report.sized(size);
+  if (!report.tell(0, CALLBACK_STREAM_SWITCH))
+    return CopyOutcome::Stopped;
+  if (ioctl(to, FICLONE, from) == 0)
+    return report.tell(size, CALLBACK_CHUNK_FINISHED) ? CopyOutcome::Copied : CopyOutcome::Stopped;
+  bool started = false;
+  CopyOutcome outcome = kernelCopy(from, to, report, started);
+  bool offered = started || (errno != EXDEV && errno != EINVAL && errno != ENOSYS && errno != EOPNOTSUPP);
+  if (outcome != CopyOutcome::Failed || offered)
+    return outcome;
+  return copyByHand(from, to, report);
+}
+
+// Extended attributes as `cp -a` copies them: each one the source lists,
+// where this process may read it and the target's file system takes it. One
+// that cannot be copied is left out without failing the copy, as `cp -a`
+// leaves it (its warning aside: the Win32 call has no channel for one).
+void copyExtendedAttributes(int from, int to) {
+  char listed[4096];
+  std::vector<char> larger;
+  char *names = listed;
+  ssize_t length = flistxattr(from, listed, sizeof listed);
+  if (length < 0 && errno == ERANGE) {
+    ssize_t wanted = flistxattr(from, nullptr, 0);
+    larger.resize(wanted > 0 ? static_cast<size_t>(wanted) : 0);
+    names = larger.data();
+    length = larger.empty() ? -1 : flistxattr(from, names, larger.size());
+  }
+  std::vector<char> value;
+  for (ssize_t at = 0; at < length; at += static_cast<ssize_t>(std::strlen(names + at)) + 1) {
+    ssize_t size = fgetxattr(from, names + at, nullptr, 0);
+    if (size < 0)
+      continue;
+    value.resize(static_cast<size_t>(size));
+    size = fgetxattr(from, names + at, value.data(), value.size());
+    if (size >= 0)
+      (void)!fsetxattr(to, names + at, value.data(), static_cast<size_t>(size), 0);
   }
 }
 
 // What `cp -a` keeps of a copied file: its permission bits exactly (not
 // narrowed by the umask), owner and group where this process may set them,
-// and its access and modification times.
-bool keepMetadata(int to, const struct stat &source) {
+// extended attributes, and its access and modification times.
+bool keepMetadata(int from, int to, const struct stat &source) {
   // Giving a file away needs privilege; without it the copy stays this
   // process's (its group kept where allowed), as with cp -a.
   if (fchown(to, source.st_uid, source.st_gid) != 0)
     (void)!fchown(to, static_cast<uid_t>(-1), source.st_gid);
+  if (fchmod(to, source.st_mode & 07777) != 0)
+    return false;
+  // After the owner and the mode: a change of owner drops capabilities, and
+  // an access list set last agrees with the mode it was listed with.
+  copyExtendedAttributes(from, to);
   struct timespec times[2] = {source.st_atim, source.st_mtim};
-  return fchmod(to, source.st_mode & 07777) == 0 && futimens(to, times) == 0;
+  return futimens(to, times) == 0;
+}
+
+// Why an existing `target` may not be replaced by a copy of `source`; 0 when it may.
+DWORD replaceRefusal(const std::string &target, const struct stat &source, DWORD flags) {
+  struct stat existing {};
+  if (stat(target.c_str(), &existing) != 0)
+    return 0; // a link to nothing: the copy is made where it points
+  if (flags & COPY_FILE_FAIL_IF_EXISTS)
+    return ERROR_FILE_EXISTS;
+  if (S_ISDIR(existing.st_mode) || isReadOnlyFile(existing) || existing.st_ino == source.st_ino)
+    return ERROR_ACCESS_DENIED;
+  return 0;
+}
+
+// The target opened for the copy: made new (`created`), or an existing file
+// replaced when it may be. -1 with the last error set.
+int openCopyTarget(const std::string &target, const struct stat &source, DWORD flags, bool &created) {
+  int to = open(target.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, source.st_mode & 0777);
+  created = to >= 0;
+  if (to < 0 && errno == EEXIST) {
+    if (DWORD refused = replaceRefusal(target, source, flags))
+      return failWith(refused, -1);
+    to = open(target.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, source.st_mode & 0777);
+  }
+  if (to < 0)
+    return failWith(win32ErrorFromErrno(errno, target), -1);
+  return to;
+}
+
+BOOL copyFile(const char *function, LPCSTR existingName, LPCSTR newName, CopyReport report, DWORD flags) {
+  std::string source, target;
+  struct stat info {};
+  if (!startTransfer(function, existingName, newName, source, info, target))
+    return FALSE;
+  if (S_ISDIR(info.st_mode))
+    return failWith(ERROR_ACCESS_DENIED, FALSE);
+  int from = open(source.c_str(), O_RDONLY | O_CLOEXEC);
+  if (from < 0)
+    return failWith(win32ErrorFromErrno(errno, source), FALSE);
+  bool created = false;
+  int to = openCopyTarget(target, info, flags, created);
+  if (to < 0) {
+    close(from);
+    return FALSE;
+  }
+  if (created)
+    noteEntryAdded(target);
+  CopyOutcome outcome = copyFileContents(from, to, info.st_size, report);
+  bool copied = outcome == CopyOutcome::Copied && keepMetadata(from, to, info);
+  close(from);
+  if (close(to) != 0 || !copied) {
+    unlink(target.c_str());
+    noteEntryRemoved(target);
+    return failWith(outcome == CopyOutcome::Stopped ? ERROR_REQUEST_ABORTED : ERROR_WRITE_FAULT, FALSE);
+  }
+  return TRUE;
 }
 
 // The host target of a rename: the mapped path, except that renaming a name to
@@ -313,12 +458,17 @@ HANDLE FindFirstFileA(LPCSTR lpFileName, LPWIN32_FIND_DATAA lpFindFileData) {
   std::vector<std::string> names;
   if (!matchingNames(hostDir, pattern, names))
     return failWith(win32ErrorFromErrno(errno, hostDir), INVALID_HANDLE_VALUE);
+  int folder = open(hostDir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (folder < 0)
+    return failWith(win32ErrorFromErrno(errno, hostDir), INVALID_HANDLE_VALUE);
   auto search = std::make_unique<FindObject>();
+  search->entries.reserve(names.size());
   for (const std::string &name : names) {
     WIN32_FIND_DATAA data;
-    if (fillFindData(hostDir, name, data))
+    if (fillFindData(folder, name, data))
       search->entries.push_back(data);
   }
+  close(folder);
   if (search->entries.empty())
     return failWith(ERROR_FILE_NOT_FOUND, INVALID_HANDLE_VALUE);
   *lpFindFileData = search->entries[0];
@@ -386,37 +536,14 @@ BOOL DeleteFileA(LPCSTR lpFileName) {
 }
 
 BOOL CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, BOOL bFailIfExists) {
-  std::string source, target;
-  struct stat info {
-  }, existing{};
-  if (!startTransfer("CopyFileA", lpExistingFileName, lpNewFileName, source, info, target))
-    return FALSE;
-  if (S_ISDIR(info.st_mode))
-    return failWith(ERROR_ACCESS_DENIED, FALSE);
-  if (stat(target.c_str(), &existing) == 0) {
-    if (bFailIfExists)
-      return failWith(ERROR_FILE_EXISTS, FALSE);
-    if (S_ISDIR(existing.st_mode) || isReadOnlyFile(existing) || existing.st_ino == info.st_ino)
-      return failWith(ERROR_ACCESS_DENIED, FALSE);
-  }
-  int from = open(source.c_str(), O_RDONLY | O_CLOEXEC);
-  if (from < 0)
-    return failWith(win32ErrorFromErrno(errno, source), FALSE);
-  int to = open(target.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, info.st_mode & 0777);
-  if (to < 0) {
-    DWORD code = win32ErrorFromErrno(errno, target);
-    close(from);
-    return failWith(code, FALSE);
-  }
-  noteEntryAdded(target);
-  bool copied = copyFileContents(from, to) && keepMetadata(to, info);
-  close(from);
-  if (close(to) != 0 || !copied) {
-    unlink(target.c_str());
-    noteEntryRemoved(target);
-    return failWith(ERROR_WRITE_FAULT, FALSE);
-  }
-  return TRUE;
+  return copyFile("CopyFileA", lpExistingFileName, lpNewFileName, CopyReport(nullptr, nullptr, nullptr),
+                  bFailIfExists ? COPY_FILE_FAIL_IF_EXISTS : 0);
+}
+
+BOOL CopyFileExA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, LPPROGRESS_ROUTINE lpProgressRoutine,
+                 LPVOID lpData, LPBOOL pbCancel, DWORD dwCopyFlags) {
+  return copyFile("CopyFileExA", lpExistingFileName, lpNewFileName,
+                  CopyReport(lpProgressRoutine, lpData, pbCancel), dwCopyFlags);
 }
 
 BOOL MoveFileExA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, DWORD dwFlags) {

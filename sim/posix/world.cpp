@@ -7,6 +7,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <climits>
 #include <cstdio>
 #include <cstdlib>
@@ -208,6 +209,20 @@ int entryKind(const std::string &path) {
   return lstat(path.c_str(), &st) == 0 ? 0 : -1; // a dangling link is an entry too
 }
 
+// How `dir`'s listing answers for `name`, which is not there as written: 1 an
+// entry of another letter case (into `found`), 0 none, -1 `dir` cannot be listed.
+int matchInListing(const std::string &dir, const std::string &name, std::string &found) {
+  std::lock_guard<std::mutex> lock(listingCache().mutex);
+  const Listing *listing = currentListing(dir);
+  if (listing == nullptr)
+    return -1;
+  auto it = listing->names.find(folded(name));
+  if (it == listing->names.end())
+    return 0;
+  found = it->second;
+  return 1;
+}
+
 // The existing entry of `dir` that equals `name` ignoring case; the exact name
 // wins, then the smallest one so the choice does not depend on listing order.
 bool matchEntry(const std::string &dir, const std::string &name, std::string &found, int &kind) {
@@ -216,19 +231,40 @@ bool matchEntry(const std::string &dir, const std::string &name, std::string &fo
     found = name;
     return true;
   }
-  std::lock_guard<std::mutex> lock(listingCache().mutex);
-  const Listing *listing = currentListing(dir);
-  if (listing == nullptr)
+  if (matchInListing(dir, name, found) <= 0)
     return false;
-  auto it = listing->names.find(folded(name));
-  if (it == listing->names.end())
-    return false;
-  found = it->second;
   kind = entryKind(dir + "/" + found);
   return true;
 }
 
+// The mapping when the path exists as written above its last name, which is
+// the common case (a file being read, or made in a folder that exists): the
+// exact name wins at every level, so one lookup of the whole path replaces a
+// lookup per level. False when the walk level by level is needed.
+bool joinExact(const std::string &base, const std::vector<std::string> &parts, std::string &out) {
+  std::string parent = base;
+  for (size_t i = 0; i + 1 < parts.size(); ++i)
+    parent += "/" + parts[i];
+  std::string whole = parts.empty() ? parent : parent + "/" + parts.back();
+  struct stat st {};
+  if (lstat(whole.c_str(), &st) == 0) {
+    out = std::move(whole);
+    return true;
+  }
+  if (parts.empty() || errno != ENOENT)
+    return false;
+  std::string found;
+  int match = matchInListing(parent, parts.back(), found);
+  if (match < 0)
+    return false; // no folder of that exact path: walk level by level
+  out = match > 0 ? parent + "/" + found : std::move(whole);
+  return true;
+}
+
 std::string joinMatched(std::string base, const std::vector<std::string> &parts) {
+  std::string exact;
+  if (joinExact(base, parts, exact))
+    return exact;
   bool matching = isDirectory(base);
   for (const std::string &part : parts) {
     std::string found;

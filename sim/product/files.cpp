@@ -10,6 +10,7 @@
 #include <cstdarg>
 #include <cstdio>
 #include <new>
+#include <vector>
 
 struct sqlo_file {
   HANDLE handle;
@@ -136,13 +137,25 @@ ULONGLONG blocksOf(ULONGLONG size) {
   return (size + kBlock - 1) / kBlock * kBlock;
 }
 
-int32_t treeBytes(const std::string &dir, int depth, ULONGLONG &total) {
+// A folder's entries as one listing found them, each folder with its own.
+struct TreeEntry {
+  std::string name;
+  bool directory;
+  ULONGLONG size;
+  std::vector<TreeEntry> entries;
+};
+
+// Lists the tree below `dir` into `entries` and adds what it takes on a drive
+// to `total`. A tree copy lists its source once: the room check and the copy
+// both work from this listing.
+int32_t listTree(const std::string &dir, int depth, std::vector<TreeEntry> &entries, ULONGLONG &total) {
   if (depth > kMaxTreeDepth)
     return SQLO_RC_IO_ERROR;
   total += kBlock;
   return forEachEntry(dir, [&](const std::string &name, bool directory, ULONGLONG size) -> int32_t {
+    entries.push_back({name, directory, size, {}});
     if (directory)
-      return treeBytes(joinPath(dir, name), depth + 1, total);
+      return listTree(joinPath(dir, name), depth + 1, entries.back().entries, total);
     total += blocksOf(size);
     return 0;
   });
@@ -163,7 +176,8 @@ int32_t checkRoom(const std::string &target, ULONGLONG needed) {
 
 // The progress of a long tree copy on standard error: one line rewritten in
 // place, shown once the copy has run for a second, only when asked for and
-// standard error is a console. Standard output never sees it.
+// standard error is a console. Standard output never sees it. A large file
+// reports its progress while it is copied.
 class CopyProgress {
 public:
   CopyProgress(const std::string &target, ULONGLONG total, bool wanted)
@@ -171,7 +185,7 @@ public:
         start_(std::chrono::steady_clock::now()) {}
   ~CopyProgress() {
     if (shown_) {
-      show();
+      show(done_);
       std::fputc('\n', stderr);
       std::fflush(stderr);
     }
@@ -179,8 +193,27 @@ public:
   CopyProgress(const CopyProgress &) = delete;
   CopyProgress &operator=(const CopyProgress &) = delete;
 
+  // The routine CopyFileExA calls as a file's content is copied; none when
+  // there is nothing to show.
+  LPPROGRESS_ROUTINE routine() const { return enabled_ ? &onFileProgress : nullptr; }
+
   void copied(ULONGLONG bytes) {
     done_ += bytes;
+    update(done_);
+  }
+
+private:
+  static DWORD CALLBACK onFileProgress(LARGE_INTEGER, LARGE_INTEGER transferred, LARGE_INTEGER, LARGE_INTEGER,
+                                       DWORD, DWORD, HANDLE, HANDLE, LPVOID self) {
+    auto *progress = static_cast<CopyProgress *>(self);
+    progress->update(progress->done_ + static_cast<ULONGLONG>(transferred.QuadPart));
+    return PROGRESS_CONTINUE;
+  }
+  static bool errorIsConsole() {
+    DWORD mode = 0;
+    return GetConsoleMode(GetStdHandle(STD_ERROR_HANDLE), &mode) != 0;
+  }
+  void update(ULONGLONG done) {
     if (!enabled_)
       return;
     auto now = std::chrono::steady_clock::now();
@@ -188,20 +221,14 @@ public:
       return;
     last_ = now;
     shown_ = true;
-    show();
+    show(done);
   }
-
-private:
-  static bool errorIsConsole() {
-    DWORD mode = 0;
-    return GetConsoleMode(GetStdHandle(STD_ERROR_HANDLE), &mode) != 0;
-  }
-  void show() {
+  void show(ULONGLONG done) {
     const ULONGLONG mib = 1024 * 1024;
     unsigned percent =
-        total_ == 0 ? 100u : static_cast<unsigned>(std::min<ULONGLONG>(100, done_ * 100 / total_));
+        total_ == 0 ? 100u : static_cast<unsigned>(std::min<ULONGLONG>(100, done * 100 / total_));
     std::fprintf(stderr, "\rcopying to %s: %llu of %llu MiB (%u%%)", target_.c_str(),
-                 static_cast<unsigned long long>(done_ / mib), static_cast<unsigned long long>(total_ / mib),
+                 static_cast<unsigned long long>(done / mib), static_cast<unsigned long long>(total_ / mib),
                  percent);
     std::fflush(stderr);
   }
@@ -214,24 +241,28 @@ private:
   std::chrono::steady_clock::time_point start_, last_;
 };
 
-int32_t copyTree(const std::string &target, const std::string &source, int depth, CopyProgress &progress) {
-  if (depth > kMaxTreeDepth)
-    return SQLO_RC_IO_ERROR;
+// Copies the listed tree of `source` into `target`.
+int32_t copyTree(const std::string &target, const std::string &source, const std::vector<TreeEntry> &entries,
+                 CopyProgress &progress) {
   if (!createDirectoryTree(target, true))
     return SQLO_RC_PATH_NOT_FOUND;
   progress.copied(kBlock); // counted as the room check counts
-  return forEachEntry(source, [&](const std::string &name, bool directory, ULONGLONG size) -> int32_t {
-    std::string from = joinPath(source, name);
-    std::string to = joinPath(target, name);
+  for (const TreeEntry &entry : entries) {
+    std::string from = joinPath(source, entry.name);
+    std::string to = joinPath(target, entry.name);
     if (!fitsPath(from) || !fitsPath(to))
       return SQLO_RC_IO_ERROR;
-    if (directory)
-      return copyTree(to, from, depth + 1, progress);
-    if (!CopyFileA(from.c_str(), to.c_str(), FALSE))
-      return codeForLastError(SQLO_RC_FILE_NOT_FOUND);
-    progress.copied(blocksOf(size));
-    return 0;
-  });
+    int32_t rc = 0;
+    if (entry.directory)
+      rc = copyTree(to, from, entry.entries, progress);
+    else if (!CopyFileExA(from.c_str(), to.c_str(), progress.routine(), &progress, nullptr, 0))
+      rc = codeForLastError(SQLO_RC_FILE_NOT_FOUND);
+    else
+      progress.copied(blocksOf(entry.size));
+    if (rc != 0)
+      return rc;
+  }
+  return 0;
 }
 
 int32_t deleteTree(const std::string &dir, int depth) {
@@ -383,15 +414,16 @@ int32_t sqlocopydir(const char *target, const char *source, uint32_t flags) {
   // Room for the tree, less what the target holds already (its files are
   // replaced), before anything is written.
   ULONGLONG needed = 0, present = 0;
-  int32_t rc = treeBytes(from, 0, needed);
+  std::vector<TreeEntry> tree, targetTree;
+  int32_t rc = listTree(from, 0, tree, needed);
   if (rc == 0 && isDirectoryPath(to))
-    rc = treeBytes(to, 0, present);
+    rc = listTree(to, 0, targetTree, present);
   if (rc == 0)
     rc = checkRoom(to, needed > present ? needed - present : 0);
   if (rc != 0)
     return rc;
   CopyProgress progress(to, needed, (flags & SQLO_COPYDIR_SHOW_PROGRESS) != 0);
-  return copyTree(to, from, 0, progress);
+  return copyTree(to, from, tree, progress);
 }
 
 int32_t sqlodelete(const char *path, uint32_t flags) {

@@ -3,11 +3,14 @@
 
 #include "sim/common/simfail.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdlib>
+#include <cstring>
 #include <fcntl.h>
 #include <string>
 #include <sys/stat.h>
+#include <sys/xattr.h>
 #include <unistd.h>
 #include <vector>
 
@@ -38,8 +41,9 @@ TEST_F(FilesTest, RenameInAnotherLetterCaseRenamesTheHostFile) {
   EXPECT_FALSE(exists("drive_c/M/dst.txt"));
 }
 
-// A copy keeps what cp -a keeps: exact permission bits (whatever the umask)
-// and times; the content whole, small or spanning many blocks.
+// A copy keeps what cp -a keeps: exact permission bits (whatever the umask),
+// extended attributes (where the file system has them) and times; the
+// content whole, small or spanning many blocks.
 TEST_F(FilesTest, CopiesKeepContentPermissionsAndTimes) {
   std::string large(3 * 1024 * 1024 + 17, '\0');
   for (size_t i = 0; i < large.size(); ++i)
@@ -55,6 +59,7 @@ TEST_F(FilesTest, CopiesKeepContentPermissionsAndTimes) {
     std::string source = std::string("drive_c/C/") + c.name;
     makeFile(source, c.content);
     ASSERT_EQ(chmod(host(source).c_str(), c.mode), 0);
+    bool tagged = setxattr(host(source).c_str(), "user.kxl", c.name, std::strlen(c.name), 0) == 0;
     struct timespec times[2] = {{1000000000, 5}, {1200000000, 123456789}};
     ASSERT_EQ(utimensat(AT_FDCWD, host(source).c_str(), times, 0), 0);
     std::string target = std::string("C:\\C\\") + c.name + ".copy";
@@ -62,11 +67,51 @@ TEST_F(FilesTest, CopiesKeepContentPermissionsAndTimes) {
     struct stat copied {};
     ASSERT_EQ(stat(host(source + ".copy").c_str(), &copied), 0);
     EXPECT_EQ(readFile(host(source + ".copy")), c.content) << c.name;
+    char tag[32] = {};
+    if (tagged) {
+      ssize_t got = getxattr(host(source + ".copy").c_str(), "user.kxl", tag, sizeof tag);
+      EXPECT_EQ(std::string(tag, static_cast<size_t>(std::max<ssize_t>(0, got))), c.name);
+    }
     EXPECT_EQ(copied.st_mode & 07777, c.mode) << c.name;
     EXPECT_EQ(copied.st_mtim.tv_sec, 1200000000) << c.name;
     EXPECT_EQ(copied.st_mtim.tv_nsec, 123456789) << c.name;
   }
   umask(previous);
+}
+
+// CopyFileExA tells its routine how far the copy is, and a routine that
+// cancels, or a cancel flag that is set, stops it without leaving a target.
+TEST_F(FilesTest, CopyProgressIsReportedAndACancelledCopyLeavesNoTarget) {
+  std::string content(3 * 1024 * 1024 + 5, 'p');
+  makeFile("drive_c/P/big", content);
+  struct Heard {
+    DWORD answer;
+    std::vector<long long> copied;
+  };
+  auto routine = [](LARGE_INTEGER total, LARGE_INTEGER copied, LARGE_INTEGER, LARGE_INTEGER, DWORD, DWORD,
+                    HANDLE, HANDLE, LPVOID data) -> DWORD {
+    auto *heard = static_cast<Heard *>(data);
+    EXPECT_EQ(total.QuadPart, 3 * 1024 * 1024 + 5);
+    heard->copied.push_back(copied.QuadPart);
+    return heard->answer;
+  };
+  Heard going{PROGRESS_CONTINUE, {}};
+  ASSERT_TRUE(CopyFileExA("C:\\P\\big", "C:\\P\\copy", routine, &going, nullptr, 0));
+  EXPECT_EQ(readFile(host("drive_c/P/copy")), content);
+  ASSERT_GE(going.copied.size(), 2u);
+  EXPECT_EQ(going.copied.front(), 0);
+  EXPECT_EQ(going.copied.back(), static_cast<long long>(content.size()));
+  EXPECT_FALSE(CopyFileExA("C:\\P\\big", "C:\\P\\copy", routine, &going, nullptr, COPY_FILE_FAIL_IF_EXISTS));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_EXISTS));
+
+  Heard stopping{PROGRESS_CANCEL, {}};
+  EXPECT_FALSE(CopyFileExA("C:\\P\\big", "C:\\P\\cancelled", routine, &stopping, nullptr, 0));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_REQUEST_ABORTED));
+  EXPECT_FALSE(exists("drive_c/P/cancelled"));
+  BOOL cancel = TRUE;
+  EXPECT_FALSE(CopyFileExA("C:\\P\\big", "C:\\P\\cancelled", nullptr, nullptr, &cancel, 0));
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_REQUEST_ABORTED));
+  EXPECT_FALSE(exists("drive_c/P/cancelled"));
 }
 
 TEST_F(FilesTest, AccessFollowsTheReadOnlyAttribute) {
