@@ -4,6 +4,7 @@
 #include "sim/common/simfail.h"
 
 #include <algorithm>
+#include <atomic>
 
 #include <fcntl.h>
 #include <sys/file.h>
@@ -604,8 +605,17 @@ bool loadHive(const std::string &path, const std::string &rootName, Key &out, st
   return false;
 }
 
+namespace {
+std::atomic<unsigned long long> editCount{0};
+} // namespace
+
+unsigned long long treeEdits() {
+  return editCount.load();
+}
+
 HiveFile::HiveFile(std::string path, std::string rootName)
     : path_(std::move(path)), logPath_(path_ + ".log"), rootName_(std::move(rootName)) {
+  ++editCount;
   liveHives().push_back(this);
 }
 
@@ -615,6 +625,7 @@ HiveFile::~HiveFile() {
   std::vector<HiveFile *> &hives = liveHives();
   hives.erase(std::remove(hives.begin(), hives.end(), this), hives.end());
   forget();
+  ++editCount;
 }
 
 void HiveFile::forgetLog() {
@@ -627,6 +638,7 @@ void HiveFile::forgetLog() {
 }
 
 void HiveFile::forget() {
+  ++editCount;
   if (heldFd_ >= 0)
     close(heldFd_);
   heldFd_ = -1;
@@ -646,6 +658,7 @@ bool HiveFile::current() const {
 
 // Brings tree_ up to the hive and its log (caller holds the lock).
 bool HiveFile::refresh() {
+  ++editCount;
   for (int attempt = 0; attempt < 2; ++attempt) {
     if (current())
       return true;
@@ -825,6 +838,7 @@ LONG HiveFile::read(const std::function<LONG(const Key &)> &reader) {
 }
 
 LONG HiveFile::update(const std::function<LONG(Key &, bool &changed)> &writer) {
+  ++editCount;
   if (batchDepth > 0) {
     if (!dirty_) {
       FolderLock lock(path_, LOCK_SH);
@@ -851,6 +865,7 @@ LONG HiveFile::update(const std::function<LONG(Key &, bool &changed)> &writer) {
 }
 
 LONG HiveFile::change(const std::function<LONG(const Key &, Change &)> &writer) {
+  ++editCount;
   Change change(rootName_);
   if (batchDepth > 0) {
     return update([&](Key &tree, bool &changed) -> LONG {

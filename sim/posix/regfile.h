@@ -89,6 +89,11 @@ bool applyChange(std::string_view text, const std::string &rootName, Key &tree);
 // change log replayed. False with a reason when the hive is not valid.
 bool loadHive(const std::string &path, const std::string &rootName, Key &out, std::string &error);
 
+// Counts the times any tree this process keeps may have changed (read anew,
+// changed, made or dropped): what was found in a tree stays valid while the
+// count stands.
+unsigned long long treeEdits();
+
 // One hive file shared by every process of the world. Each operation works on
 // the current content. A process keeps the tree it read; before each operation
 // it compares the hive and its change log with what it read (two stat calls,

@@ -259,6 +259,30 @@ bool injectedFailure(const char *function) {
   return false;
 }
 
+// Where the last enumeration by index stood, so that listing a key of n
+// entries index after index costs n steps rather than n * n / 2. Kept only
+// while no tree of this process changed (the caller holds registryMutex).
+template <typename Map> struct EnumCursor {
+  unsigned long long edits = 0;
+  const Map *map = nullptr;
+  DWORD index = 0;
+  typename Map::const_iterator at;
+};
+
+// The entry at `index` (< map.size()) of `map`.
+template <typename Map>
+typename Map::const_iterator entryAt(const Map &map, DWORD index, EnumCursor<Map> &cursor) {
+  unsigned long long edits = hive::treeEdits();
+  bool resume = cursor.map == &map && cursor.edits == edits && cursor.index <= index;
+  auto it = resume ? cursor.at : map.begin();
+  std::advance(it, index - (resume ? cursor.index : 0));
+  cursor = {edits, &map, index, it};
+  return it;
+}
+
+EnumCursor<std::map<std::string, Key>> subkeyCursor;
+EnumCursor<std::map<std::string, hive::Value>> valueCursor;
+
 } // namespace
 
 // One change of the hive: the key (created when missing) and every value.
@@ -350,7 +374,7 @@ LONG RegEnumKeyExA(HKEY hKey, DWORD dwIndex, LPSTR lpName, LPDWORD lpcchName, LP
   return readKey(hKey, [&](const hive::Key &key) -> LONG {
     if (dwIndex >= key.subkeys.size())
       return ERROR_NO_MORE_ITEMS;
-    LONG rc = copyName(std::next(key.subkeys.begin(), dwIndex)->second.name, lpName, lpcchName);
+    LONG rc = copyName(entryAt(key.subkeys, dwIndex, subkeyCursor)->second.name, lpName, lpcchName);
     if (rc == ERROR_SUCCESS && lpClass != nullptr && lpcchClass != nullptr && *lpcchClass > 0) {
       lpClass[0] = '\0';
       *lpcchClass = 0;
@@ -369,7 +393,7 @@ LONG RegEnumValueA(HKEY hKey, DWORD dwIndex, LPSTR lpValueName, LPDWORD lpcchVal
   return readKey(hKey, [&](const hive::Key &key) -> LONG {
     if (dwIndex >= key.values.size())
       return ERROR_NO_MORE_ITEMS;
-    const hive::Value &value = std::next(key.values.begin(), dwIndex)->second;
+    const hive::Value &value = entryAt(key.values, dwIndex, valueCursor)->second;
     LONG rc = copyName(value.name, lpValueName, lpcchValueName);
     return rc == ERROR_SUCCESS ? copyData(value, lpType, lpData, lpcbData) : rc;
   });
