@@ -79,6 +79,7 @@ struct ServicesStep {
   char referenceService[kServiceNameSize] = {};
   char nodesFile[KXL_JOINED_PATH_SZ] = {};
   char savedNodesFile[KXL_JOINED_PATH_SZ] = {};
+  bool nodesSaved = false; // the saved copy is there until it is put back
   ClusterProfile cluster;
   SQLO_PREG_MACHINE *machine = nullptr;
 
@@ -303,6 +304,7 @@ int32_t saveNodesFile(ServicesStep &step) {
   if (!savedNodesFilePath(step.nodesFile, step.savedNodesFile))
     return unformed();
   int32_t rc = sqlocopy(step.nodesFile, step.savedNodesFile, 0);
+  step.nodesSaved = rc == 0;
   return isCopied(rc) ? 0 : traced(kProbeSaveNodes, rc);
 }
 
@@ -399,6 +401,7 @@ int32_t restoreNodesFile(ServicesStep &step) {
   int32_t rc = sqlocopy(step.savedNodesFile, step.nodesFile, 0);
   if (!isCopied(rc))
     return traced(kProbeRestoreNodes, rc);
+  step.nodesSaved = false;
   sqlodelete(step.savedNodesFile, 0);
   return 0;
 }
@@ -507,6 +510,14 @@ int32_t repointPartitions(ServicesStep &step) {
   return forEachNode(step, [&](const unsigned char *entry) { return repointPartition(step, entry); });
 }
 
+// A failed step leaves the nodes file as it was and no saved copy of it: the
+// undo's restore of the instance directory removes no file. A copy that
+// cannot be put back stays, as the nodes file's only whole copy.
+void putBackNodesFile(ServicesStep &step) {
+  if (step.nodesSaved && sqlocopy(step.savedNodesFile, step.nodesFile, 0) == 0)
+    sqlodelete(step.savedNodesFile, 0);
+}
+
 // ---- single service -------------------------------------------------------------
 
 // The instance's service on another machine of its cluster.
@@ -608,6 +619,8 @@ int32_t upgradeInstanceServices(UpgradeContext &context, UpgradeOptions &options
   pdtEntry(KXL_FN_UPGRADE_INSTANCE_SERVICES);
   ServicesStep step(context, options);
   int32_t rc = runServicesStep(step);
+  if (rc != 0)
+    putBackNodesFile(step);
   if (step.cluster.key != nullptr)
     RegCloseKey(step.cluster.key);
   sqloPRegMachineClose(&step.machine);

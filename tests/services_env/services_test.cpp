@@ -224,6 +224,19 @@ TEST_F(PartitionedServicesTest, NodesFileFailuresAndUnreachableMachine) {
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=90 rc=-1913"));
 }
 
+// A step that fails once the nodes file is saved puts it back and leaves no
+// saved copy: the undo's restore of the instance directory removes no file.
+TEST_F(PartitionedServicesTest, FailedStepLeavesTheNodesFileAndNoCopy) {
+  for (const char *fault : {"sqloQueryNTServiceConfig:1", "sqlo_instance_create_extended:1",
+                            "sqlocopy:2", "sqloPRegMachineOpen:1"}) {
+    SCOPED_TRACE(fault);
+    failCalls(fault);
+    EXPECT_NE(0, run());
+    EXPECT_EQ(kNodes, readText(nodesPath()));
+    EXPECT_FALSE(pathExists(nodesPath() + ".mig"));
+  }
+}
+
 // With -u, the partitions' accounts are kept for the undo before anything
 // changes. A service that cannot be changed, or another machine's program path
 // that cannot be read (here: too long), fails the step instead of leaving a
