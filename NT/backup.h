@@ -5,9 +5,6 @@
 
 #include "NT/driverstate.h"
 
-inline constexpr int32_t UPGRADE_RC_BACKUP_FAILED = -1969;
-inline constexpr int32_t UPGRADE_RC_PROFILE_PATH_FAILED = -1959;
-
 // Trace points of the two steps.
 inline constexpr uint32_t kProbeTempPath = 20;
 inline constexpr uint32_t kProbeTempName = 30;

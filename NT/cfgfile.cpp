@@ -5,7 +5,6 @@ namespace kxlcfg {
 namespace {
 
 constexpr uint32_t kShare = SQLO_SHAREREAD | SQLO_SHAREWRITE;
-constexpr uint32_t kMode = 0x644;
 
 uint32_t flagsFor(Access access) {
   switch (access) {
@@ -35,19 +34,12 @@ void put32(unsigned char *image, uint32_t offset, uint32_t value) {
   put16(image, offset + 2, static_cast<uint16_t>(value >> 16));
 }
 
-uint32_t checksum(const unsigned char *bytes, uint32_t size) {
-  uint32_t sum = 0;
-  for (uint32_t at = kChecksumStart; at < size; ++at)
-    sum += bytes[at];
-  return sum;
-}
-
 void sealImage(unsigned char *image) {
-  put32(image, 0, checksum(image, kImageSize));
+  put32(image, 0, dbmCfgChecksum(image, kImageSize));
 }
 
 File::File(const char *path, Access access) {
-  int32_t rc = sqloopenp(path, flagsFor(access), kMode, &handle_, 0);
+  int32_t rc = sqloopenp(path, flagsFor(access), SQLO_MODE_FILE, &handle_, 0);
   if (rc != 0 && rc != SQLO_RC_FILE_EXISTED)
     handle_ = nullptr;
 }

@@ -4,6 +4,7 @@
 // helpers of the 16384-byte image.
 #pragma once
 
+#include "platform/dbmcfgfile.h"
 #include "platform/kxlsys.h"
 
 #include <cstdint>
@@ -11,13 +12,10 @@
 namespace kxlcfg {
 
 inline constexpr uint32_t kImageSize = 16384;
-inline constexpr uint32_t kChecksumStart = 4; // the sum covers the bytes from here on
 
 // ---- fields -----------------------------------------------------------------
 void put16(unsigned char *image, uint32_t offset, uint16_t value);
 void put32(unsigned char *image, uint32_t offset, uint32_t value);
-// Unsigned sum of the bytes from offset 4 up to `size`.
-uint32_t checksum(const unsigned char *bytes, uint32_t size);
 // Stores the checksum of a 16384-byte image at offset 0.
 void sealImage(unsigned char *image);
 

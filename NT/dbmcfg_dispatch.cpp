@@ -2,6 +2,7 @@
 // types, finishes the image and rewrites the target.
 #include "NT/dbmcfg.h"
 #include "NT/dbmcfg_internal.h"
+#include "upgrade/errortrace.h"
 
 #include <cstring>
 #include <memory>
@@ -37,8 +38,10 @@ struct Work {
   LoadedFile target;
 };
 
+constexpr ErrorTrace traced{KXL_FN_UPGRADE_DBM_CONFIG};
+
 int32_t fail(uint32_t probe, int32_t rc) {
-  pdtError(KXL_FN_UPGRADE_DBM_CONFIG, probe, rc);
+  traced(probe, rc);
   pdtExit(KXL_FN_UPGRADE_DBM_CONFIG, rc, probe);
   return rc;
 }

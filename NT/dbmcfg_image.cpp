@@ -22,7 +22,7 @@ int32_t rereadSmall(const char *path, unsigned char *small) {
     return KXL_DBMCFG_RC_FILE;
   uint32_t filled = 0;
   if (file.readUpTo(small, kSmallSize, &filled) != 0 || filled < kSmallSize)
-    return KXL_DBMCFG_RC_SMALL_READ;
+    return UPGRADE_RC_CONFIG_FILE;
   return 0;
 }
 
@@ -34,11 +34,11 @@ int32_t checkRelease(const unsigned char *image) {
 }
 
 int32_t verifyImage(const unsigned char *image) {
-  return get32(image, 0) == checksum(image, kImageSize) ? 0 : KXL_DBMCFG_RC_CHECKSUM;
+  return get32(image, 0) == dbmCfgChecksum(image, kImageSize) ? 0 : KXL_DBMCFG_RC_CHECKSUM;
 }
 
 int32_t expandSmall(const unsigned char *small, unsigned char *image) {
-  if (get32(small, 0) != checksum(small, kSmallSize))
+  if (get32(small, 0) != dbmCfgChecksum(small, kSmallSize))
     return KXL_DBMCFG_RC_SMALL_CHECKSUM;
   std::memset(image, 0, kImageSize);
   std::memcpy(image, small, kSmallFlagArea);

@@ -5,6 +5,7 @@
 #pragma once
 
 #include "NT/cfgfile.h"
+#include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
 
 #include <cstddef>
@@ -20,7 +21,6 @@ inline constexpr uint32_t kFlagArea = 15872;     // flag area of the current lay
 inline constexpr uint32_t kSmallFlagArea = 3584; // flag area of the small layout
 inline constexpr uint32_t kReleaseOffset = 16;   // u16 release word
 inline constexpr uint32_t kLevelOffset = 20;     // u16 level word
-inline constexpr uint32_t kNodeTypeOffset = 40;  // u16 node type
 inline constexpr uint16_t kReleaseMask = 0x0F00; // release code bits of the release word
 inline constexpr uint16_t kRelease10 = 0x0A00;   // oldest release code understood
 inline constexpr uint16_t kRelease11 = 0x0B00;
@@ -46,11 +46,10 @@ inline uint16_t releaseCode(const unsigned char *image) {
   return get16(image, kReleaseOffset) & kReleaseMask;
 }
 inline uint16_t nodeType(const unsigned char *image) {
-  return get16(image, kNodeTypeOffset);
+  return get16(image, KXLI_NODE_TYPE_OFFSET);
 }
 
 // ---- validation (dbmcfg_image.cpp) -------------------------------------------
-using kxlcfg::checksum;
 using kxlcfg::sealImage;
 // 0, or -101 when the release code is not one this conversion knows.
 int32_t checkRelease(const unsigned char *image);

@@ -194,9 +194,10 @@ bool applyRule(const unsigned char *image, const RangeRow &row, const Rule &rule
 }
 
 const Rule &ruleFor(const RangeRow &row, uint16_t type) {
-  if (type == 2 && row.noServer.check != Check::Same)
+  if (type == KXL_NODE_TYPE_CLIENT && row.noServer.check != Check::Same)
     return row.noServer;
-  if (type != 2 && type != 4 && row.otherServer.check != Check::Same)
+  if (type != KXL_NODE_TYPE_CLIENT && type != KXL_NODE_TYPE_PARTITIONED &&
+      row.otherServer.check != Check::Same)
     return row.otherServer;
   return row.server;
 }

@@ -25,7 +25,8 @@ template <std::size_t N> bool listed(const char *name, const char *const (&names
 } // namespace
 
 bool nodeTypeIsChecked(uint32_t nodeType) {
-  return nodeType == 1 || nodeType == 3 || nodeType == 4;
+  return nodeType == KXL_NODE_TYPE_STANDALONE || nodeType == KXL_NODE_TYPE_SERVER ||
+         nodeType == KXL_NODE_TYPE_PARTITIONED;
 }
 
 bool editionHostsNodeType(const char *editionName, uint32_t nodeType) {
@@ -33,9 +34,9 @@ bool editionHostsNodeType(const char *editionName, uint32_t nodeType) {
     return true;
   if (editionName == nullptr || editionName[0] == '\0')
     return false;
-  if (nodeType == 4)
+  if (nodeType == KXL_NODE_TYPE_PARTITIONED)
     return listed(editionName, kPartitionedEditions, std::size(kPartitionedEditions));
-  if (nodeType == 3)
+  if (nodeType == KXL_NODE_TYPE_SERVER)
     return listed(editionName, kServerEditions, std::size(kServerEditions));
   return listed(editionName, kServerEditions, kStandaloneEditionCount);
 }

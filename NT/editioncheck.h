@@ -8,8 +8,6 @@
 
 class InstallCopy;
 
-inline constexpr int32_t UPGRADE_RC_EDITION_MISMATCH = 1231;
-
 // True when `editionName` (compared ignoring case) is one of the editions
 // allowed for `nodeType`. Node types other than 1, 3 and 4 are not checked,
 // so every edition passes for them.

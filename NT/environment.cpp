@@ -1,11 +1,11 @@
 #include "NT/environment.h"
 
 #include "NT/cfgfile.h"
-#include "NT/errortrace.h"
 #include "NT/localhost.h"
 #include "NT/pathjoin.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
+#include "upgrade/errortrace.h"
 
 #include <cctype>
 #include <cstring>
@@ -17,8 +17,7 @@ constexpr uint32_t kResolveFlags = 1;
 constexpr uint32_t kReservePorts = 3;
 constexpr uint32_t kNodesFileFlags = 842;     // create, write only, shared, binary
 constexpr uint32_t kProfileScriptFlags = 843; // the same, written through
-constexpr uint32_t kTextFileMode = 0x644;
-constexpr uint32_t kCharsetClassPrefix = 13; // the name characters follow the class prefix
+constexpr uint32_t kCharsetClassPrefix = 13;  // the name characters follow the class prefix
 constexpr size_t kWorkstationChars = ENV_CFG_WORKSTATION_SZ - 1;
 constexpr const char kClientComponent[] = "KXL Zelquor Client";
 
@@ -46,7 +45,7 @@ constexpr ErrorTrace traced{KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT};
 // The -1 result whose reason is SQLCODE -1042 in the caller's status block.
 int32_t commFailure(uint32_t probe, sqlca *ca) {
   if (ca != nullptr)
-    sqlcaSetCode(*ca, ENVIRONMENT_SQLCODE_COMM);
+    sqlcaSetCode(*ca, UPGRADE_SQLCODE_PARTITION_SETUP);
   return traced(probe, UPGRADE_RC_SQLCA);
 }
 
@@ -174,7 +173,7 @@ bool workstationName(char *name) {
 // The machine-specific fields of a server image. `changed` is set when one
 // is written; a failed measure ends the tuning with its code.
 int32_t tuneMeasures(unsigned char *image, uint32_t workstationFlag, bool &changed) {
-  uint16_t nodeType = sqloLe16(image, ENV_CFG_NODE_TYPE);
+  uint16_t nodeType = sqloLe16(image, KXLI_NODE_TYPE_OFFSET);
   if (nodeType == 2)
     return 0;
   float cpu = 0;
@@ -183,7 +182,7 @@ int32_t tuneMeasures(unsigned char *image, uint32_t workstationFlag, bool &chang
     return traced(kProbeCpu, rc);
   putF32(image, ENV_CFG_CPU_MEASURE, cpu);
   changed = true;
-  if (nodeType == 4) {
+  if (nodeType == KXL_NODE_TYPE_PARTITIONED) {
     float bandwidth = 0;
     rc = sqloGetCommBandwidth(&bandwidth, nodeType);
     if (rc != 0)
@@ -204,10 +203,10 @@ static_assert(ENV_CFG_IMAGE_SZ == kxlcfg::kImageSize);
 int32_t readImage(const char *path, unsigned char *image) {
   kxlcfg::File file(path, kxlcfg::Access::Update);
   if (!file.isOpen())
-    return traced(kProbeOpen, ENVIRONMENT_RC_CONFIG_FILE);
+    return traced(kProbeOpen, UPGRADE_RC_CONFIG_FILE);
   uint32_t got = 0;
   if (file.readUpTo(image, ENV_CFG_IMAGE_SZ, &got) != 0 || got != ENV_CFG_IMAGE_SZ)
-    return traced(kProbeRead, ENVIRONMENT_RC_CONFIG_FILE);
+    return traced(kProbeRead, UPGRADE_RC_CONFIG_FILE);
   return 0;
 }
 
@@ -219,11 +218,11 @@ int32_t rewriteImage(const char *path, unsigned char *image) {
   case kxlcfg::WriteResult::Written:
     return 0;
   case kxlcfg::WriteResult::NotOpened:
-    return traced(kProbeSeek, ENVIRONMENT_RC_CONFIG_FILE);
+    return traced(kProbeSeek, UPGRADE_RC_CONFIG_FILE);
   case kxlcfg::WriteResult::Failed:
     break;
   }
-  return traced(kProbeWrite, ENVIRONMENT_RC_CONFIG_FILE);
+  return traced(kProbeWrite, UPGRADE_RC_CONFIG_FILE);
 }
 
 int32_t tuneConfigFile(const char *instanceDir, const char *installPath, uint32_t workstationFlag) {
@@ -256,7 +255,7 @@ int32_t settleHostName(PartitionRecord &record, sqlca *ca) {
   if (record.hostName[0] != '\0') {
     char resolved[SQLO_HOSTNAME_SZ] = {};
     if (sqloPdbTcpIpResolveHostName(record.hostName, resolved, kFullHostName, kResolveFlags) != 0)
-      return traced(kProbeHost, ENVIRONMENT_RC_HOST_UNKNOWN);
+      return traced(kProbeHost, UPGRADE_RC_HOST_UNKNOWN);
     return 0;
   }
   if (!readLocalFullHostName(record.hostName))
@@ -281,7 +280,7 @@ int32_t settlePorts(const char *instanceName, PartitionRecord &record) {
   if (record.portStart[0] != '\0' && record.portEnd[0] != '\0')
     return 0;
   if (sqloUpdateServiceFile(kReservePorts, instanceName, record.portStart, record.portEnd) != 0)
-    return traced(kProbePorts, ENVIRONMENT_RC_SERVICES_FILE);
+    return traced(kProbePorts, UPGRADE_RC_SERVICES_FILE);
   terminateFields(record);
   return 0;
 }
@@ -291,7 +290,7 @@ int32_t setInstanceVariable(const char *instanceName, uint32_t variable, const c
   // A value that could not be formed is never set as an empty one.
   if (ossSnprintf(text, sizeof text, "%s", value) < 0 ||
       sqloPRegValuePE(SQLO_PREG_SET, &variable, 0, text, instanceName, SQLO_PREG_ANY_NODE, 0) != 0)
-    return traced(kProbeVariables, ENVIRONMENT_RC_PROFILE_VALUE);
+    return traced(kProbeVariables, UPGRADE_RC_NO_COPY);
   return 0;
 }
 
@@ -320,7 +319,7 @@ bool writeTextFile(const char *directory, const char *name, uint32_t flags, cons
   char path[KXL_JOINED_PATH_SZ];
   joinPath(path, directory, name);
   SQLO_FHANDLE handle = nullptr;
-  int32_t rc = sqloopenp(path, flags, kTextFileMode, &handle, 0);
+  int32_t rc = sqloopenp(path, flags, SQLO_MODE_FILE, &handle, 0);
   if (rc != 0 && rc != SQLO_RC_FILE_EXISTED)
     return false;
   uint32_t length = static_cast<uint32_t>(std::strlen(text));

@@ -10,16 +10,8 @@
 
 inline constexpr uint32_t KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT = 0x18780540u;
 
-// Results besides those passed up from the platform calls.
-inline constexpr int32_t ENVIRONMENT_RC_CONFIG_FILE = -5005;   // kxlsystm open/read/seek/write
-inline constexpr int32_t ENVIRONMENT_RC_HOST_UNKNOWN = -1922;  // given host name does not resolve
-inline constexpr int32_t ENVIRONMENT_RC_SERVICES_FILE = -1923; // ports cannot be reserved
-inline constexpr int32_t ENVIRONMENT_RC_PROFILE_VALUE = -1918; // variable 159 or 160 not set
-inline constexpr int32_t ENVIRONMENT_SQLCODE_COMM = -1042;     // status block code for the -1 results
-
 // Layout of the fields this step writes into the 16384-byte kxlsystm image.
 inline constexpr uint32_t ENV_CFG_IMAGE_SZ = 16384;
-inline constexpr uint32_t ENV_CFG_NODE_TYPE = 40;        // u16
 inline constexpr uint32_t ENV_CFG_WORKSTATION_FLAG = 46; // u16
 inline constexpr uint32_t ENV_CFG_CPU_MEASURE = 808;     // f32
 inline constexpr uint32_t ENV_CFG_WORKSTATION = 1968;    // 9 bytes

@@ -6,8 +6,6 @@
 
 namespace {
 
-constexpr uint32_t kNodeTypeWithoutServer = 2;
-
 // 0 when the directory is there, OSS_RC_PATH_NOT_FOUND when it is missing; a
 // test that fails is never taken for a directory that is there.
 uint32_t testDirectory(const char *path) {
@@ -23,7 +21,7 @@ int32_t copyIfNeeded(const UpgradeContext &context, const char *newProfilePath, 
   uint32_t tested = testDirectory(newFunctions);
   if (tested != OSS_RC_PATH_NOT_FOUND)
     return static_cast<int32_t>(tested);
-  if (context.nodeType == kNodeTypeWithoutServer)
+  if (context.nodeType == KXL_NODE_TYPE_CLIENT)
     return 0;
   return sqlocopydir(newFunctions, oldFunctions, 0);
 }

@@ -1,6 +1,7 @@
 #include "NT/instfiles.h"
 
 #include "NT/pathjoin.h"
+#include "platform/dbmcfgfile.h"
 #include "platform/kxlsys.h"
 #include "upgrade/records.h"
 
@@ -8,11 +9,7 @@
 
 namespace {
 
-// Configuration template per node type 1 to 5, in the copy's CFG folder.
-constexpr const char *kTemplates[] = {"kxlsyssv", "kxlsysrq", "kxlsyssr", "kxlsysmp", "kxlsysst"};
-
 constexpr uint32_t kTemplateOpenFlags = 0x314;
-constexpr uint32_t kTemplateOpenMode = 0x750;
 constexpr uint32_t kServiceNameSize = 30; // "%s-%d": 29 characters
 
 bool isActiveState(int32_t code) {
@@ -58,8 +55,8 @@ bool anyPartitionActive(UpgradeContext &context, const UpgradeOptions &options) 
 
 bool isInstanceActive(UpgradeContext &context, UpgradeOptions &options) {
   pdtEntry(KXL_FN_IS_INSTANCE_ACTIVE);
-  bool active = options.partitionedInstance == 0 ? serviceActive(options.instanceName, nullptr)
-                                                 : anyPartitionActive(context, options);
+  bool active = !isPartitioned(options) ? serviceActive(options.instanceName, nullptr)
+                                        : anyPartitionActive(context, options);
   pdtExit(KXL_FN_IS_INSTANCE_ACTIVE, active ? 1 : 0, 0);
   return active;
 }
@@ -74,13 +71,14 @@ bool hasNodeTypeTemplate(UpgradeContext &, UpgradeOptions &options, uint32_t nod
 
 int32_t lookForNodeTypeTemplate(const UpgradeOptions &options, uint32_t nodeType, bool &found) {
   found = false;
-  if (nodeType < 1 || nodeType > 5)
+  const char *name = dbmCfgTemplateName(nodeType);
+  if (name == nullptr)
     return 0;
   char folder[KXL_JOINED_PATH_SZ], path[KXL_JOINED_PATH_SZ];
   joinPath(folder, options.currentInstallPath, "CFG");
-  joinPath(path, folder, kTemplates[nodeType - 1]);
+  joinPath(path, folder, name);
   SQLO_FHANDLE handle = nullptr;
-  int32_t rc = sqloopenp(path, kTemplateOpenFlags, kTemplateOpenMode, &handle, 0);
+  int32_t rc = sqloopenp(path, kTemplateOpenFlags, SQLO_MODE_PROGRAM, &handle, 0);
   if (rc == SQLO_RC_FILE_NOT_FOUND || rc == SQLO_RC_PATH_NOT_FOUND)
     return 0;
   if (rc != 0)

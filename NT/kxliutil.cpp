@@ -25,7 +25,6 @@
 
 namespace {
 
-constexpr uint32_t kPartitionedNodeType = 4;
 constexpr int32_t kToCurrentServerType = 1;
 
 // Trace points.
@@ -45,13 +44,9 @@ constexpr uint32_t kProbeForcedKeys = 210;
 constexpr uint32_t kProbeDropFailed = 310;     // diagnostic log only
 constexpr uint32_t kProbeUndoIncomplete = 320; // diagnostic log only
 
-bool isPartitioned(const DriverState &state) {
-  return state.options.partitionedInstance == 1 || state.context.nodeType == kPartitionedNodeType;
-}
-
 StepResult takeInstanceName(DriverState &state) {
   state.context.instance->GetName(state.instanceName, sizeof state.instanceName);
-  if (isPartitioned(state))
+  if (isPartitioned(state.options))
     sqloPdbCommFncInit();
   return stepDone();
 }
@@ -65,7 +60,7 @@ StepResult refuseActiveInstance(DriverState &state) {
 // A partitioned instance whose node list is missing, empty or unreadable has
 // no partition to check, move or re-point: refused before anything changes.
 StepResult requireNodeList(DriverState &state) {
-  if (!isPartitioned(state) ||
+  if (!isPartitioned(state.options) ||
       (state.context.nodeList != nullptr && sqloNodeListCount(state.context.nodeList) > 0))
     return stepDone();
   state.options.tokenCount = 1;
@@ -79,7 +74,7 @@ StepResult findCurrentCopy(DriverState &state) {
   if (sqloGetCurrentInstallationName(state.currentCopyName, sizeof state.currentCopyName) != 0 ||
       state.context.copies == nullptr ||
       state.context.copies->Find(state.currentCopyName, &state.currentCopy) != 0)
-    return stepFailed(kProbeCurrentCopy, UPGRADE_RC_COPY_NOT_FOUND);
+    return stepFailed(kProbeCurrentCopy, UPGRADE_RC_NO_COPY);
   return stepDone();
 }
 
@@ -143,7 +138,7 @@ StepResult upgradeSsl(DriverState &state) {
 StepResult rereadCopies(DriverState &state) {
   state.rereadCopies = new (std::nothrow) InstallCopyList(false, false);
   if (state.rereadCopies == nullptr || state.rereadCopies->status != 0)
-    return stepFailed(kProbeReread, UPGRADE_RC_COPY_NOT_FOUND);
+    return stepFailed(kProbeReread, UPGRADE_RC_NO_COPY);
   return stepDone();
 }
 
@@ -155,7 +150,7 @@ StepResult findUpgradedInstance(DriverState &state) {
   if (state.rereadCopies->Find(state.currentCopyName, &copy) != 0 || copy == nullptr ||
       copy->GetInstanceList(&instances) != 0 || instances == nullptr ||
       instances->Find(state.instanceName, &state.newInstance) != 0 || state.newInstance == nullptr)
-    return stepFailed(kProbeInstanceFound, UPGRADE_RC_COPY_NOT_FOUND);
+    return stepFailed(kProbeInstanceFound, UPGRADE_RC_NO_COPY);
   state.newInstance->GetInstanceDir(state.newInstanceDir, sizeof state.newInstanceDir);
   joinPath(state.backupConfigFile, state.backupDir, "\\kxlsystm");
   joinPath(state.newConfigFile, state.newInstanceDir, "\\kxlsystm");
@@ -165,7 +160,7 @@ StepResult findUpgradedInstance(DriverState &state) {
 StepResult prepareEnvironment(DriverState &state) {
   sqloPutEnv(KXL_VAR_KXLINSTANCE, state.instanceName);
   sqlo_force_refresh_env();
-  uint32_t partitioned = state.nodeType == kPartitionedNodeType ? 1 : 0;
+  uint32_t partitioned = state.nodeType == KXL_NODE_TYPE_PARTITIONED ? 1 : 0;
   int32_t rc = sqleInitApplicationEnvironment(0, 0, partitioned, nullptr);
   return rc != 0 ? stepFailed(kProbeEnvironment, rc) : stepDone();
 }
@@ -274,7 +269,7 @@ bool dropRecreatedInstance(DriverState &state) {
   if (nodeType == 0)
     return true;
   int32_t rc = 0;
-  if (nodeType == kPartitionedNodeType) {
+  if (nodeType == KXL_NODE_TYPE_PARTITIONED) {
     SQLO_INST_OUT first{}, second{};
     rc = sqlo_instance_delnode(state.instanceName, 0, nullptr, 0, &first, &second);
   }
@@ -383,7 +378,7 @@ void prepareRecord(DriverState &state) {
 int upgradeInstance(UpgradeContext &context, UpgradeOptions &options) {
   pdtEntry(KXL_FN_UPGRADE_INSTANCE);
   DriverState state(context, options);
-  int32_t rc = UPGRADE_RC_COPY_NOT_FOUND;
+  int32_t rc = UPGRADE_RC_NO_COPY;
   if (context.instance != nullptr) {
     prepareRecord(state);
     rc = runSteps(state, 0);

@@ -9,15 +9,6 @@ class UpgradeContext;
 
 inline constexpr uint32_t KXL_FN_UPGRADE_INSTANCE = 0x18780502u;
 
-// Results of the driver besides those its callees pass up unchanged.
-inline constexpr int32_t UPGRADE_RC_INSTANCE_ACTIVE = -1953;
-inline constexpr int32_t UPGRADE_RC_DBM_CONFIG_FAILED = -1947;
-// The installed copies cannot be re-read after the move, the current copy
-// is missing, or the instance is not found under it.
-inline constexpr int32_t UPGRADE_RC_COPY_NOT_FOUND = -1918;
-// A partitioned instance whose node list is missing, empty or unreadable.
-inline constexpr int32_t UPGRADE_RC_NO_NODE_LIST = -1960;
-
 // Upgrades the context's bound instance. 0 on success, a positive notice
 // code, a negative message code, or -1 with the reason in options.status.
 // On failure the instance's re-creation is dropped, the registry profile is

@@ -1,7 +1,5 @@
 #include "NT/localhost.h"
 
-#include <cctype>
-
 namespace {
 
 constexpr uint32_t kFullHostName = 5; // the kind of name asked for: fully qualified
@@ -14,17 +12,5 @@ bool readLocalFullHostName(char (&host)[SQLO_HOSTNAME_SZ]) {
     return false;
   }
   host[sizeof host - 1] = '\0';
-  return true;
-}
-
-bool sameName(const char *a, const char *b, std::size_t limit) {
-  for (std::size_t i = 0; i < limit; ++i) {
-    int ca = std::tolower(static_cast<unsigned char>(a[i]));
-    int cb = std::tolower(static_cast<unsigned char>(b[i]));
-    if (ca != cb)
-      return false;
-    if (ca == '\0')
-      return true;
-  }
   return true;
 }

@@ -7,9 +7,9 @@
 #include "install/iutil.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
+#include "upgrade/errortrace.h"
 #include "upgrade/records.h"
 
-#include <cctype>
 #include <cstddef>
 #include <cstdio>
 #include <cstring>
@@ -22,8 +22,6 @@ constexpr const char kProductRoot[] = "SOFTWARE\\ZAV\\KXL";
 constexpr const char kServiceProgram[] = "kxlsyscs.exe";
 constexpr const char kClusterListValue[] = "KXLCLUSTERLIST";
 constexpr const char kLegacyPathValue[] = "KXLPATH";
-constexpr REGSAM kAllAccess = 0xF003F;
-constexpr REGSAM kReadAccess = 0x20019;
 constexpr int32_t kFirstNamedCopyVersion = 9; // copies from 9 on keep profiles under their name
 constexpr size_t kKeyPathSize = 512;
 constexpr size_t kCopyNameSize = 129;   // 128 characters
@@ -46,11 +44,6 @@ constexpr uint32_t kProbeCreateKey = 100;
 constexpr uint32_t kProbeCopyKey = 110;
 constexpr uint32_t kProbeDropKey = 120;
 constexpr uint32_t kProbeForcedKeysLeft = 210; // diagnostic log only
-
-int32_t traced(uint32_t function, uint32_t probe, int32_t rc) {
-  pdtError(function, probe, rc);
-  return rc;
-}
 
 // snprintf that reports whether the whole text fitted.
 template <class... Args> bool formatWhole(char *buffer, size_t size, const char *format, Args... args) {
@@ -111,14 +104,14 @@ bool loadKeys(const UpgradeContext &context, const UpgradeOptions &options, Prof
 
 // RegCreateKeyExA as the move and its undo call it.
 LONG createKey(HKEY root, const char *path, HKEY *key, DWORD *disposition) {
-  return RegCreateKeyExA(root, path, 0, nullptr, REG_OPTION_NON_VOLATILE, kAllAccess, nullptr, key,
+  return RegCreateKeyExA(root, path, 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_ALL_ACCESS, nullptr, key,
                          disposition);
 }
 
 // True when the key exists and holds neither values nor subkeys.
 bool isEmptyKey(HKEY root, const char *path) {
   HKEY key = nullptr;
-  if (RegOpenKeyExA(root, path, 0, kReadAccess, &key) != ERROR_SUCCESS)
+  if (RegOpenKeyExA(root, path, 0, KEY_READ, &key) != ERROR_SUCCESS)
     return false;
   char name[4];
   DWORD size = sizeof name;
@@ -142,7 +135,7 @@ size_t createdFrom(HKEY root, const char *path) {
       continue;
     std::string parent(path, at);
     HKEY key = nullptr;
-    LONG rc = RegOpenKeyExA(root, parent.c_str(), 0, kReadAccess, &key);
+    LONG rc = RegOpenKeyExA(root, parent.c_str(), 0, KEY_READ, &key);
     if (rc == ERROR_SUCCESS) {
       RegCloseKey(key);
       continue;
@@ -199,14 +192,14 @@ int32_t moveKey(HKEY root, const ProfileKeys &keys, bool force) {
   HKEY newKey = nullptr;
   DWORD disposition = 0;
   if (createKey(root, target, &newKey, &disposition) != ERROR_SUCCESS)
-    return traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
+    return ErrorTrace{KXL_FN_MOVE_INSTANCE_PROFILE}(kProbeCreateKey, UPGRADE_RC_NO_COPY);
   int32_t rc = 0;
   bool bothKept = false;
-  if (!force && !sameName(keys.old, target, kKeyPathSize)) {
+  if (!force && !kxliSameText(keys.old, target, kKeyPathSize)) {
     if (SHCopyKeyA(root, keys.old, newKey, 0) != ERROR_SUCCESS) {
-      rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
+      rc = ErrorTrace{KXL_FN_MOVE_INSTANCE_PROFILE}(kProbeCopyKey, UPGRADE_RC_NO_COPY);
     } else if (OldKey old = deleteOldKey(root, keys, target); old != OldKey::deleted) {
-      rc = traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeDropKey, KXL_RC_PROFILE_KEY);
+      rc = ErrorTrace{KXL_FN_MOVE_INSTANCE_PROFILE}(kProbeDropKey, UPGRADE_RC_NO_COPY);
       bothKept = old == OldKey::bothKept;
     }
   }
@@ -222,12 +215,12 @@ int32_t revertKey(HKEY root, const ProfileKeys &keys, bool force) {
   HKEY oldKey = nullptr;
   DWORD disposition = 0;
   if (createKey(root, keys.old, &oldKey, &disposition) != ERROR_SUCCESS)
-    return traced(KXL_FN_REVERT_INSTANCE_PROFILE, kProbeCreateKey, KXL_RC_PROFILE_KEY);
+    return ErrorTrace{KXL_FN_REVERT_INSTANCE_PROFILE}(kProbeCreateKey, UPGRADE_RC_NO_COPY);
   int32_t rc = 0;
   bool created = disposition != REG_OPENED_EXISTING_KEY;
   if (!force && created) {
     if (SHCopyKeyA(root, keys.current, oldKey, 0) != ERROR_SUCCESS)
-      rc = traced(KXL_FN_REVERT_INSTANCE_PROFILE, kProbeCopyKey, KXL_RC_PROFILE_KEY);
+      rc = ErrorTrace{KXL_FN_REVERT_INSTANCE_PROFILE}(kProbeCopyKey, UPGRADE_RC_NO_COPY);
     else
       SHDeleteKeyA(root, keys.current);
   }
@@ -246,11 +239,11 @@ int32_t revertKey(HKEY root, const ProfileKeys &keys, bool force) {
 // A key that is gone already (a run that was killed after deleting it) is
 // what the drop wants.
 int32_t dropForcedKey(HKEY root, const ProfileKeys &keys) {
-  if (sameName(keys.old, keys.force, kKeyPathSize))
+  if (kxliSameText(keys.old, keys.force, kKeyPathSize))
     return 0;
   LONG rc = SHDeleteKeyA(root, keys.old);
   if (rc != ERROR_SUCCESS && rc != ERROR_FILE_NOT_FOUND)
-    return traced(KXL_FN_MOVE_INSTANCE_PROFILE, kProbeDropKey, KXL_RC_PROFILE_KEY);
+    return ErrorTrace{KXL_FN_MOVE_INSTANCE_PROFILE}(kProbeDropKey, UPGRADE_RC_NO_COPY);
   return 0;
 }
 
@@ -291,7 +284,7 @@ struct MachineWalk {
 
   bool handledAlready(const char *machineName) const {
     for (const std::string &name : handled)
-      if (sameName(name.c_str(), machineName, SQLO_COMPUTERNAME_SZ))
+      if (kxliSameText(name.c_str(), machineName, SQLO_COMPUTERNAME_SZ))
         return true;
     return false;
   }
@@ -308,7 +301,7 @@ int32_t onMachine(MachineWalk &walk, const char *machineName, uint8_t force, uin
                   uint32_t keyProbe) {
   walk.handled.emplace_back(machineName);
   if (sqloPRegMachineOpen(machineName, &walk.machine) != 0 || walk.machine == nullptr)
-    return traced(walk.function, openProbe, KXL_RC_MACHINE_REGISTRY);
+    return ErrorTrace{walk.function}(openProbe, UPGRADE_RC_MACHINE_REGISTRY);
   int32_t rc = walk.operation(walk.context, walk.machine->hklm, walk.options, force);
   if (rc != 0)
     pdtError(walk.function, keyProbe, rc);
@@ -362,15 +355,15 @@ private:
 
 uint8_t forceFor(const UpgradeOptions &options, const char *localHost, const unsigned char *entry) {
   bool forced = (options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) != 0 &&
-                !sameName(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
+                !kxliSameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
   return forced ? 1 : 0;
 }
 
 int32_t localFullHostName(MachineWalk &walk, char (&host)[SQLO_HOSTNAME_SZ]) {
   if (readLocalFullHostName(host))
     return 0;
-  walk.options.status.sqlcode = KXL_RC_NO_LOCAL_HOST_NAME;
-  return traced(walk.function, kProbeLocalHost, UPGRADE_RC_SQLCA);
+  walk.options.status.sqlcode = UPGRADE_SQLCODE_PARTITION_SETUP;
+  return ErrorTrace{walk.function}(kProbeLocalHost, UPGRADE_RC_SQLCA);
 }
 
 using EntryHook = void (*)(MachineWalk &, const unsigned char *entry, uint8_t force, const char *localHost);
@@ -408,7 +401,7 @@ void readClusterList(const char *instance, char (&list)[kRegValueBuffer]) {
   char key[kKeyPathSize];
   list[0] = '\0';
   if (formatWhole(key, sizeof key, "Cluster\\ZAV\\KXL\\PROFILES\\%s", instance))
-    kxliReadRegString(HKEY_LOCAL_MACHINE, key, kAllAccess, kClusterListValue, list, sizeof list);
+    kxliReadRegString(HKEY_LOCAL_MACHINE, key, KEY_ALL_ACCESS, kClusterListValue, list, sizeof list);
 }
 
 // The machines of the cluster list that the first pass did not handle, through
@@ -419,12 +412,12 @@ int32_t walkCluster(MachineWalk &walk) {
   char computer[SQLO_COMPUTERNAME_SZ] = {};
   uint32_t size = sizeof computer;
   if (sqloGetComputerNameA(computer, &size) == 0)
-    return traced(walk.function, kProbeComputerName, lastSystemError());
+    return ErrorTrace{walk.function}(kProbeComputerName, lastSystemError());
   computer[sizeof computer - 1] = '\0';
   char *clusterName = walk.options.partitionRecord.clusterName;
   uint32_t nameRc = walk.context.instance->GetClusterName(clusterName, UPGRADE_CLUSTER_NAME_SZ);
   if (nameRc != 0)
-    return traced(walk.function, kProbeClusterName, static_cast<int32_t>(nameRc));
+    return ErrorTrace{walk.function}(kProbeClusterName, static_cast<int32_t>(nameRc));
   char list[kRegValueBuffer];
   readClusterList(walk.options.instanceName, list);
   int32_t first = 0;
@@ -434,7 +427,7 @@ int32_t walkCluster(MachineWalk &walk) {
     if (end != nullptr)
       *end = '\0';
     int32_t rc = 0;
-    if (name[0] != '\0' && !sameName(name, computer, SQLO_COMPUTERNAME_SZ) && !walk.handledAlready(name))
+    if (name[0] != '\0' && !kxliSameText(name, computer, SQLO_COMPUTERNAME_SZ) && !walk.handledAlready(name))
       rc = onMachine(walk, name, 0, kProbeClusterOpen, kProbeClusterKey);
     if (rc != 0 && !walk.keepGoing)
       return rc;
@@ -471,7 +464,8 @@ void ownerProgramPath(const UpgradeContext &context, char (&path)[kProgramPathSi
 // The machine's registry for reading: the walk's open one when it is that
 // machine's, else that machine opened anew; null when it cannot be reached.
 HKEY machineRoot(MachineWalk &walk, const char *machineName) {
-  if (walk.machine == nullptr || !sameName(walk.machine->machineName, machineName, SQLO_COMPUTERNAME_SZ)) {
+  if (walk.machine == nullptr ||
+      !kxliSameText(walk.machine->machineName, machineName, SQLO_COMPUTERNAME_SZ)) {
     if (sqloPRegMachineOpen(machineName, &walk.machine) != 0 || walk.machine == nullptr)
       return nullptr;
   }
@@ -485,7 +479,7 @@ void remoteProgramPath(MachineWalk &walk, const char *machineName, char (&path)[
   char key[kKeyPathSize];
   char installPath[kRegValueBuffer];
   if (root == nullptr || !formatWhole(key, sizeof key, "%s\\GLOBAL_PROFILE", kProductRoot) ||
-      kxliReadRegString(root, key, kReadAccess, kLegacyPathValue, installPath, sizeof installPath) !=
+      kxliReadRegString(root, key, KEY_READ, kLegacyPathValue, installPath, sizeof installPath) !=
           ERROR_SUCCESS ||
       installPath[0] == '\0')
     return;
@@ -545,7 +539,7 @@ void repointPartitionService(MachineWalk &walk, const unsigned char *entry, uint
   how.machine = sqloNodeMachine(entry);
   how.listedAs = how.machine;
   how.remoteProgram =
-      !forceCopyName(walk.options) && !sameName(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
+      !forceCopyName(walk.options) && !kxliSameText(sqloNodeHost(entry), localHost, SQLO_HOSTNAME_SZ);
   how.keepProgram = force != 0;
   char service[kServiceNameSize];
   partitionServiceName(walk, entry, service);
@@ -564,9 +558,9 @@ void repointClusterServices(MachineWalk &walk) {
   computer[sizeof computer - 1] = '\0';
   char list[kRegValueBuffer];
   readClusterList(walk.options.instanceName, list);
-  bool partitioned = walk.options.partitionedInstance == 1;
+  bool partitioned = isPartitioned(walk.options);
   for (char *name = std::strtok(list, " "); name != nullptr; name = std::strtok(nullptr, " ")) {
-    bool local = computer[0] != '\0' && sameName(name, computer, SQLO_COMPUTERNAME_SZ);
+    bool local = computer[0] != '\0' && kxliSameText(name, computer, SQLO_COMPUTERNAME_SZ);
     OwnedService how;
     how.machine = local ? nullptr : name;
     how.listedAs = name;
@@ -601,7 +595,7 @@ void repointLocalService(MachineWalk &walk) {
 // ---------------------------------------------------------------------------
 
 int32_t moveMachines(MachineWalk &walk) {
-  if (walk.options.partitionedInstance != 1)
+  if (!isPartitioned(walk.options))
     return onLocalMachine(walk, kProbeLocalKey);
   char localHost[SQLO_HOSTNAME_SZ] = {};
   if ((walk.options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) != 0) {
@@ -614,7 +608,7 @@ int32_t moveMachines(MachineWalk &walk) {
 
 // The old profile keys of the forced partitions' machines.
 int32_t dropForcedMachines(MachineWalk &walk) {
-  if (walk.options.partitionedInstance != 1 || (walk.options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) == 0)
+  if (!isPartitioned(walk.options) || (walk.options.flags & UPGRADE_FLAG_FORCE_COPY_NAME) == 0)
     return 0;
   char localHost[SQLO_HOSTNAME_SZ] = {};
   int32_t rc = localFullHostName(walk, localHost);
@@ -622,7 +616,7 @@ int32_t dropForcedMachines(MachineWalk &walk) {
 }
 
 int32_t revertMachines(MachineWalk &walk) {
-  if (walk.options.partitionedInstance != 1) {
+  if (!isPartitioned(walk.options)) {
     int32_t rc = onLocalMachine(walk, kProbeLocalKey);
     if (rc == 0)
       repointLocalService(walk);
@@ -635,7 +629,7 @@ int32_t revertMachines(MachineWalk &walk) {
 
 int32_t keysOrFailure(const UpgradeContext &context, const UpgradeOptions &options, ProfileKeys &keys,
                       uint32_t function) {
-  return loadKeys(context, options, keys) ? 0 : traced(function, kProbeCreateKey, KXL_RC_PROFILE_KEY);
+  return loadKeys(context, options, keys) ? 0 : ErrorTrace{function}(kProbeCreateKey, UPGRADE_RC_NO_COPY);
 }
 
 // The walk's operation after a successful force-copy-name upgrade.

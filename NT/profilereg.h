@@ -12,11 +12,6 @@ class UpgradeContext;
 inline constexpr uint32_t KXL_FN_MOVE_INSTANCE_PROFILE = 0x18780506u;
 inline constexpr uint32_t KXL_FN_REVERT_INSTANCE_PROFILE = 0x18780507u;
 
-// Results of the profile move besides 0 and the callees' own codes.
-inline constexpr int32_t KXL_RC_PROFILE_KEY = -1918;        // a profile key cannot be created or copied
-inline constexpr int32_t KXL_RC_MACHINE_REGISTRY = -1913;   // a machine's registry cannot be opened
-inline constexpr int32_t KXL_RC_NO_LOCAL_HOST_NAME = -1042; // put into options.status.sqlcode; result -1
-
 // Moves the profile key on the one machine whose HKEY_LOCAL_MACHINE is
 // `machineRoot`. force 1: the current copy gets the empty force-copy-name key;
 // the old key stays until dropForcedProfileKeys, so that a failed upgrade can

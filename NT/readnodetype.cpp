@@ -13,7 +13,6 @@ namespace {
 constexpr uint32_t kOpenFlags = 1092; // read only, binary, sequential
 constexpr uint32_t kOpenMode = 1872;
 constexpr uint32_t kImageSize = 16384;
-constexpr uint32_t kNodeTypeOffset = 40;
 
 // "<dir>\kxlsystm", or "\"<dir>\kxlsystm\"" for a directory in quotes.
 bool configFilePath(const IKXLINSTANCE &instance, char *path, size_t size) {
@@ -74,14 +73,14 @@ int32_t readNodeType(const IKXLINSTANCE *instance, uint32_t *nodeType) {
   rc = image ? readImage(file, image.get(), filled) : SQLO_RC_NO_MEMORY;
   sqloclose(file);
   // A file that ends before the word has no node type to give.
-  if (rc == 0 && filled < kNodeTypeOffset + 2)
+  if (rc == 0 && filled < KXLI_NODE_TYPE_OFFSET + 2)
     rc = SQLO_RC_INVALID_ARGUMENT;
   if (rc != 0) {
     pdtError(KXL_FN_READ_NODE_TYPE, 20, rc);
     pdtExit(KXL_FN_READ_NODE_TYPE, rc, 20);
     return rc;
   }
-  *nodeType = sqloLe16(image.get(), kNodeTypeOffset);
+  *nodeType = sqloLe16(image.get(), KXLI_NODE_TYPE_OFFSET);
   pdtExit(KXL_FN_READ_NODE_TYPE, 0, 0);
   return 0;
 }

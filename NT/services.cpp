@@ -1,13 +1,13 @@
 #include "NT/services.h"
 
 #include "NT/environment.h"
-#include "NT/errortrace.h"
 #include "NT/kxliutil.h"
 #include "NT/localhost.h"
 #include "NT/nodetypechoice.h"
 #include "NT/pathjoin.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
+#include "upgrade/errortrace.h"
 #include "upgrade/records.h"
 
 #include <cstring>
@@ -84,7 +84,7 @@ struct ServicesStep {
   SQLO_PREG_MACHINE *machine = nullptr;
 
   bool flag(uint16_t bit) const { return (options.flags & bit) != 0; }
-  bool partitioned() const { return options.partitionedInstance != 0; }
+  bool partitioned() const { return isPartitioned(options); }
   bool clustered() const { return context.instance != nullptr && context.instance->isClustered != 0; }
   const char *account() const { return options.userName[0] != '\0' ? options.userName : nullptr; }
   const char *password() const { return options.password[0] != '\0' ? options.password : nullptr; }
@@ -145,14 +145,14 @@ int32_t machineProgramPaths(HKEY hklm, const char *copyName, ProgramPaths &paths
   if (rc == ERROR_FILE_NOT_FOUND)
     return 0;
   if (rc != ERROR_SUCCESS)
-    return traced(kProbeProgramPath, SERVICES_RC_MACHINE_REGISTRY);
+    return traced(kProbeProgramPath, UPGRADE_RC_MACHINE_REGISTRY);
   char value[kKxlPathSize + 1] = {};
   DWORD size = kKxlPathSize;
   DWORD type = REG_NONE;
   rc = RegQueryValueExA(key, "KXLPATH", nullptr, &type, reinterpret_cast<BYTE *>(value), &size);
   RegCloseKey(key);
   if (rc != ERROR_SUCCESS && rc != ERROR_FILE_NOT_FOUND)
-    return traced(kProbeProgramPath, SERVICES_RC_MACHINE_REGISTRY);
+    return traced(kProbeProgramPath, UPGRADE_RC_MACHINE_REGISTRY);
   if (rc == ERROR_SUCCESS && (type == REG_SZ || type == REG_EXPAND_SZ) && value[0] != '\0')
     programPaths(value, paths);
   return 0;
@@ -160,7 +160,7 @@ int32_t machineProgramPaths(HKEY hklm, const char *copyName, ProgramPaths &paths
 
 int32_t openMachine(ServicesStep &step, const char *machineName, uint32_t probe) {
   if (sqloPRegMachineOpen(machineName, &step.machine) != 0)
-    return traced(probe, SERVICES_RC_MACHINE_REGISTRY);
+    return traced(probe, UPGRADE_RC_MACHINE_REGISTRY);
   return 0;
 }
 
@@ -195,7 +195,7 @@ int32_t writeClusterValues(HKEY key, const ClusterProfile &cluster) {
   if ((cluster.hasList && writeClusterValue(key, kClusterList, cluster.list) != ERROR_SUCCESS) ||
       (cluster.hasInstanceProfile &&
        writeClusterValue(key, kClusterInstanceProfile, cluster.instanceProfile) != ERROR_SUCCESS))
-    return traced(kProbeClusterProfile, SERVICES_RC_MACHINE_REGISTRY);
+    return traced(kProbeClusterProfile, UPGRADE_RC_MACHINE_REGISTRY);
   return 0;
 }
 
@@ -208,7 +208,7 @@ int32_t writeMachineClusterValues(const ServicesStep &step) {
   if (missing(opened))
     return 0;
   if (opened != ERROR_SUCCESS)
-    return traced(kProbeClusterProfile, SERVICES_RC_MACHINE_REGISTRY);
+    return traced(kProbeClusterProfile, UPGRADE_RC_MACHINE_REGISTRY);
   int32_t rc = writeClusterValues(key, step.cluster);
   RegCloseKey(key);
   return rc;
@@ -225,12 +225,12 @@ int32_t readClusterProfile(ServicesStep &step) {
   LONG opened = RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_ALL_ACCESS, &cluster.key);
   if (opened != ERROR_SUCCESS) {
     cluster.key = nullptr;
-    return missing(opened) ? 0 : traced(kProbeClusterProfile, SERVICES_RC_MACHINE_REGISTRY);
+    return missing(opened) ? 0 : traced(kProbeClusterProfile, UPGRADE_RC_MACHINE_REGISTRY);
   }
   LONG list = readClusterValue(cluster.key, kClusterList, cluster.list);
   LONG profile = readClusterValue(cluster.key, kClusterInstanceProfile, cluster.instanceProfile);
   if ((list != ERROR_SUCCESS && !missing(list)) || (profile != ERROR_SUCCESS && !missing(profile)))
-    return traced(kProbeClusterProfile, SERVICES_RC_MACHINE_REGISTRY);
+    return traced(kProbeClusterProfile, UPGRADE_RC_MACHINE_REGISTRY);
   cluster.hasList = list == ERROR_SUCCESS;
   cluster.hasInstanceProfile = profile == ERROR_SUCCESS;
   return 0;
@@ -345,7 +345,7 @@ int32_t readStartType(ServicesStep &step) {
   SQLO_SVC_CONFIG config{};
   SQLO_SVC_OUT out{};
   if (sqloQueryNTServiceConfig(step.referenceService, nullptr, &config, &out) != 0)
-    return traced(kProbeServiceConfig, SERVICES_RC_NO_SERVICE_CONFIG);
+    return traced(kProbeServiceConfig, UPGRADE_RC_NO_SERVICE_CONFIG);
   step.context.serviceStartType = config.startType;
   return 0;
 }
@@ -360,7 +360,7 @@ int32_t recordAccount(ServicesStep &step, const char *service, const char *machi
   if (rc == SQLO_RC_SVC_NOT_FOUND)
     return 0;
   if (rc != 0)
-    return traced(kProbeServiceAccount, SERVICES_RC_NO_SERVICE_CONFIG);
+    return traced(kProbeServiceAccount, UPGRADE_RC_NO_SERVICE_CONFIG);
   config.account[sizeof config.account - 1] = '\0';
   step.context.serviceAccounts.push_back({machine != nullptr ? machine : "", service, config.account});
   return 0;
@@ -408,14 +408,14 @@ int32_t restoreNodesFile(ServicesStep &step) {
 
 int32_t findLocalHost(ServicesStep &step) {
   if (!readLocalFullHostName(step.localHost)) {
-    sqlcaSetCode(step.options.status, SERVICES_SQLCODE_HOST);
+    sqlcaSetCode(step.options.status, UPGRADE_SQLCODE_PARTITION_SETUP);
     return traced(kProbeHostName, UPGRADE_RC_SQLCA);
   }
   return 0;
 }
 
 bool isLocalHost(const ServicesStep &step, const unsigned char *entry) {
-  return sameName(sqloNodeHost(entry), step.localHost, SQLO_HOSTNAME_SZ);
+  return kxliSameText(sqloNodeHost(entry), step.localHost, SQLO_HOSTNAME_SZ);
 }
 
 // The extender service of a partition; an existing one is changed instead.
@@ -558,7 +558,7 @@ int32_t repointSingleService(ServicesStep &step) {
   }
   local[sizeof local - 1] = '\0';
   return forEachClusterMachine(step, [&](const char *machine) {
-    if (local[0] != '\0' && sameName(machine, local, SQLO_COMPUTERNAME_SZ))
+    if (local[0] != '\0' && kxliSameText(machine, local, SQLO_COMPUTERNAME_SZ))
       return writeClusterValues(step.cluster.key, step.cluster);
     return repointClusterNode(step, machine);
   });
@@ -568,7 +568,7 @@ int32_t repointSingleService(ServicesStep &step) {
 // anything is changed, and never taken as empty when the read fails.
 int32_t readCopyName(ServicesStep &step) {
   if (sqloGetCurrentInstallationName(step.copyName, sizeof step.copyName) != 0 || step.copyName[0] == '\0')
-    return traced(kProbeCopyName, UPGRADE_RC_COPY_NOT_FOUND);
+    return traced(kProbeCopyName, UPGRADE_RC_NO_COPY);
   return 0;
 }
 
@@ -597,7 +597,7 @@ int32_t runServicesStep(ServicesStep &step) {
   if ((rc = recordAccounts(step)) != 0 || (rc = recreateInstance(step, newNodeType, workstationFlag)) != 0)
     return rc;
   context.recreatedNodeType = static_cast<uint32_t>(newNodeType);
-  if (newNodeType == 4 && step.partitioned())
+  if (newNodeType == KXL_NODE_TYPE_PARTITIONED && step.partitioned())
     return repointPartitions(step);
   if (newNodeType == 2)
     return 0;
@@ -609,8 +609,8 @@ int32_t runServicesStep(ServicesStep &step) {
 const char *serviceAccountBefore(const UpgradeContext &context, const char *machine, const char *service) {
   const char *onMachine = machine != nullptr ? machine : "";
   for (const ServiceAccount &kept : context.serviceAccounts)
-    if (sameName(kept.machine.c_str(), onMachine, SQLO_COMPUTERNAME_SZ) &&
-        sameName(kept.service.c_str(), service, kServiceNameSize))
+    if (kxliSameText(kept.machine.c_str(), onMachine, SQLO_COMPUTERNAME_SZ) &&
+        kxliSameText(kept.service.c_str(), service, kServiceNameSize))
       return kept.account.c_str();
   return nullptr;
 }

@@ -10,11 +10,6 @@ class UpgradeContext;
 
 inline constexpr uint32_t KXL_FN_UPGRADE_INSTANCE_SERVICES = 0x18780500u;
 
-// Result codes of the step besides those passed up from its callees.
-inline constexpr int32_t SERVICES_RC_NO_SERVICE_CONFIG = -1925; // start type unreadable
-inline constexpr int32_t SERVICES_RC_MACHINE_REGISTRY = -1913;  // a machine's registry cannot be opened
-inline constexpr int32_t SERVICES_SQLCODE_HOST = -1042;         // status block code: no full host name
-
 // The account the services step found `service` on `machine` (as the step
 // names it) running under before it gave it the account of -u; null when the
 // step recorded none (no -u, or no such service).

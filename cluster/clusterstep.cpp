@@ -3,6 +3,7 @@
 #include "cluster/mscsutil.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
+#include "upgrade/errortrace.h"
 #include "upgrade/records.h"
 
 #include <cstdlib>
@@ -49,10 +50,7 @@ const WCHAR *newTypeName() {
   return name.chars;
 }
 
-int32_t failed(uint32_t probe, int32_t rc) {
-  pdtError(KXL_FN_UPGRADE_CLUSTER_INSTANCE, probe, rc);
-  return rc;
-}
+constexpr ErrorTrace failed{KXL_FN_UPGRADE_CLUSTER_INSTANCE};
 
 bool sameName(const char *a, const char *b) {
   return std::strlen(a) == std::strlen(b) && sqlomcpi(a, b, 0) == 0;
@@ -133,7 +131,7 @@ Membership instanceResource(const ClusterResourceEntry &resource, const IKXLINST
                             const UpgradeOptions &options) {
   pdtEntry(KXL_FN_IS_INSTANCE_RESOURCE);
   Membership member = Membership::other;
-  if (options.partitionedInstance == 0) {
+  if (!isPartitioned(options)) {
     member = sameName(resource.name, options.instanceName) ? Membership::member : Membership::other;
   } else {
     member = NodesFile(instance, options).namesPartition(options.instanceName, resource.name);

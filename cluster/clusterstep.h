@@ -14,12 +14,6 @@ class UpgradeContext;
 inline constexpr uint32_t KXL_FN_UPGRADE_CLUSTER_INSTANCE = 0x18780509u;
 inline constexpr uint32_t KXL_FN_IS_INSTANCE_RESOURCE = 0x1878050Au;
 
-// Results of the step (each the negative number of its message).
-inline constexpr int32_t CLUSTER_RC_NO_API = -1251;        // a module or entry point is missing
-inline constexpr int32_t CLUSTER_RC_NOT_CONVERTED = -1252; // type, name, a read, or a resource put back whole
-inline constexpr int32_t CLUSTER_RC_NOT_RECREATED = -1253; // a resource gone or without its dependencies
-inline constexpr int32_t CLUSTER_RC_NOT_DELETED = -1254;   // a resource could not be deleted; unchanged
-
 // What the step has changed in the cluster, kept by its caller where it
 // survives a kill: whether it registered the new resource type, and each
 // resource it set out to convert as it was before (name, group, type,

@@ -4,6 +4,7 @@
 // and put it back.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <cstdlib>
 #include <new>
@@ -25,14 +26,24 @@ inline char kxliUpper(char c) {
   return c >= 'a' && c <= 'z' ? static_cast<char>(c - 'a' + 'A') : c;
 }
 
+// The command's one comparison ignoring case: equal over at most `limit`
+// characters (or up to the end of both). Made here, not with the library's
+// compare: a compare that failed would read as "different", and this machine
+// would be taken for another one.
+inline bool kxliSameText(const char *a, const char *b, size_t limit) {
+  for (size_t i = 0; i < limit; ++i) {
+    if (kxliUpper(a[i]) != kxliUpper(b[i]))
+      return false;
+    if (a[i] == '\0')
+      return true;
+  }
+  return true;
+}
+
 inline bool kxliSameName(const char *a, const char *b) {
   if (a == nullptr || b == nullptr)
     return a == b;
-  for (; kxliUpper(*a) == kxliUpper(*b); ++a, ++b) {
-    if (*a == '\0')
-      return true;
-  }
-  return false;
+  return kxliSameText(a, b, SIZE_MAX);
 }
 
 // Destroys an object a list owned: strings were allocated with malloc

@@ -36,13 +36,7 @@ bool markerPath(const char *installPath, const char *code, char *path, size_t si
 bool samePath(const char *a, const char *b) {
   size_t lengthA = std::strlen(a) - (endsWithBackslash(a) ? 1 : 0);
   size_t lengthB = std::strlen(b) - (endsWithBackslash(b) ? 1 : 0);
-  if (lengthA != lengthB)
-    return false;
-  for (size_t i = 0; i < lengthA; ++i) {
-    if (kxliUpper(a[i]) != kxliUpper(b[i]))
-      return false;
-  }
-  return true;
+  return lengthA == lengthB && kxliSameText(a, b, lengthA);
 }
 
 // Windows Installer knows `productCode` as installed in installPath.

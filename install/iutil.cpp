@@ -90,8 +90,8 @@ bool kxliReadDbmCfg(const char *directory, unsigned char *image, uint32_t size) 
     return false;
   SQLO_FHANDLE file = nullptr;
   // Opened for update: the file must exist and be writable.
-  if (sqloopenp(path, SQLO_READWRITE | SQLO_OPEN | SQLO_BINARY | SQLO_SHAREREAD | SQLO_SHAREWRITE, 0x644,
-                &file, 0) != 0)
+  if (sqloopenp(path, SQLO_READWRITE | SQLO_OPEN | SQLO_BINARY | SQLO_SHAREREAD | SQLO_SHAREWRITE,
+                SQLO_MODE_FILE, &file, 0) != 0)
     return false;
   std::memset(image, 0, size);
   uint32_t filled = 0;

@@ -11,7 +11,7 @@
 namespace {
 
 // Read and set-value access to an instance's profile key.
-constexpr REGSAM kProfileAccess = 0x2001B;
+constexpr REGSAM kProfileAccess = KEY_READ | KEY_SET_VALUE;
 constexpr const char kClusterValue[] = "KXLCLUSTER";
 
 // The platform reports every copy's instances; this one belongs to `owner` when

@@ -14,6 +14,12 @@ inline constexpr uint32_t KXLI_CLUSTER_NAME_SZ = 256;
 inline constexpr uint32_t KXLI_DBM_CFG_IMAGE_SZ = 16384;
 inline constexpr uint32_t KXLI_NODE_TYPE_OFFSET = 40; // u16, little-endian
 
+// Node types of an instance (1 to 5), as its kxlsystm gives them.
+inline constexpr uint32_t KXL_NODE_TYPE_STANDALONE = 1;
+inline constexpr uint32_t KXL_NODE_TYPE_CLIENT = 2; // no server of its own
+inline constexpr uint32_t KXL_NODE_TYPE_SERVER = 3;
+inline constexpr uint32_t KXL_NODE_TYPE_PARTITIONED = 4;
+
 class IKXLINSTANCE {
 public:
   // An empty holder: ReloadDbmCfg with a directory, then GetNodeType.

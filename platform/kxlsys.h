@@ -187,6 +187,8 @@ inline constexpr uint32_t SQLO_SHAREWRITE = 0x0200;
 inline constexpr uint32_t SQLO_SEQUENTIAL = 0x0400; // access pattern hint
 inline constexpr uint32_t SQLO_READWRITE = SQLO_READONLY | SQLO_WRITEONLY;
 // Mode: permission bits written as hexadecimal digits, like octal (0x750, 0x644).
+inline constexpr uint32_t SQLO_MODE_FILE = 0x644;    // owner reads and writes, others read
+inline constexpr uint32_t SQLO_MODE_PROGRAM = 0x750; // owner all, group reads and runs
 
 // Result record of sqloexec2.
 struct SQLO_EXEC_RESULT {

@@ -7,6 +7,7 @@
 #include "install/installcopy.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
+#include "upgrade/codes.h"
 
 #include <cstdint>
 #include <cstdlib>
@@ -54,25 +55,6 @@ inline constexpr uint16_t UPGRADE_AUTH_DCE_SERVER_ENCRYPT = 6;
 inline constexpr uint16_t UPGRADE_AUTH_KERBEROS = 7;
 inline constexpr uint16_t UPGRADE_AUTH_KERBEROS_SERVER_ENCRYPT = 8;
 
-// ---------------------------------------------------------------------------
-// Result codes of the front end (the absolute value is the message number)
-// ---------------------------------------------------------------------------
-inline constexpr int32_t UPGRADE_RC_USAGE = -1946; // usage message
-inline constexpr int32_t UPGRADE_RC_BAD_INSTANCE_NAME = -1916;
-inline constexpr int32_t UPGRADE_RC_BAD_PROFILE_PATH = -1920;
-inline constexpr int32_t UPGRADE_RC_BAD_ACCOUNT = -1921;
-inline constexpr int32_t UPGRADE_RC_BAD_TEXT_SEARCH = -1934;
-inline constexpr int32_t UPGRADE_RC_TEXT_SEARCH_RANGE = -1701;
-inline constexpr int32_t UPGRADE_RC_ADMIN_SERVER = -1954;
-inline constexpr int32_t UPGRADE_RC_NO_COPY = -1918;
-inline constexpr int32_t UPGRADE_RC_INSTANCE_UNKNOWN = 1951;
-inline constexpr int32_t UPGRADE_RC_RESERVED_INSTANCE = -1139;
-inline constexpr int32_t UPGRADE_RC_BAD_VERSION = -1949;
-inline constexpr int32_t UPGRADE_RC_ALREADY_UPGRADED = 1950;
-inline constexpr int32_t UPGRADE_RC_SQLCA = -1; // the status block holds the reason
-inline constexpr int32_t UPGRADE_RC_NODE_TYPE_UNKNOWN =
-    -1926; // kxlsystm gives no node type (token: the file)
-
 // The instance-creation block that the services step hands to the instance
 // environment step. The front end writes only the text search fields.
 struct PartitionRecord {
@@ -100,7 +82,7 @@ struct UpgradeOptions {
   uint16_t authType; // valid only with UPGRADE_FLAG_AUTH_TYPE
   char profilePath[UPGRADE_PATH_SZ];
   uint8_t quiet;
-  uint8_t partitionedInstance; // node type 4
+  uint8_t partitionedInstance; // 1: node type 4 (set by the checks); see isPartitioned
   char userName[UPGRADE_USER_NAME_SZ];
   char password[UPGRADE_PASSWORD_SZ];
   PartitionRecord partitionRecord;
@@ -116,6 +98,13 @@ struct UpgradeOptions {
   uint8_t undoOutcome;                 // UPGRADE_UNDO_*, written by the upgrade engine
   char keptBackupDir[UPGRADE_PATH_SZ]; // the instance directory's backup, when it is kept
 };
+
+// Whether the run's instance is partitioned (KXL_NODE_TYPE_PARTITIONED): the
+// checks set the option from the bound instance's node type before the engine
+// runs, and a killed run's record keeps it.
+inline bool isPartitioned(const UpgradeOptions &options) {
+  return options.partitionedInstance != 0;
+}
 
 inline constexpr uint32_t UPGRADE_COPY_PATH_SZ = 261;
 inline constexpr uint32_t UPGRADE_VAR159_SZ = 10;

@@ -15,8 +15,6 @@
 namespace {
 
 constexpr uint16_t kAdminBits = 0x04 | 0x10;
-constexpr int32_t kNoAuthIdSqlcode = -1403;
-constexpr int32_t kNotAdminSqlcode = -1092;
 constexpr uint32_t kShortIdSize = 10;
 
 constexpr uint32_t kDirectorySize = 255;
@@ -24,7 +22,6 @@ constexpr uint32_t kDirectorySize = 255;
 // bounded by a path buffer: the block never has to be cut.
 constexpr std::size_t kArgBlockSize = 4 * SQLO_PATH_SZ + 64;
 constexpr uint32_t kMaxDataSources = 65536; // more than any machine's ODBC list
-constexpr int kCheckWarning = 1225;
 constexpr char kCheckToolName[] = "kxlckupgrade";
 constexpr char kDriverText[] = "ZAV KXL ODBC DRIVER";
 
@@ -83,7 +80,7 @@ int exitCodeResult(uint32_t exitCode, UpgradeOptions &options, const char *logPa
   case 2:
     return 0;
   case 1:
-    printInstanceMessage("KXLIMIGR", kCheckWarning, "kxlckupgrade warning", nullptr);
+    printInstanceMessage("KXLIMIGR", UPGRADE_MSG_CHECK_WARNINGS, "kxlckupgrade warning", nullptr);
     return 0;
   case 3:
     // The run stops after a failed check, so the token texts may live in
@@ -219,7 +216,7 @@ int checkLocalAdmin(sqlca *status) {
   int rc = 0;
   int32_t idRc = sqleget_authid(id);
   if (idRc != 0 && idRc != 1) {
-    sqlcaSetCode(*status, kNoAuthIdSqlcode);
+    sqlcaSetCode(*status, UPGRADE_SQLCODE_NO_AUTH_ID);
     rc = UPGRADE_RC_SQLCA;
   } else {
     int32_t admin = sqloIsLocalAdmin();
@@ -230,7 +227,7 @@ int checkLocalAdmin(sqlca *status) {
       ossSnprintf(shortId, sizeof shortId, "%s", id);
       const uint64_t lengths[] = {textLength(shortId)};
       const char *tokens[] = {shortId};
-      sqlegsca(kNotAdminSqlcode, 1, lengths, tokens, status);
+      sqlegsca(UPGRADE_SQLCODE_NOT_ADMIN, 1, lengths, tokens, status);
       rc = UPGRADE_RC_SQLCA;
     }
   }
@@ -260,7 +257,7 @@ int runDatabaseCheck(UpgradeContext &context, UpgradeOptions &options) {
 
 bool findOdbcDataSources(const char *copyName, int32_t *status) {
   pdtEntry(KXL_FN_FIND_ODBC_SOURCES);
-  int32_t outcome = UPGRADE_ODBC_NOT_AVAILABLE;
+  int32_t outcome = ERROR_NOT_FOUND;
   bool found = false;
   HMODULE odbc = LoadLibraryA("odbc32.dll");
   auto allocEnv = odbc != nullptr ? boundEntry<PFN_SQLAllocEnv>(odbc, "SQLAllocEnv") : nullptr;

@@ -12,12 +12,6 @@ inline constexpr uint32_t KXL_FN_CHECK_LOCAL_ADMIN = 0x187805C0u;
 inline constexpr uint32_t KXL_FN_RUN_DATABASE_CHECK = 0x187805C1u;
 inline constexpr uint32_t KXL_FN_FIND_ODBC_SOURCES = 0x187805C2u;
 
-inline constexpr int32_t UPGRADE_RC_CHECK_PROBLEMS = -1205;
-inline constexpr int32_t UPGRADE_RC_CHECK_FAILED = -1069;
-// The current directory cannot hold the check's files under paths that fit.
-inline constexpr int32_t UPGRADE_RC_CHECK_DIRECTORY = -1927;
-inline constexpr int32_t UPGRADE_ODBC_NOT_AVAILABLE = 1168;
-
 // 0 when the user may upgrade; -1 with the reason in `status` (SQLCODE -1403:
 // no authorization ID; -1092 naming the user: not an administrator); another
 // negative value from the platform's administrator test.
@@ -32,6 +26,7 @@ int checkLocalAdmin(sqlca *status);
 int runDatabaseCheck(UpgradeContext &context, UpgradeOptions &options);
 
 // True when an ODBC data source uses the product's driver (of copy `copyName`,
-// or of any copy when null). *status: the last fetch's result, 100 when there
-// are no data sources, -1 or -2 on an ODBC error, 1168 without ODBC.
+// or of any copy when null). *status: the last fetch's result, SQL_NO_DATA
+// when there are no data sources, SQL_ERROR or SQL_INVALID_HANDLE on an ODBC
+// error, ERROR_NOT_FOUND without ODBC.
 bool findOdbcDataSources(const char *copyName, int32_t *status);

@@ -18,10 +18,6 @@ constexpr char kCommandCatalog[] = "kxlclp.mo";
 constexpr char kSqlCatalog[] = "kxlsql.mo";
 constexpr char kNewCommandName[] = "KXLIUPGRADE";
 
-constexpr int kTextSearchWarning = 1273;
-constexpr int kDeprecatedCommand = 1392;
-constexpr int kUnsupportedInstanceType = 1231;
-
 // Work buffer of replaceMessageToken: one more than a message buffer.
 constexpr std::size_t kWorkBufferSize = SQLO_MSG_BUFFER_SZ + 1;
 
@@ -57,18 +53,18 @@ const char *findIgnoringCase(const char *haystack, const char *needle) {
 }
 
 void fillCodePlaceholders(char *message, const char *prefix, int code, const UpgradeOptions *options) {
-  if (code == kDeprecatedCommand) {
+  if (code == UPGRADE_MSG_DEPRECATED_COMMAND) {
     replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<deprecated-command-name>\"", orEmpty(prefix));
     replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<new-command-name>\"", kNewCommandName);
     return;
   }
   if (options == nullptr)
     return;
-  if (code == kTextSearchWarning) {
+  if (code == UPGRADE_MSG_TEXT_SEARCH) {
     char reason[16] = {};
     std::snprintf(reason, sizeof reason, "%d", int(options->partitionRecord.textSearchReasonCode));
     replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<reason-code>\"", reason);
-  } else if (code == kUnsupportedInstanceType) {
+  } else if (code == UPGRADE_RC_EDITION_MISMATCH) {
     char name[UPGRADE_INSTANCE_NAME_SZ] = {};
     copyText(name, sizeof name, options->instanceName);
     replaceMessageToken(message, SQLO_MSG_BUFFER_SZ, "\"<instance-name>\"", name);
@@ -163,7 +159,7 @@ void printInstanceMessage(const char *prefix, int code, const char *text, const 
   fillCodePlaceholders(message, prefix, code, options);
   if (options == nullptr || options->tokenCount == 0) {
     writeText(message);
-    if (code == kTextSearchWarning)
+    if (code == UPGRADE_MSG_TEXT_SEARCH)
       printInstanceFallback(prefix, text, code);
   } else {
     char spliced[SQLO_MSG_BUFFER_SZ];

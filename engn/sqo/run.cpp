@@ -11,6 +11,8 @@
 #include "engn/sqo/cmdline.h"
 #include "engn/sqo/installswitch.h"
 #include "engn/sqo/messages.h"
+#include "platform/odbc.h"
+#include "upgrade/errortrace.h"
 
 #include <algorithm>
 #include <cctype>
@@ -26,13 +28,6 @@ constexpr char kLegacyName[] = "KXLIMIGR";
 constexpr char kProducerTag[] = "KXLIUPGR";
 constexpr uint32_t kModuleNameSize = 256;
 constexpr uint32_t kVar159Size = SQLO_PREG_VALUE_SZ;
-
-constexpr int kSuccessMessage = 1000;
-constexpr int kTextSearchWarning = 1273;
-constexpr int kOdbcNotice = 1917;
-constexpr int kLegacyWarning = 1392;
-constexpr int kUndoCompleteNotice = 1971;
-constexpr int kUndoIncompleteMessage = -1972;
 
 constexpr uint32_t kAuditAdminCategory = 0x80000000u;
 constexpr uint32_t kAuditAdminEvent = 53;
@@ -73,10 +68,7 @@ int withInstanceToken(UpgradeOptions &options, int code) {
   return code;
 }
 
-int checkFailed(CheckPoint point, int code) {
-  pdtError(KXL_FN_RUN_CHECKS, point, code);
-  return code;
-}
+constexpr ErrorTrace checkFailed{KXL_FN_RUN_CHECKS};
 
 void dropTrailingBackslash(char *path) {
   std::size_t length = std::strlen(path);
@@ -189,10 +181,10 @@ void decideProfilePath(const IKXLINSTANCE *instance, UpgradeOptions &options) {
 }
 
 int checkAccount(UpgradeContext &context, UpgradeOptions &options) {
-  if (context.nodeType != 4)
+  if (context.nodeType != KXL_NODE_TYPE_PARTITIONED)
     return 0;
   options.partitionedInstance = 1;
-  if (hasNodeTypeTemplate(context, options, 4) &&
+  if (hasNodeTypeTemplate(context, options, KXL_NODE_TYPE_PARTITIONED) &&
       (options.userName[0] == '\0' || options.password[0] == '\0'))
     return checkFailed(kCheckAccount, UPGRADE_RC_USAGE);
   return 0;
@@ -222,7 +214,8 @@ int refuseUnknownNodeType(const IKXLINSTANCE *instance, UpgradeOptions &options,
 void lookForOdbcSources(RunState &state) {
   int32_t status = 0;
   state.odbcSourceFound = findOdbcDataSources(nullptr, &status);
-  if (!state.odbcSourceFound && (status == 1168 || status == -2 || status == -1))
+  if (!state.odbcSourceFound &&
+      (status == ERROR_NOT_FOUND || status == SQL_INVALID_HANDLE || status == SQL_ERROR))
     pdLog(PD_LEVEL_WARNING, KXL_FN_RUN_UPGRADE, 1, status, "ODBC data sources could not be listed");
 }
 
@@ -314,13 +307,13 @@ int checkAndUpgrade(UpgradeContext &context, UpgradeOptions &options, UpgradeDri
 
 void printSuccess(const UpgradeOptions &options, const RunState &state) {
   if (options.partitionRecord.textSearchReasonCode != 0) {
-    printInstanceMessage(kLegacyName, kTextSearchWarning, "processing completed", &options);
+    printInstanceMessage(kLegacyName, UPGRADE_MSG_TEXT_SEARCH, "processing completed", &options);
     return;
   }
-  printSuccessMessage(kToolName, kSuccessMessage);
+  printSuccessMessage(kToolName, UPGRADE_MSG_SUCCESS);
   if (state.odbcSourceFound)
-    printInstanceMessage(kLegacyName, kOdbcNotice, "DSN is founded,please re-catalog ODBC data sources ",
-                         nullptr);
+    printInstanceMessage(kLegacyName, UPGRADE_MSG_ODBC_SOURCES,
+                         "DSN is founded,please re-catalog ODBC data sources ", nullptr);
   if (options.partitionRecord.extraMessage != 0)
     printInstanceMessage(kLegacyName, options.partitionRecord.extraMessage, "processing completed", nullptr);
 }
@@ -329,12 +322,12 @@ void printSuccess(const UpgradeOptions &options, const RunState &state) {
 // where the backup of its directory is kept.
 void printUndoOutcome(const UpgradeOptions &options) {
   if (options.undoOutcome == UPGRADE_UNDO_COMPLETE) {
-    printInstanceMessage(kLegacyName, kUndoCompleteNotice, "processing complete", nullptr);
+    printInstanceMessage(kLegacyName, UPGRADE_MSG_UNDO_COMPLETE, "processing complete", nullptr);
   } else if (options.undoOutcome == UPGRADE_UNDO_INCOMPLETE) {
     UpgradeOptions record{};
     record.tokenCount = 1;
     record.tokens[0] = options.keptBackupDir;
-    printInstanceMessage(kLegacyName, kUndoIncompleteMessage, "processing complete", &record);
+    printInstanceMessage(kLegacyName, UPGRADE_MSG_UNDO_INCOMPLETE, "processing complete", &record);
   }
 }
 
@@ -437,7 +430,7 @@ void printLegacyWarning(const UpgradeOptions &options) {
     return;
   std::fputs("\n\n", stdout);
   std::fflush(stdout);
-  printInstanceMessage(kLegacyName, kLegacyWarning, "syntax warning", nullptr);
+  printInstanceMessage(kLegacyName, UPGRADE_MSG_DEPRECATED_COMMAND, "syntax warning", nullptr);
 }
 
 void savedInstanceAtStart(char *saved, std::size_t size) {

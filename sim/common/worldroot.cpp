@@ -44,15 +44,6 @@ std::string startedProgramPath() {
   return currentHostDirectory() + "/" + argv0;
 }
 
-std::string resolvedProgramPath() {
-  char buffer[PATH_MAX];
-  ssize_t n = readlink("/proc/self/exe", buffer, sizeof buffer - 1);
-  if (n <= 0)
-    return "";
-  buffer[n] = '\0';
-  return buffer;
-}
-
 // Nearest directory at or above `start` that holds system.reg.
 std::string worldAbove(std::string dir) {
   while (!dir.empty()) {
@@ -116,6 +107,15 @@ void resetWorldRoot() {
   std::lock_guard<std::mutex> lock(cache.mutex);
   cache.known = false;
   cache.root.clear();
+}
+
+std::string resolvedProgramPath() {
+  char buffer[PATH_MAX];
+  ssize_t n = readlink("/proc/self/exe", buffer, sizeof buffer - 1);
+  if (n <= 0)
+    return "";
+  buffer[n] = '\0';
+  return buffer;
 }
 
 } // namespace kxlsim::posix

@@ -11,6 +11,10 @@ namespace kxlsim::posix {
 // above the running executable that holds system.reg. Empty when there is none.
 const std::string &worldRoot();
 
+// The running executable's host path, links resolved ("" when it cannot be
+// read).
+std::string resolvedProgramPath();
+
 // Forgets the cached root (tests that switch KXLSIM_ROOT between worlds).
 void resetWorldRoot();
 

@@ -120,11 +120,12 @@ void writeU32(std::vector<uint8_t> &image, size_t offset, uint32_t value) {
 }
 
 bool dbmCfgChecksumValid(const std::vector<uint8_t> &image) {
-  return image.size() > 4 && readU32(image, kDbmCfgOffsetChecksum) == dbmCfgChecksum(image);
+  return image.size() > 4 &&
+         readU32(image, kDbmCfgOffsetChecksum) == dbmCfgChecksum(image.data(), image.size());
 }
 
 void dbmCfgSealChecksum(std::vector<uint8_t> &image) {
-  writeU32(image, kDbmCfgOffsetChecksum, dbmCfgChecksum(image));
+  writeU32(image, kDbmCfgOffsetChecksum, dbmCfgChecksum(image.data(), image.size()));
 }
 
 std::vector<uint8_t> makeDbmCfgImage(int nodeType, DbmRelease release, bool small) {

@@ -8,7 +8,7 @@
 // bytes with its flag area at 3584.
 #pragma once
 
-#include "sim/common/dbmcfgfile.h"
+#include "platform/dbmcfgfile.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -1,12 +1,10 @@
 // kxlsim: create, show, compare and snapshot simulated machines (worlds).
+#include "sim/common/worldroot.h"
 #include "sim/kxlsim/diff.h"
 #include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/show.h"
 #include "sim/kxlsim/snapshot.h"
 
-#include <unistd.h>
-
-#include <climits>
 #include <cstring>
 #include <filesystem>
 #include <iostream>
@@ -26,12 +24,8 @@ int usage() {
 }
 
 std::string ownDirectory() {
-  char buffer[PATH_MAX];
-  ssize_t n = readlink("/proc/self/exe", buffer, sizeof buffer - 1);
-  if (n <= 0)
-    return ".";
-  buffer[n] = '\0';
-  return fs::path(buffer).parent_path().string();
+  std::string program = kxlsim::posix::resolvedProgramPath();
+  return program.empty() ? "." : kxlsim::posix::parentDirectory(program);
 }
 
 // The first of the candidates that exists; "" when none does.

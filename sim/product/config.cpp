@@ -3,8 +3,8 @@
 // file. The file is 16384 bytes: checksum at 0 (unsigned 32-bit sum of the
 // bytes from 4 to the end), parameter values, and the 512-byte flag area at
 // 15872 with one byte per parameter index.
+#include "platform/dbmcfgfile.h"
 #include "platform/kxlsys.h"
-#include "sim/common/dbmcfgfile.h"
 #include "sim/common/simfail.h"
 #include "sim/product/simstore.h"
 #include "sim/product/winpath.h"
@@ -87,7 +87,7 @@ int32_t updateFile(uint16_t count, const sqlfupd *items) {
     return kSystemErrorSqlcode;
   std::vector<uint8_t> image;
   if (kxlprod::readWholeFile(path, kConfigSize, image) != ERROR_SUCCESS || image.size() != kConfigSize ||
-      storedChecksum(image) != kxlsim::dbmCfgChecksum(image))
+      storedChecksum(image) != dbmCfgChecksum(image.data(), image.size()))
     return kConfigFileSqlcode;
   for (uint16_t i = 0; i < count; ++i) {
     const Parameter *parameter = findParameter(items[i].token);
@@ -95,7 +95,7 @@ int32_t updateFile(uint16_t count, const sqlfupd *items) {
     std::memcpy(&value, items[i].ptrvalue, sizeof value);
     put(image, parameter->offset, value, parameter->length);
   }
-  put(image, 0, kxlsim::dbmCfgChecksum(image), 4);
+  put(image, 0, dbmCfgChecksum(image.data(), image.size()), 4);
   return kxlprod::writeWholeFile(path, image) == ERROR_SUCCESS ? 0 : kConfigFileSqlcode;
 }
 

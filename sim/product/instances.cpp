@@ -9,8 +9,8 @@
 // process, so that a drop or a partition removal in the same process puts the
 // earlier state back exactly instead of losing the instance.
 #include "sim/product/instances.h"
+#include "platform/dbmcfgfile.h"
 #include "platform/kxlsys.h"
-#include "sim/common/dbmcfgfile.h"
 #include "sim/common/simfail.h"
 #include "sim/product/installation.h"
 #include "sim/product/regutil.h"
@@ -163,7 +163,7 @@ void undoCreation(const Creation &c) {
 
 int32_t writeConfiguration(const CopyInfo &copy, const CreateRequest &request, const std::string &directory) {
   std::string source =
-      kxlprod::joinPath(copy.path, std::string("CFG\\") + kxlsim::dbmCfgTemplateName(request.nodeType));
+      kxlprod::joinPath(copy.path, std::string("CFG\\") + dbmCfgTemplateName(request.nodeType));
   std::vector<uint8_t> image;
   LONG rc = kxlprod::readWholeFile(source, kConfigSize, image);
   if (rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND)
@@ -360,7 +360,7 @@ int32_t sqlo_instance_create_extended(const char *instanceName, const char *inst
   if (kxlsim::shouldFail("sqlo_instance_create_extended"))
     return SQLO_RC_SYSTEM_ERROR;
   if (!validInstanceName(instanceName) || instanceProfilePath == nullptr ||
-      kxlsim::dbmCfgTemplateName(newNodeType) == nullptr)
+      dbmCfgTemplateName(newNodeType) == nullptr)
     return SQLO_RC_INVALID_ARGUMENT;
   CreateRequest request;
   request.instance = instanceName;

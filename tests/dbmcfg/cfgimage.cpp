@@ -93,7 +93,7 @@ void DbmWorld::TearDown() {
 
 void DbmWorld::put(const char *path, const Bytes &bytes) {
   SQLO_FHANDLE file = nullptr;
-  int32_t rc = sqloopenp(path, SQLO_CREATE | SQLO_WRITEONLY | SQLO_BINARY, 0x644, &file, 0);
+  int32_t rc = sqloopenp(path, SQLO_CREATE | SQLO_WRITEONLY | SQLO_BINARY, SQLO_MODE_FILE, &file, 0);
   ASSERT_TRUE(rc == 0 || rc == SQLO_RC_FILE_EXISTED) << path;
   uint32_t written = 0;
   EXPECT_EQ(0, sqlowrite(file, bytes.data(), uint32_t(bytes.size()), &written));
@@ -103,7 +103,7 @@ void DbmWorld::put(const char *path, const Bytes &bytes) {
 Bytes DbmWorld::get(const char *path) {
   Bytes bytes;
   SQLO_FHANDLE file = nullptr;
-  if (sqloopenp(path, SQLO_OPEN | SQLO_READONLY | SQLO_BINARY, 0x644, &file, 0) != 0)
+  if (sqloopenp(path, SQLO_OPEN | SQLO_READONLY | SQLO_BINARY, SQLO_MODE_FILE, &file, 0) != 0)
     return bytes;
   uint8_t chunk[4096];
   uint32_t got = 0;

@@ -27,7 +27,7 @@ TEST_F(MoveProfile, FailedCopyKeepsOldKeyAndDropsTheKeyItCreated) {
   seedProfile(kLocal, kOld);
   startTrace();
   failCalls("SHCopyKeyA:1");
-  EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+  EXPECT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
   expectUntouched(kLocal, kOld, kCurrent);
   std::string trace = traceText();
   EXPECT_NE(std::string::npos, trace.find("error 0x18780506 probe=110 rc=-1918"));
@@ -48,7 +48,7 @@ TEST_F(MoveProfile, FailedMoveKeepsTheParentsThatWereThere) {
                                              KEY_ALL_ACCESS, nullptr, &key, nullptr));
     RegCloseKey(key);
     failCalls(fault);
-    EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+    EXPECT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
     failCalls(nullptr);
     expectUntouched(kLocal, kOld, kCurrent);
     EXPECT_TRUE(keyExists(profiles));
@@ -60,7 +60,7 @@ TEST_F(MoveProfile, NewKeyThatCannotBeCreatedChangesNothing) {
   seedProfile(kLocal, kOld);
   startTrace();
   failCalls("RegCreateKeyExA:1");
-  EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+  EXPECT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
   expectUntouched(kLocal, kOld, kCurrent);
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=100 rc=-1918"));
 }
@@ -70,7 +70,7 @@ TEST_F(MoveProfile, OwnerWithoutVersionIsRefused) {
   registerCopy("KXLNOVER", "C:\\KXLNOVER");
   ownBy("KXLNOVER");
   seedProfile(kLocal, kV8);
-  EXPECT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+  EXPECT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
   expectUntouched(kLocal, kV8, kCurrent);
 }
 
@@ -116,7 +116,7 @@ TEST_F(MoveProfile, ForcedKeysDropFailsOnlyBeforeAnyKeyIsGone) {
   ASSERT_EQ(0, moveInstanceProfile(context_, options_));
 
   failCalls("SHDeleteKeyA:1");
-  EXPECT_EQ(KXL_RC_PROFILE_KEY, dropForcedProfileKeys(context_, options_));
+  EXPECT_EQ(UPGRADE_RC_NO_COPY, dropForcedProfileKeys(context_, options_));
   expectUntouched("M2", kOld, kCurrent);
   expectUntouched("M3", kOld, kCurrent);
 
@@ -134,7 +134,7 @@ TEST_F(MoveProfile, ForceCopyNameNeedsTheLocalHostName) {
   loadNodes("0 hosta.zav.test HOSTA 0\n");
   failCalls("sqloPdbTcpIpGetFullHostName:1");
   EXPECT_EQ(UPGRADE_RC_SQLCA, moveInstanceProfile(context_, options_));
-  EXPECT_EQ(KXL_RC_NO_LOCAL_HOST_NAME, options_.status.sqlcode);
+  EXPECT_EQ(UPGRADE_SQLCODE_PARTITION_SETUP, options_.status.sqlcode);
   expectUntouched(kLocal, kOld, kCurrent);
 }
 
@@ -144,7 +144,7 @@ TEST_F(MoveProfile, UnreachablePartitionMachineStopsTheMove) {
   seedProfile("M2", kOld);
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostc.zav.test M3 0\n2 hostb.zav.test M2 0\n");
   startTrace();
-  EXPECT_EQ(KXL_RC_MACHINE_REGISTRY, moveInstanceProfile(context_, options_));
+  EXPECT_EQ(UPGRADE_RC_MACHINE_REGISTRY, moveInstanceProfile(context_, options_));
   expectMoved(kLocal, kOld, kCurrent);
   expectUntouched("M2", kOld, kCurrent);
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=10 rc=-1913"));
@@ -167,7 +167,7 @@ TEST_F(MoveProfile, ClusterMachineUnreachableAfterTheLocalMove) {
   seedProfile(kLocal, kOld);
   seedProfile("M2", kOld);
   startTrace();
-  EXPECT_EQ(KXL_RC_MACHINE_REGISTRY, moveInstanceProfile(context_, options_));
+  EXPECT_EQ(UPGRADE_RC_MACHINE_REGISTRY, moveInstanceProfile(context_, options_));
   expectMoved(kLocal, kOld, kCurrent);
   expectUntouched("M2", kOld, kCurrent);
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780506 probe=60 rc=-1913"));

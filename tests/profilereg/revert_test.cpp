@@ -15,7 +15,7 @@ TEST_F(RevertProfile, PartialMoveIsUndoneOnlyWhereItHappened) {
     seedProfile(machine, kOld);
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostc.zav.test M3 0\n");
   failCalls("SHCopyKeyA:2");
-  ASSERT_EQ(KXL_RC_PROFILE_KEY, moveInstanceProfile(context_, options_));
+  ASSERT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
   failCalls(nullptr);
 
   EXPECT_EQ(0, revertInstanceProfile(context_, options_));
@@ -31,7 +31,7 @@ TEST_F(RevertProfile, UnreachableMachineDoesNotStopTheOthersComingBack) {
     seedProfile(machine, kCurrent);
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M9 0\n2 hostc.zav.test M3 0\n");
   startTrace();
-  EXPECT_EQ(KXL_RC_MACHINE_REGISTRY, revertInstanceProfile(context_, options_));
+  EXPECT_EQ(UPGRADE_RC_MACHINE_REGISTRY, revertInstanceProfile(context_, options_));
   expectMoved(kLocal, kCurrent, kOld);
   expectMoved("M3", kCurrent, kOld);
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780507 probe=10 rc=-1913"));
@@ -74,7 +74,7 @@ TEST_F(RevertProfile, FailedCopyBackKeepsTheCurrentKeyAndTheService) {
   addService(kLocal, "INST1", "C:\\KXL101\\bin\\kxlsyscs.exe");
   startTrace();
   failCalls("SHCopyKeyA:1");
-  EXPECT_EQ(KXL_RC_PROFILE_KEY, revertInstanceProfile(context_, options_));
+  EXPECT_EQ(UPGRADE_RC_NO_COPY, revertInstanceProfile(context_, options_));
   expectProfileAt(kLocal, kCurrent);
   EXPECT_EQ("C:\\KXL101\\bin\\kxlsyscs.exe", service(kLocal, "INST1", "ImagePath"));
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780507 probe=110 rc=-1918"));

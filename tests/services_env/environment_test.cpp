@@ -146,7 +146,7 @@ TEST_F(EnvironmentTest, ConfigurationFileFailuresGive5005AndDropTheNewInstance) 
         ASSERT_EQ(0, sqlo_instance_drop(kInstance, kInstanceDir));
         continue;
       }
-      hit = rc == ENVIRONMENT_RC_CONFIG_FILE;
+      hit = rc == UPGRADE_RC_CONFIG_FILE;
       expectNothingLeft();
     }
     EXPECT_TRUE(hit);
@@ -252,7 +252,7 @@ TEST_F(PartitionZeroTest, GivenValuesAreKeptAndNoPortsReserved) {
 
 TEST_F(PartitionZeroTest, UnresolvableHostGives1922) {
   std::snprintf(record.hostName, sizeof record.hostName, "nohost");
-  EXPECT_EQ(ENVIRONMENT_RC_HOST_UNKNOWN, create(4, &record));
+  EXPECT_EQ(UPGRADE_RC_HOST_UNKNOWN, create(4, &record));
   expectNothingLeft();
 }
 
@@ -265,9 +265,9 @@ TEST_F(PartitionZeroTest, EveryFailureRemovesPartitionAndInstance) {
       {"sqloPdbCommFncInit:1", UPGRADE_RC_SQLCA, -1042},
       {"sqloPdbTcpIpGetFullHostName:1", UPGRADE_RC_SQLCA, -1042},
       {"sqloGetComputerNameA:1", UPGRADE_RC_SQLCA, -1042},
-      {"sqloUpdateServiceFile:1", ENVIRONMENT_RC_SERVICES_FILE, 0},
-      {"sqloPRegValuePE:1", ENVIRONMENT_RC_PROFILE_VALUE, 0},
-      {"sqloPRegValuePE:2", ENVIRONMENT_RC_PROFILE_VALUE, 0},
+      {"sqloUpdateServiceFile:1", UPGRADE_RC_SERVICES_FILE, 0},
+      {"sqloPRegValuePE:1", UPGRADE_RC_NO_COPY, 0},
+      {"sqloPRegValuePE:2", UPGRADE_RC_NO_COPY, 0},
       {"sqlo_instance_addnode:1", SQLO_RC_SYSTEM_ERROR, 0},
       // kxlsystm takes the first two opens and the first write.
       {"sqloopenp:3", UPGRADE_RC_SQLCA, -1042},

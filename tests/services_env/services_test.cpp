@@ -88,7 +88,7 @@ TEST_F(ServicesTest, UnreadableServiceGives1925AndCreatesNothing) {
   bind(1);
   std::vector<unsigned char> before = newConfig();
   startTrace();
-  EXPECT_EQ(SERVICES_RC_NO_SERVICE_CONFIG, run());
+  EXPECT_EQ(UPGRADE_RC_NO_SERVICE_CONFIG, run());
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=30 rc=-1925"));
   EXPECT_EQ(kOldCopy, getString(instanceKey(kInstance), "Copy"));
   EXPECT_EQ(before, newConfig());
@@ -220,7 +220,7 @@ TEST_F(PartitionedServicesTest, NodesFileFailuresAndUnreachableMachine) {
   EXPECT_EQ(kOldCopy, getString(instanceKey(kInstance), "Copy"));
 
   failCalls("sqloPRegMachineOpen:1");
-  EXPECT_EQ(SERVICES_RC_MACHINE_REGISTRY, run());
+  EXPECT_EQ(UPGRADE_RC_MACHINE_REGISTRY, run());
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=90 rc=-1913"));
 }
 
@@ -268,7 +268,7 @@ TEST_F(PartitionedServicesTest, ProgramPathThatCannotBeReadFailsTheStep) {
   startTrace();
   setString(std::string(kMach2) + "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL10\\GLOBAL_PROFILE", "KXLPATH",
             std::string(300, 'D'));
-  EXPECT_EQ(SERVICES_RC_MACHINE_REGISTRY, run());
+  EXPECT_EQ(UPGRADE_RC_MACHINE_REGISTRY, run());
   EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=65 rc=-1913"));
 }
 

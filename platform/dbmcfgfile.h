@@ -1,17 +1,15 @@
-// Facts of the instance configuration file ("kxlsystm") that the product
-// library and the worlds kxlsim builds both rely on, kept in one place.
+// Facts of the instance configuration file ("kxlsystm") that the command, the
+// product library and the worlds kxlsim builds all rely on, kept in one place.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
-#include <vector>
 
-namespace kxlsim {
-
-// The stored checksum: the sum of the bytes after it (from 4 to the end).
-inline uint32_t dbmCfgChecksum(const std::vector<uint8_t> &image) {
+// The stored checksum (the word at offset 0): the unsigned sum of the bytes
+// after it, from offset 4 up to `size`.
+inline uint32_t dbmCfgChecksum(const unsigned char *image, size_t size) {
   uint32_t sum = 0;
-  for (std::size_t i = 4; i < image.size(); ++i)
+  for (size_t i = 4; i < size; ++i)
     sum += image[i];
   return sum;
 }
@@ -22,5 +20,3 @@ inline const char *dbmCfgTemplateName(long long nodeType) {
   static const char *const names[] = {"kxlsyssv", "kxlsysrq", "kxlsyssr", "kxlsysmp", "kxlsysst"};
   return nodeType >= 1 && nodeType <= 5 ? names[nodeType - 1] : nullptr;
 }
-
-} // namespace kxlsim

@@ -1,6 +1,6 @@
-// The error trace point of an engine operation: one object per operation,
-// called with the failing step's probe and result; it gives the result back so
-// that a step can trace and return in one statement.
+// The error trace point of an operation of the command: one object per
+// operation, called with the failing step's probe and result; it gives the
+// result back so that a step can trace and return in one statement.
 #pragma once
 
 #include "platform/kxlsys.h"
