@@ -247,7 +247,7 @@ int runDatabaseCheck(UpgradeContext &context, UpgradeOptions &options) {
       putInstanceEnvironment(options.instanceName);
       rc = runCheckTool(context, options);
     }
-    int32_t back = inCopy.end();
+    int32_t back = inCopy.switchBack();
     if (rc == 0)
       rc = back;
   }

@@ -32,7 +32,7 @@ InstallationSwitch::InstallationSwitch(const IKXLINSTANCE *instance) {
     result_ = UPGRADE_RC_NO_COPY;
 }
 
-int32_t InstallationSwitch::end() {
+int32_t InstallationSwitch::switchBack() {
   if (switched_) {
     switched_ = false;
     if (!makeCurrent(current_))
@@ -42,7 +42,7 @@ int32_t InstallationSwitch::end() {
 }
 
 InstallationSwitch::~InstallationSwitch() {
-  end();
+  switchBack();
 }
 
 void putInstanceEnvironment(const char *instanceName) {

@@ -7,7 +7,7 @@
 class IKXLINSTANCE;
 
 // Switches the library to the installation that owns `instance` when that is
-// not the current one, and back with end() or when it goes out of scope.
+// not the current one, and back with switchBack() or when it goes out of scope.
 // When the current installation or the instance's own cannot be named, or a
 // switch fails, result() is -1918: profile reads would then be made in the
 // wrong installation, so the caller stops before it reads anything.
@@ -20,7 +20,7 @@ public:
 
   int32_t result() const { return result_; }
   // Switches back now; result(), or -1918 when switching back failed.
-  int32_t end();
+  int32_t switchBack();
 
 private:
   char current_[SQLO_COPY_NAME_SZ] = {};

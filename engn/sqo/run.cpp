@@ -125,7 +125,7 @@ int checkGlobalProfile(const IKXLINSTANCE *instance) {
   bool reserved = sqloPRegValuePE(SQLO_PREG_GET, &variable, 0, value, KXL_GLOBAL_PROFILE_NAME,
                                   SQLO_PREG_ANY_NODE, sizeof value) == 0 &&
                   sameText(value, name, SQLO_INSTANCE_NAME_SZ);
-  if (inCopy.end() != 0)
+  if (inCopy.switchBack() != 0)
     return checkFailed(kCheckInstallationNames, inCopy.result());
   return reserved ? checkFailed(kCheckGlobalProfile, UPGRADE_RC_RESERVED_INSTANCE) : 0;
 }
@@ -515,7 +515,7 @@ int bindInstance(UpgradeContext &context, IKXLINSTANCE *instance) {
       sqloPRegValuePE(SQLO_PREG_GET, &variable, 0, value, nullptr, SQLO_PREG_ANY_NODE, sizeof value) == 0 &&
       value[0] != '\0')
     splitVar159(context, value);
-  int32_t back = inCopy.end();
+  int32_t back = inCopy.switchBack();
   if (rc == 0)
     rc = back;
   pdtExit(KXL_FN_BIND_INSTANCE, rc, 0);
