@@ -297,7 +297,7 @@ int32_t setInstanceVariable(const char *instanceName, uint32_t variable, const c
 int32_t setPartitionVariables(const char *instanceName, const PartitionRecord &record) {
   char ports[2 * SQLO_PORT_TEXT_SZ];
   if (ossSnprintf(ports, sizeof ports, "%s:%s", record.portStart, record.portEnd) < 0)
-    return traced(kProbeVariables, ENVIRONMENT_RC_PROFILE_VALUE);
+    return traced(kProbeVariables, UPGRADE_RC_NO_COPY);
   int32_t rc = setInstanceVariable(instanceName, KXL_VAR_KXLPORTRANGE, ports);
   if (rc == 0)
     rc = setInstanceVariable(instanceName, KXL_VAR_KXLNODECOMPUTER, record.computerName);
