@@ -37,10 +37,10 @@ void terminateFields(OSSInstanceInfo_t &info) {
 // ---------------------------------------------------------------------------
 
 IKXLINSTANCE::IKXLINSTANCE()
-    : copyName{}, instanceDir{}, name{}, clusterName{}, isClustered(0), dbmCfgImage{} {}
+    : copyName{}, instanceDir{}, name{}, clusterName{}, isClustered(0), clusterUnreadable(0), dbmCfgImage{} {}
 
 IKXLINSTANCE::IKXLINSTANCE(const char *instanceName, const char *owner, const char *directory)
-    : copyName{}, instanceDir{}, name{}, clusterName{}, isClustered(0), dbmCfgImage{} {
+    : copyName{}, instanceDir{}, name{}, clusterName{}, isClustered(0), clusterUnreadable(0), dbmCfgImage{} {
   kxliSetString(copyName, sizeof copyName, owner);
   kxliSetString(name, sizeof name, instanceName);
   kxliSetString(instanceDir, sizeof instanceDir, directory);
@@ -58,11 +58,16 @@ void IKXLINSTANCE::readClusterName() {
     std::snprintf(key, sizeof key, "SOFTWARE\\ZAV\\KXL\\PROFILES\\%s", name);
   else
     std::snprintf(key, sizeof key, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\%s\\PROFILES\\%s", copyName, name);
-  if (kxliReadRegString(HKEY_LOCAL_MACHINE, key, kProfileAccess, kClusterValue, clusterName,
-                        sizeof clusterName) == ERROR_SUCCESS)
+  LONG rc = kxliReadRegString(HKEY_LOCAL_MACHINE, key, kProfileAccess, kClusterValue, clusterName,
+                              sizeof clusterName);
+  if (rc == ERROR_SUCCESS) {
     isClustered = 1;
-  else
-    clusterName[0] = '\0';
+    return;
+  }
+  clusterName[0] = '\0';
+  // A missing key or value is an instance outside a cluster; anything else
+  // leaves the question open.
+  clusterUnreadable = rc == ERROR_FILE_NOT_FOUND ? 0 : 1;
 }
 
 uint32_t IKXLINSTANCE::GetName(char *buffer, uint32_t size) const {

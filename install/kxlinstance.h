@@ -55,6 +55,9 @@ public:
   char name[KXLI_INSTANCE_NAME_SZ];
   char clusterName[KXLI_CLUSTER_NAME_SZ];
   uint8_t isClustered;
+  // The profile's cluster value could not be read (other than missing): the
+  // instance may be clustered and must not be taken for one that is not.
+  uint8_t clusterUnreadable;
   unsigned char dbmCfgImage[KXLI_DBM_CFG_IMAGE_SZ];
 
 private:

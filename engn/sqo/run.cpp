@@ -509,6 +509,10 @@ int bindInstance(UpgradeContext &context, IKXLINSTANCE *instance) {
       rc = UPGRADE_RC_NODE_TYPE_UNKNOWN;
     }
   }
+  if (rc == 0 && instance->clusterUnreadable != 0) {
+    pdtError(KXL_FN_BIND_INSTANCE, 2, UPGRADE_RC_NO_COPY);
+    rc = UPGRADE_RC_NO_COPY;
+  }
   uint32_t variable = KXL_VAR_KXLPORTRANGE;
   char value[kVar159Size] = {};
   if (rc == 0 &&

@@ -240,6 +240,22 @@ TEST_F(ClusterE2eTest, ClusteredPartitionedInstanceUpgradesOnEveryNode) {
     EXPECT_TRUE(hasLine(cluster, line)) << line << "\n" << cluster;
 }
 
+// Whether the instance is clustered is read from its profile before anything
+// changes; a read that fails (not a missing value) refuses the instance,
+// which would otherwise be upgraded as one outside the cluster.
+TEST_F(ClusterE2eTest, ClusterValueThatCannotBeReadRefusesTheInstanceUnchanged) {
+  for (const char *faults : {"RegOpenKeyExA:27", "RegQueryValueExA:13"}) {
+    SCOPED_TRACE(faults);
+    std::string before = snapshot();
+    Outcome run = upgrade(kSingle.args, faults);
+    EXPECT_NE(run.exitCode, 0) << run.out;
+    EXPECT_EQ(run.out.rfind("KXL1918E", 0), 0u) << run.out;
+    EXPECT_EQ(registryChanges(runKxlsim({"diff", before, world_})), "");
+  }
+  EXPECT_EQ(upgrade(kSingle.args).exitCode, 0);
+  EXPECT_TRUE(hasLine(show(), kCinst1Converted));
+}
+
 // One way the cluster step can end, driven through the command: the world's
 // change and the faults before the run, what the step reports, what the
 // cluster holds afterwards, and the repair after which a plain run succeeds.
