@@ -1,6 +1,7 @@
 #include "cluster/clusterstep.h"
 
 #include "cluster/mscsutil.h"
+#include "install/ilist.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
 #include "upgrade/errortrace.h"
@@ -51,10 +52,6 @@ const WCHAR *newTypeName() {
 }
 
 constexpr ErrorTrace failed{KXL_FN_UPGRADE_CLUSTER_INSTANCE};
-
-bool sameName(const char *a, const char *b) {
-  return std::strlen(a) == std::strlen(b) && sqlomcpi(a, b, 0) == 0;
-}
 
 // The instance directory's nodes file, quoted when the directory is; a path
 // that does not fit is cut at 260 characters. False when the directory cannot
@@ -112,7 +109,7 @@ public:
       char partition[kPartitionNameSize];
       if (ossSnprintf(partition, sizeof partition, "%s-%d", instanceName, int(sqloNodeNumber(entry))) < 0)
         return Membership::unreadable;
-      if (sameName(partition, resource))
+      if (kxliSameName(partition, resource))
         return Membership::member;
       offset += sqloNodeLength(entry);
     }
@@ -132,7 +129,7 @@ Membership instanceResource(const ClusterResourceEntry &resource, const IKXLINST
   pdtEntry(KXL_FN_IS_INSTANCE_RESOURCE);
   Membership member = Membership::other;
   if (!isPartitioned(options)) {
-    member = sameName(resource.name, options.instanceName) ? Membership::member : Membership::other;
+    member = kxliSameName(resource.name, options.instanceName) ? Membership::member : Membership::other;
   } else {
     member = NodesFile(instance, options).namesPartition(options.instanceName, resource.name);
   }
@@ -205,7 +202,7 @@ bool isPrefix(const ClusterResourceList &now, const ClusterResourceList &all) {
   if (now.size() > all.size())
     return false;
   for (std::size_t i = 0; i < now.size(); ++i)
-    if (!sameName(now[i].name, all[i].name))
+    if (!kxliSameName(now[i].name, all[i].name))
       return false;
   return true;
 }

@@ -256,6 +256,23 @@ TEST_F(ClusterE2eTest, ClusterValueThatCannotBeReadRefusesTheInstanceUnchanged) 
   EXPECT_TRUE(hasLine(show(), kCinst1Converted));
 }
 
+// The step tells the instance's resources by a comparison that cannot fail:
+// a failed library compare once read as "another resource", and the run
+// ended in success with the resource unconverted.
+TEST_F(ClusterE2eTest, FailedLibraryCompareStillFindsTheInstanceResource) {
+  for (int call = 1; call <= 12; ++call) {
+    SCOPED_TRACE(call);
+    std::string before = snapshot();
+    Outcome run = upgrade(kSingle.args, "sqlomcpi:" + std::to_string(call));
+    if (run.exitCode == 0)
+      EXPECT_TRUE(hasLine(show(), kCinst1Converted)) << "a completed run converted the resource";
+    else
+      EXPECT_EQ(registryChanges(runKxlsim({"diff", before, world_})), "") << run.out;
+    fs::remove_all(world_);
+    ASSERT_EQ(runKxlsim({"snapshot", before, world_}), "");
+  }
+}
+
 // One way the cluster step can end, driven through the command: the world's
 // change and the faults before the run, what the step reports, what the
 // cluster holds afterwards, and the repair after which a plain run succeeds.
