@@ -38,12 +38,14 @@ constexpr uint32_t kProbePartitionKey = 20;
 constexpr uint32_t kProbeLocalKey = 30;
 constexpr uint32_t kProbeComputerName = 40;
 constexpr uint32_t kProbeClusterName = 50;
+constexpr uint32_t kProbeClusterList = 55;
 constexpr uint32_t kProbeClusterOpen = 60;
 constexpr uint32_t kProbeClusterKey = 70;
 constexpr uint32_t kProbeCreateKey = 100;
 constexpr uint32_t kProbeCopyKey = 110;
 constexpr uint32_t kProbeDropKey = 120;
-constexpr uint32_t kProbeForcedKeysLeft = 210; // diagnostic log only
+constexpr uint32_t kProbeForcedKeysLeft = 210;      // diagnostic log only
+constexpr uint32_t kProbeClusterServicesLeft = 220; // diagnostic log only
 
 // snprintf that reports whether the whole text fitted.
 template <class... Args> bool formatWhole(char *buffer, size_t size, const char *format, Args... args) {
@@ -396,12 +398,18 @@ int32_t lastSystemError() {
 }
 
 // The machine names of the cluster profile's list; empty when the key or the
-// value is missing.
-void readClusterList(const char *instance, char (&list)[kRegValueBuffer]) {
+// value is missing. Any other failure (a list that cannot be read, is longer
+// than the buffer or whose key name cannot be formed) is not an empty list:
+// taking it for one would leave the other machines' keys under the old copy.
+bool readClusterList(const char *instance, char (&list)[kRegValueBuffer]) {
   char key[kKeyPathSize];
   list[0] = '\0';
-  if (formatWhole(key, sizeof key, "Cluster\\ZAV\\KXL\\PROFILES\\%s", instance))
-    kxliReadRegString(HKEY_LOCAL_MACHINE, key, KEY_ALL_ACCESS, kClusterListValue, list, sizeof list);
+  if (!formatWhole(key, sizeof key, "Cluster\\ZAV\\KXL\\PROFILES\\%s", instance))
+    return false;
+  LONG rc = kxliReadRegString(HKEY_LOCAL_MACHINE, key, KEY_ALL_ACCESS, kClusterListValue, list, sizeof list);
+  if (rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND)
+    list[0] = '\0';
+  return rc == ERROR_SUCCESS || rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND;
 }
 
 // The machines of the cluster list that the first pass did not handle, through
@@ -419,7 +427,8 @@ int32_t walkCluster(MachineWalk &walk) {
   if (nameRc != 0)
     return ErrorTrace{walk.function}(kProbeClusterName, static_cast<int32_t>(nameRc));
   char list[kRegValueBuffer];
-  readClusterList(walk.options.instanceName, list);
+  if (!readClusterList(walk.options.instanceName, list))
+    return ErrorTrace{walk.function}(kProbeClusterList, UPGRADE_RC_NO_COPY);
   int32_t first = 0;
   for (char *name = list; *name != '\0';) {
     char *end = std::strchr(name, ' ');
@@ -557,7 +566,11 @@ void repointClusterServices(MachineWalk &walk) {
     computer[0] = '\0';
   computer[sizeof computer - 1] = '\0';
   char list[kRegValueBuffer];
-  readClusterList(walk.options.instanceName, list);
+  if (!readClusterList(walk.options.instanceName, list)) {
+    pdLog(PD_LEVEL_WARNING, walk.function, kProbeClusterServicesLeft, UPGRADE_RC_NO_COPY,
+          "cluster machine list unreadable: the other machines' services not put back");
+    return;
+  }
   bool partitioned = isPartitioned(walk.options);
   for (char *name = std::strtok(list, " "); name != nullptr; name = std::strtok(nullptr, " ")) {
     bool local = computer[0] != '\0' && kxliSameText(name, computer, SQLO_COMPUTERNAME_SZ);

@@ -166,8 +166,8 @@ int32_t openMachine(ServicesStep &step, const char *machineName, uint32_t probe)
 
 // ---- cluster profile --------------------------------------------------------
 
-void clusterProfileKeyPath(const ServicesStep &step, char *path, size_t size) {
-  ossSnprintf(path, size, "Cluster\\ZAV\\KXL\\PROFILES\\%s", step.instanceName);
+bool clusterProfileKeyPath(const ServicesStep &step, char *path, size_t size) {
+  return formed(ossSnprintf(path, size, "Cluster\\ZAV\\KXL\\PROFILES\\%s", step.instanceName));
 }
 
 // A key or value that is not there is missing; any other failure is a failed read.
@@ -202,7 +202,8 @@ int32_t writeClusterValues(HKEY key, const ClusterProfile &cluster) {
 // A machine without the instance's cluster profile key gets none.
 int32_t writeMachineClusterValues(const ServicesStep &step) {
   char path[64];
-  clusterProfileKeyPath(step, path, sizeof path);
+  if (!clusterProfileKeyPath(step, path, sizeof path))
+    return unformed();
   HKEY key = nullptr;
   LONG opened = RegOpenKeyExA(step.machine->hklm, path, 0, KEY_ALL_ACCESS, &key);
   if (missing(opened))
@@ -220,7 +221,8 @@ int32_t readClusterProfile(ServicesStep &step) {
   if (rc != 0)
     return traced(kProbeClusterName, static_cast<int32_t>(rc));
   char path[64];
-  clusterProfileKeyPath(step, path, sizeof path);
+  if (!clusterProfileKeyPath(step, path, sizeof path))
+    return unformed();
   ClusterProfile &cluster = step.cluster;
   LONG opened = RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_ALL_ACCESS, &cluster.key);
   if (opened != ERROR_SUCCESS) {

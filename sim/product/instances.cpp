@@ -83,17 +83,33 @@ std::string displayName(const CopyInfo &copy, const std::string &service) {
   return copy.v8 ? "KXL - " + service : "KXL - " + copy.name + " - " + service;
 }
 
+// A value (or the service's key) that is not there, as against one that
+// could not be read.
+bool absent(LONG rc) {
+  return rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND;
+}
+
 // Points a service at the copy's server program; an existing service keeps
-// its start type and account unless an account is given.
+// its start type and account unless an account is given. A start type or
+// account that cannot be read fails the call: taking it for absent would
+// hand the service the defaults (automatic start, the system account).
 LONG writeService(const std::string &key, const CopyInfo &copy, const std::string &service,
                   const char *account) {
   DWORD start = kAutoStart;
-  kxlprod::readRegDword(HKEY_LOCAL_MACHINE, key, "Start", start);
-  std::string objectName;
-  if (account != nullptr && account[0] != '\0')
+  LONG read = kxlprod::readRegDword(HKEY_LOCAL_MACHINE, key, "Start", start);
+  if (read != ERROR_SUCCESS && !absent(read))
+    return read;
+  std::string objectName = kDefaultAccount;
+  if (account != nullptr && account[0] != '\0') {
     objectName = account;
-  else if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "ObjectName", objectName) != ERROR_SUCCESS)
-    objectName = kDefaultAccount;
+  } else {
+    std::string stored;
+    read = kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "ObjectName", stored);
+    if (read == ERROR_SUCCESS)
+      objectName = stored;
+    else if (!absent(read))
+      return read;
+  }
   LONG rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, key, "ImagePath", serverProgram(copy));
   if (rc == ERROR_SUCCESS)
     rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, key, "DisplayName", displayName(copy, service));
