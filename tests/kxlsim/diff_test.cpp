@@ -1,24 +1,24 @@
 // Comparing worlds: equal worlds, and each kind of change named readably.
-#include "world_fixture.h"
-
 #include "sim/kxlsim/diff.h"
 #include "sim/kxlsim/snapshot.h"
 #include "sim/kxlsim/world_reader.h"
+#include "sim/kxlsim/world_writer.h"
+#include "tests/support/scenario_world.h"
+#include "tests/support/temp_world.h"
+
+#include <gtest/gtest.h>
 
 #include <sstream>
 
 namespace kxlsim::test {
 namespace {
 
-class WorldPair : public TempDirTest {
+// The demo world as built, and a copy of it for the case to change.
+class WorldPair : public ::testing::Test {
 protected:
   void SetUp() override {
-    TempDirTest::SetUp();
-    before_ = sharedDemoWorld();
-    after_ = path("after");
-    std::string error;
-    ASSERT_TRUE(snapshotWorld(before_, after_, error)) << error;
-    ASSERT_TRUE(selectWorld(after_, error)) << error;
+    ASSERT_FALSE(copy_.root().empty());
+    copy_.enter();
   }
   int diff(std::string &text, bool reversed = false) {
     std::ostringstream out;
@@ -26,14 +26,22 @@ protected:
     text = out.str();
     return rc;
   }
-  std::string before_, after_;
+  const std::string before_ = kxltestsupport::scenarioWorld("demo");
+  kxltestsupport::TempWorld copy_{"kxlsim-diff", kxltestsupport::CopyOf{before_}};
+  const std::string after_ = copy_.root();
   WorldWriter w_;
 };
 
-TEST_F(WorldPair, SnapshotOfAWorldEqualsIt) {
-  std::string text;
-  EXPECT_EQ(diff(text), 0);
-  EXPECT_EQ(text, "");
+TEST_F(WorldPair, ASnapshotEqualsItsWorldAndRefusesAnExistingTargetOrANonWorld) {
+  std::string text, error;
+  ASSERT_TRUE(snapshotWorld(after_, copy_.scratch("snapshot"), error)) << error;
+  std::ostringstream out;
+  EXPECT_EQ(diffWorlds(after_, copy_.scratch("snapshot"), out), 0);
+  EXPECT_EQ(out.str(), "");
+  EXPECT_EQ(diff(text), 0) << text;
+  EXPECT_FALSE(snapshotWorld(after_, after_, error));
+  EXPECT_FALSE(snapshotWorld(copy_.scratch("none"), copy_.scratch("copy"), error));
+  EXPECT_EQ(diffWorlds(after_, copy_.scratch("none"), out), 2);
 }
 
 TEST_F(WorldPair, ChangedValuesAreNamedByKeyAndMachine) {
@@ -108,15 +116,6 @@ TEST_F(WorldPair, RegistryFilesAreNotListedAsFiles) {
   diff(text);
   EXPECT_NE(text.find("file + C:\\x.txt (0 bytes"), std::string::npos) << text;
   EXPECT_EQ(text.find("system.reg"), std::string::npos) << "hives are compared as registry, not as files";
-}
-
-TEST_F(TempDirTest, SnapshotRefusesAnExistingTargetAndANonWorld) {
-  std::string world = makeWorld("w", "empty");
-  std::string error;
-  EXPECT_FALSE(snapshotWorld(world, world, error));
-  EXPECT_FALSE(snapshotWorld(path("none"), path("copy"), error));
-  std::ostringstream out;
-  EXPECT_EQ(diffWorlds(world, path("none"), out), 2);
 }
 
 TEST(DisplayKeyPath, MachinesAreNamedAndRootsShortened) {

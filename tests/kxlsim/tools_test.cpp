@@ -1,10 +1,13 @@
 // The tools program started under each name inside a world: its event, its
 // configured exit code, and the check tool's log.
-#include "world_fixture.h"
-
 #include "sim/kxlsim/world_reader.h"
+#include "sim/kxlsim/world_writer.h"
+#include "tests/support/scenario_world.h"
+#include "tests/support/temp_world.h"
+
 #include "sim/posix/world.h"
 #include "sim/tools/tool_names.h"
+#include <gtest/gtest.h>
 
 #include <nlohmann/json.hpp>
 #include <sys/wait.h>
@@ -27,13 +30,13 @@ TEST(ToolNames, BaseNameWithoutExtensionInLowerCase) {
   EXPECT_EQ(joinArguments(3, argv), "-cleanup \"C:\\A B\"");
 }
 
-class ToolsInWorld : public TempDirTest {
+class ToolsInWorld : public ::testing::Test {
 protected:
   void SetUp() override {
-    TempDirTest::SetUp();
-    world_ = makeWorld("w", "empty");
+    ASSERT_FALSE(world_.root().empty());
+    world_.enter();
     for (const char *name : {"kxlset.exe", "KXLCKUPGRADE.EXE", "kxlimaudcfg.exe", "kxltools"})
-      w_.installHostFile(KXLSIM_TEST_TOOLS, std::string("C:\\tools\\") + name, true);
+      w_.installHostFile(kxltestsupport::buildSources().toolsPath, std::string("C:\\tools\\") + name, true);
     w_.makeDirectory("C:\\work");
     ASSERT_TRUE(w_.ok());
   }
@@ -43,22 +46,23 @@ protected:
     std::string program, work;
     EXPECT_TRUE(posix::hostPath("C:\\tools\\" + name, program));
     EXPECT_TRUE(posix::hostPath("C:\\work", work));
-    std::string command = "cd '" + work + "' && KXLSIM_ROOT='" + world_ + "' KXLINSTANCE=INST1 '" + program +
-                          "' " + args + " 2>/dev/null";
+    std::string command = "cd '" + work + "' && KXLSIM_ROOT='" + world_.root() + "' KXLINSTANCE=INST1 '" +
+                          program + "' " + args + " 2>/dev/null";
     int status = std::system(command.c_str());
     return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
   }
 
   std::vector<nlohmann::json> events() {
     std::vector<nlohmann::json> list;
-    std::istringstream in(readHostFile(world_ + "/events.jsonl"));
+    std::istringstream in(kxltestsupport::readHostFile(world_.host("events.jsonl")));
     std::string line;
     while (std::getline(in, line))
       list.push_back(nlohmann::json::parse(line));
     return list;
   }
 
-  std::string world_;
+  kxltestsupport::TempWorld world_{"kxlsim-tools",
+                                   kxltestsupport::CopyOf{kxltestsupport::scenarioWorld("empty")}};
   WorldWriter w_;
 };
 

@@ -1,11 +1,15 @@
-// Building worlds: the demo world as the command will see it, and what
-// `show` reports of it.
-#include "world_fixture.h"
-
+// Building worlds: the demo world as the command will see it, what `show`
+// reports of it, and what `create` refuses.
 #include "sim/kxlsim/dbmcfg_image.h"
+#include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/show.h"
 #include "sim/kxlsim/world_reader.h"
+#include "sim/kxlsim/world_writer.h"
 #include "sim/posix/world.h"
+#include "tests/support/scenario_world.h"
+#include "tests/support/temp_world.h"
+
+#include <gtest/gtest.h>
 
 #include <sys/stat.h>
 
@@ -15,10 +19,13 @@
 namespace kxlsim::test {
 namespace {
 
+// The cases only read the demo world, so they share the one built for the program.
 class DemoWorld : public ::testing::Test {
 protected:
-  void SetUp() override { world_ = sharedDemoWorld(); }
-  std::string world_;
+  void SetUp() override {
+    std::string error;
+    ASSERT_TRUE(selectWorld(kxltestsupport::scenarioWorld("demo"), error)) << error;
+  }
 };
 
 std::string showText() {
@@ -41,62 +48,30 @@ std::string lineStarting(const std::string &text, const std::string &prefix) {
 
 TEST_F(DemoWorld, ShowListsCopiesInstancesServicesAndMachines) {
   std::string text = showText();
-  std::string v8 = lineStarting(text, "KXLV8 ");
-  EXPECT_NE(v8.find("8.2"), std::string::npos) << text;
-  EXPECT_NE(v8.find("C:\\Program Files\\ZAV\\KXL8"), std::string::npos);
-  EXPECT_NE(lineStarting(text, "KXL95 ").find("9.5"), std::string::npos) << text;
-  EXPECT_NE(lineStarting(text, "KXL101 ").find("10.1"), std::string::npos) << text;
-
-  std::string inst2 = lineStarting(text, "INST2 ");
-  EXPECT_NE(inst2.find("copy KXL95"), std::string::npos) << text;
-  EXPECT_NE(inst2.find("node type 4"), std::string::npos) << text;
-  EXPECT_NE(inst2.find("C:\\Program Files\\ZAV\\KXL95\\INST2"), std::string::npos);
-  EXPECT_NE(lineStarting(text, "INST1 ").find("node type 1"), std::string::npos) << text;
-  EXPECT_NE(lineStarting(text, "V8INST ").find("copy KXLV8"), std::string::npos) << text;
-
-  EXPECT_NE(lineStarting(text, "INST2-0 ").find("start 2 state 1"), std::string::npos) << text;
-  EXPECT_NE(lineStarting(text, "WINSRV2\\INST2-1 ").find("KXL95\\bin\\kxlsyscs.exe"), std::string::npos)
-      << text;
-  EXPECT_NE(lineStarting(text, "WINSRV2\\INST2-2 "), "") << text;
+  const std::pair<const char *, const char *> rows[] = {
+      {"KXLV8 ", "8.2"},
+      {"KXLV8 ", "C:\\Program Files\\ZAV\\KXL8"},
+      {"KXL95 ", "9.5"},
+      {"KXL101 ", "10.1"},
+      {"INST2 ", "copy KXL95"},
+      {"INST2 ", "node type 4"},
+      {"INST2 ", "C:\\Program Files\\ZAV\\KXL95\\INST2"},
+      {"INST1 ", "node type 1"},
+      {"V8INST ", "copy KXLV8"},
+      {"INST2-0 ", "start 2 state 1"},
+      {"WINSRV2\\INST2-1 ", "KXL95\\bin\\kxlsyscs.exe"},
+      {"WINSRV2\\INST2-2 ", ""},
+      {"WINSRV1 ", "(local)"},
+      {"WINSRV2 ", "winsrv2.zav.test"},
+  };
+  for (const auto &[prefix, part] : rows)
+    EXPECT_NE(lineStarting(text, prefix).find(part), std::string::npos) << prefix << part << "\n" << text;
   EXPECT_EQ(lineStarting(text, "WINSRV2\\INST1"), "") << "INST1 runs only on the local machine";
-
-  EXPECT_NE(lineStarting(text, "WINSRV1 ").find("(local)"), std::string::npos) << text;
-  EXPECT_NE(lineStarting(text, "WINSRV2 ").find("winsrv2.zav.test"), std::string::npos) << text;
 }
 
-TEST_F(DemoWorld, RegistryHoldsCopiesProfilesAndInstallerRegistrations) {
-  RegTarget lm = localMachine();
-  EXPECT_EQ(stringValue(lm, "SOFTWARE\\ZAV\\KXL\\CurrentVersion", "Version"), "8");
-  EXPECT_EQ(stringValue(lm, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95", "KXL Path Name"),
-            "C:\\Program Files\\ZAV\\KXL95");
-  EXPECT_EQ(stringValue(lm, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\CurrentVersion", "Fix Level"), "3");
-  EXPECT_TRUE(keyExists(lm, "SOFTWARE\\ZAV\\KXL\\PROFILES\\V8INST"));
-  EXPECT_TRUE(keyExists(lm, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1"));
-  EXPECT_EQ(stringValue(lm, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\GLOBAL_PROFILE", "KXLPATH"),
-            "C:\\Program Files\\ZAV\\KXL101");
-  EXPECT_EQ(stringValue(lm, "SOFTWARE\\ZAV\\KXLSIM\\Instances\\V8INST", "Copy"), "");
-  // The installer's own keys, under the packed form of the server's product
-  // code {6E1C2A40-9F3B-4D21-8A11-5B2C7D0E9A01}.
-  EXPECT_TRUE(keyExists(lm, "SOFTWARE\\Classes\\Installer\\Products\\04A2C1E6B3F912D4A811B5C2D7E0A910"));
-  const std::string properties =
-      "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Installer\\UserData\\S-1-5-18\\"
-      "Products\\04A2C1E6B3F912D4A811B5C2D7E0A910\\InstallProperties";
-  EXPECT_EQ(stringValue(lm, properties, "InstallLocation"), "C:\\Program Files\\ZAV\\KXL101\\");
-  EXPECT_EQ(dwordValue(lm, properties, "WindowsInstaller", 0), 1u);
-
-  RegTarget remote = remoteMachine("WINSRV2");
-  EXPECT_EQ(
-      stringValue(remote, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST2", "KXLPORTRANGE"),
-      "60000:60003");
-  EXPECT_EQ(stringValue(remote, "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\GLOBAL_PROFILE", "KXLPATH"),
-            "C:\\Program Files\\ZAV\\KXL101");
-  EXPECT_EQ(dwordValue(remote, "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1", "State", 0), 1u);
-  EXPECT_FALSE(keyExists(lm, "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1"));
-  EXPECT_EQ(dwordValue(lm, "SOFTWARE\\ZAV\\KXLSIM\\Identity", "LocalAdmin", 0) & 0x14u, 0x14u);
-}
-
-TEST_F(DemoWorld, CopiesCarryTemplatesMarkersCatalogsAndPrograms) {
-  for (const char *copy : {"KXL8", "KXL95", "KXL101"}) {
+TEST_F(DemoWorld, CopiesCarryValidTemplatesOfTheirReleaseAndStartablePrograms) {
+  const std::pair<const char *, int> copies[] = {{"KXL8", 0x0A00}, {"KXL95", 0x0C00}, {"KXL101", 0x0D00}};
+  for (const auto &[copy, release] : copies) {
     std::string base = std::string("C:\\Program Files\\ZAV\\") + copy;
     SCOPED_TRACE(base);
     for (int nodeType = 1; nodeType <= 5; ++nodeType) {
@@ -104,12 +79,13 @@ TEST_F(DemoWorld, CopiesCarryTemplatesMarkersCatalogsAndPrograms) {
       ASSERT_TRUE(readFileHead(base + "\\CFG\\" + dbmCfgTemplateName(nodeType), kDbmCfgSize + 1, image));
       EXPECT_EQ(image.size(), kDbmCfgSize);
       EXPECT_EQ(readU16(image, kDbmCfgOffsetNodeType), nodeType);
+      EXPECT_EQ(readU16(image, kDbmCfgOffsetRelease) & 0x0F00, release);
       EXPECT_TRUE(dbmCfgChecksumValid(image));
     }
     std::vector<uint8_t> bytes;
-    EXPECT_TRUE(readFileHead(base + "\\msg\\en_US\\kxlinst.mo", 16, bytes));
-    EXPECT_TRUE(readFileHead(base + "\\msg\\en_US\\KXLDBMIG.TXT", 16, bytes));
-    EXPECT_TRUE(readFileHead(base + "\\misc\\kxlckupgrade.exe", 16, bytes));
+    for (const char *file :
+         {"\\msg\\en_US\\kxlinst.mo", "\\msg\\en_US\\KXLDBMIG.TXT", "\\misc\\kxlckupgrade.exe"})
+      EXPECT_TRUE(readFileHead(base + file, 16, bytes)) << file;
     std::string host;
     ASSERT_TRUE(posix::hostPath(base + "\\bin\\kxlset.exe", host));
     struct stat st {};
@@ -117,13 +93,9 @@ TEST_F(DemoWorld, CopiesCarryTemplatesMarkersCatalogsAndPrograms) {
     EXPECT_TRUE(st.st_mode & S_IXUSR) << "programs must be startable";
   }
   std::vector<uint8_t> bytes;
-  EXPECT_TRUE(readFileHead("C:\\Program Files\\ZAV\\KXL101\\cfg\\kxlhpe.lvl", 16, bytes));
   EXPECT_TRUE(readFileHead("C:\\windows\\system32\\odbc32.dll", 16, bytes));
-  EXPECT_FALSE(readFileHead("C:\\windows\\system32\\clusapi.dll", 16, bytes));
-  // The templates of each copy are of its own release.
-  std::vector<uint8_t> image;
-  ASSERT_TRUE(readFileHead("C:\\Program Files\\ZAV\\KXL95\\CFG\\kxlsyssv", kDbmCfgSize, image));
-  EXPECT_EQ(readU16(image, kDbmCfgOffsetRelease) & 0x0F00, 0x0C00);
+  EXPECT_FALSE(readFileHead("C:\\windows\\system32\\clusapi.dll", 16, bytes))
+      << "the demo machine has no cluster";
 }
 
 TEST_F(DemoWorld, InstanceFilesFollowTheirReleases) {
@@ -141,24 +113,23 @@ TEST_F(DemoWorld, InstanceFilesFollowTheirReleases) {
   EXPECT_NE(text.find("2 winsrv2.zav.test WINSRV2 1 \r\n"), std::string::npos) << text;
 }
 
-TEST_F(TempDirTest, EmptyWorldHasAMachineButNoCopies) {
-  makeWorld("empty", "empty");
-  std::ostringstream out;
-  showWorld(out);
-  std::string text = out.str();
+TEST(CreateWorld, AnEmptyWorldHasAMachineAndCreateRefusesExistingWorldsAndUnknownScenarios) {
+  const std::string &empty = kxltestsupport::scenarioWorld("empty");
+  std::string error;
+  ASSERT_TRUE(selectWorld(empty, error)) << error;
+  std::string text = showText();
   EXPECT_NE(text.find("Copies:\nInstances:\nServices:\nMachines:\n"), std::string::npos) << text;
   EXPECT_NE(text.find("WINSRV1"), std::string::npos);
-}
 
-TEST_F(TempDirTest, CreateRefusesAnExistingWorldAndUnknownScenarios) {
-  makeWorld("w", "empty");
   std::vector<std::string> errors;
-  EXPECT_FALSE(createWorld(path("w"), "empty", buildSources(), errors));
+  EXPECT_FALSE(createWorld(empty, "empty", kxltestsupport::buildSources(), errors));
   ASSERT_FALSE(errors.empty());
   EXPECT_NE(errors[0].find("holds a world already"), std::string::npos);
+  std::string fresh = kxltestsupport::newTempDir("kxlsim-create") + "/x";
   errors.clear();
-  EXPECT_FALSE(createWorld(path("x"), "no-such-scenario", buildSources(), errors));
-  EXPECT_FALSE(std::filesystem::exists(path("x")));
+  EXPECT_FALSE(createWorld(fresh, "no-such-scenario", kxltestsupport::buildSources(), errors));
+  EXPECT_FALSE(std::filesystem::exists(fresh));
+  std::filesystem::remove_all(std::filesystem::path(fresh).parent_path());
 }
 
 } // namespace

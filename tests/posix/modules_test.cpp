@@ -1,54 +1,17 @@
 // The run-time modules: loading by the world's files, the cluster API over
 // the world's cluster, and the ODBC data source list.
-#include "world_fixture.h"
+#include "tests/support/world_access.h"
 
 #include "platform/clusapi.h"
 #include "platform/odbc.h"
 #include "sim/posix/modules.h"
 
+#include <optional>
 #include <set>
 #include <string>
 #include <vector>
 
-namespace kxlposixtest {
 namespace {
-
-const char *const kClusapiEntryPoints[] = {"MoveClusterGroup",
-                                           "OpenCluster",
-                                           "CloseCluster",
-                                           "OpenClusterGroup",
-                                           "CloseClusterGroup",
-                                           "OpenClusterNode",
-                                           "CloseClusterNode",
-                                           "ClusterOpenEnum",
-                                           "ClusterEnum",
-                                           "ClusterCloseEnum",
-                                           "GetClusterGroupState",
-                                           "ClusterGroupOpenEnum",
-                                           "ClusterGroupEnum",
-                                           "ClusterResourceControl",
-                                           "OnlineClusterGroup",
-                                           "OfflineClusterGroup",
-                                           "DeleteClusterGroup",
-                                           "ClusterResourceOpenEnum",
-                                           "ClusterResourceEnum",
-                                           "AddClusterResourceDependency",
-                                           "OpenClusterResource",
-                                           "CloseClusterResource",
-                                           "OnlineClusterResource",
-                                           "OfflineClusterResource",
-                                           "DeleteClusterResource",
-                                           "CreateClusterResource",
-                                           "GetClusterResourceState",
-                                           "DeleteClusterResourceType",
-                                           "CreateClusterResourceType",
-                                           "ClusterResourceTypeOpenEnum",
-                                           "ClusterResourceTypeEnum",
-                                           "ClusterResourceTypeCloseEnum",
-                                           "ClusterResourceCloseEnum",
-                                           "GetNodeClusterState"};
-const char *const kResutilsEntryPoints[] = {"ResUtilStartResourceService", "ResUtilStopResourceService",
-                                            "ResUtilResourceTypesEqual"};
 
 template <typename F> F entry(HMODULE module, const char *name) {
   FARPROC address = GetProcAddress(module, name);
@@ -56,29 +19,19 @@ template <typename F> F entry(HMODULE module, const char *name) {
   return reinterpret_cast<F>(reinterpret_cast<void (*)()>(address));
 }
 
-class ModulesTest : public WorldTest {
+class ModulesTest : public kxltest::WorldTest {
 protected:
-  void installModules() {
-    for (const char *name : {"clusapi.dll", "resutils.dll", "odbc32.dll"})
-      makeFile(std::string("drive_c/windows/system32/") + name, "MZ");
-  }
+  ModulesTest() : WorldTest(kxltestsupport::Machine::kModules) {}
 };
 
 TEST_F(ModulesTest, ModulesLoadOnlyWhenTheWorldHasTheirFiles) {
-  EXPECT_EQ(LoadLibraryA("clusapi.dll"), nullptr);
-  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_MOD_NOT_FOUND));
-  installModules();
   EXPECT_EQ(LoadLibraryA("kernel99.dll"), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_MOD_NOT_FOUND));
-
   HMODULE clusapi = LoadLibraryA("CLUSAPI.DLL");
   HMODULE resutils = LoadLibraryA("C:\\Windows\\System32\\resutils");
   ASSERT_NE(clusapi, nullptr);
   ASSERT_NE(resutils, nullptr);
-  for (const char *name : kClusapiEntryPoints)
-    EXPECT_NE(GetProcAddress(clusapi, name), nullptr) << name;
-  for (const char *name : kResutilsEntryPoints)
-    EXPECT_NE(GetProcAddress(resutils, name), nullptr) << name;
+  EXPECT_NE(GetProcAddress(resutils, "ResUtilResourceTypesEqual"), nullptr);
   EXPECT_EQ(GetProcAddress(clusapi, "ResUtilResourceTypesEqual"), nullptr)
       << "exports belong to their module";
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_PROC_NOT_FOUND));
@@ -92,64 +45,46 @@ TEST_F(ModulesTest, ModulesLoadOnlyWhenTheWorldHasTheirFiles) {
   EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 0);
   EXPECT_FALSE(FreeLibrary(clusapi)) << "a freed module handle is no longer valid";
   EXPECT_EQ(GetProcAddress(clusapi, "OpenCluster"), nullptr);
+  ASSERT_TRUE(DeleteFileA("C:\\windows\\system32\\clusapi.dll"));
+  EXPECT_EQ(LoadLibraryA("clusapi.dll"), nullptr) << "the world no longer has the module";
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_MOD_NOT_FOUND));
 }
 
 // The entry points the cluster cases use, bound by name as the command does.
 struct ClusterApi {
-  HMODULE clusapi = nullptr;
-  HMODULE resutils = nullptr;
-  PFN_OpenCluster openCluster;
-  PFN_CloseCluster closeCluster;
-  PFN_OpenClusterGroup openGroup;
-  PFN_CloseClusterGroup closeGroup;
-  PFN_ClusterOpenEnum openEnum;
-  PFN_ClusterEnum enumerate;
-  PFN_ClusterCloseEnum closeEnum;
-  PFN_CreateClusterResourceType createType;
-  PFN_CreateClusterResource createResource;
-  PFN_OpenClusterResource openResource;
-  PFN_CloseClusterResource closeResource;
-  PFN_DeleteClusterResource deleteResource;
-  PFN_AddClusterResourceDependency addDependency;
-  PFN_ClusterResourceOpenEnum openResourceEnum;
-  PFN_ClusterResourceEnum resourceEnum;
-  PFN_ClusterResourceCloseEnum closeResourceEnum;
-  PFN_ClusterResourceControl control;
-  PFN_GetClusterResourceState resourceState;
-  PFN_GetNodeClusterState nodeState;
-  PFN_ResUtilResourceTypesEqual typesEqual;
+  HMODULE clusapi = LoadLibraryA("clusapi.dll"), resutils = LoadLibraryA("resutils.dll");
+  PFN_OpenCluster openCluster = entry<PFN_OpenCluster>(clusapi, "OpenCluster");
+  PFN_CloseCluster closeCluster = entry<PFN_CloseCluster>(clusapi, "CloseCluster");
+  PFN_OpenClusterGroup openGroup = entry<PFN_OpenClusterGroup>(clusapi, "OpenClusterGroup");
+  PFN_CloseClusterGroup closeGroup = entry<PFN_CloseClusterGroup>(clusapi, "CloseClusterGroup");
+  PFN_ClusterOpenEnum openEnum = entry<PFN_ClusterOpenEnum>(clusapi, "ClusterOpenEnum");
+  PFN_ClusterEnum enumerate = entry<PFN_ClusterEnum>(clusapi, "ClusterEnum");
+  PFN_ClusterCloseEnum closeEnum = entry<PFN_ClusterCloseEnum>(clusapi, "ClusterCloseEnum");
+  PFN_CreateClusterResourceType createType =
+      entry<PFN_CreateClusterResourceType>(clusapi, "CreateClusterResourceType");
+  PFN_CreateClusterResource createResource =
+      entry<PFN_CreateClusterResource>(clusapi, "CreateClusterResource");
+  PFN_OpenClusterResource openResource = entry<PFN_OpenClusterResource>(clusapi, "OpenClusterResource");
+  PFN_CloseClusterResource closeResource = entry<PFN_CloseClusterResource>(clusapi, "CloseClusterResource");
+  PFN_DeleteClusterResource deleteResource =
+      entry<PFN_DeleteClusterResource>(clusapi, "DeleteClusterResource");
+  PFN_AddClusterResourceDependency addDependency =
+      entry<PFN_AddClusterResourceDependency>(clusapi, "AddClusterResourceDependency");
+  PFN_ClusterResourceOpenEnum openResourceEnum =
+      entry<PFN_ClusterResourceOpenEnum>(clusapi, "ClusterResourceOpenEnum");
+  PFN_ClusterResourceEnum resourceEnum = entry<PFN_ClusterResourceEnum>(clusapi, "ClusterResourceEnum");
+  PFN_ClusterResourceCloseEnum closeResourceEnum =
+      entry<PFN_ClusterResourceCloseEnum>(clusapi, "ClusterResourceCloseEnum");
+  PFN_ClusterResourceControl control = entry<PFN_ClusterResourceControl>(clusapi, "ClusterResourceControl");
+  PFN_GetClusterResourceState resourceState =
+      entry<PFN_GetClusterResourceState>(clusapi, "GetClusterResourceState");
+  PFN_GetNodeClusterState nodeState = entry<PFN_GetNodeClusterState>(clusapi, "GetNodeClusterState");
+  PFN_ResUtilResourceTypesEqual typesEqual =
+      entry<PFN_ResUtilResourceTypesEqual>(resutils, "ResUtilResourceTypesEqual");
 
-  void bind() {
-    clusapi = LoadLibraryA("clusapi.dll");
-    resutils = LoadLibraryA("resutils.dll");
-    ASSERT_NE(clusapi, nullptr);
-    ASSERT_NE(resutils, nullptr);
-    openCluster = entry<PFN_OpenCluster>(clusapi, "OpenCluster");
-    closeCluster = entry<PFN_CloseCluster>(clusapi, "CloseCluster");
-    openGroup = entry<PFN_OpenClusterGroup>(clusapi, "OpenClusterGroup");
-    closeGroup = entry<PFN_CloseClusterGroup>(clusapi, "CloseClusterGroup");
-    openEnum = entry<PFN_ClusterOpenEnum>(clusapi, "ClusterOpenEnum");
-    enumerate = entry<PFN_ClusterEnum>(clusapi, "ClusterEnum");
-    closeEnum = entry<PFN_ClusterCloseEnum>(clusapi, "ClusterCloseEnum");
-    createType = entry<PFN_CreateClusterResourceType>(clusapi, "CreateClusterResourceType");
-    createResource = entry<PFN_CreateClusterResource>(clusapi, "CreateClusterResource");
-    openResource = entry<PFN_OpenClusterResource>(clusapi, "OpenClusterResource");
-    closeResource = entry<PFN_CloseClusterResource>(clusapi, "CloseClusterResource");
-    deleteResource = entry<PFN_DeleteClusterResource>(clusapi, "DeleteClusterResource");
-    addDependency = entry<PFN_AddClusterResourceDependency>(clusapi, "AddClusterResourceDependency");
-    openResourceEnum = entry<PFN_ClusterResourceOpenEnum>(clusapi, "ClusterResourceOpenEnum");
-    resourceEnum = entry<PFN_ClusterResourceEnum>(clusapi, "ClusterResourceEnum");
-    closeResourceEnum = entry<PFN_ClusterResourceCloseEnum>(clusapi, "ClusterResourceCloseEnum");
-    control = entry<PFN_ClusterResourceControl>(clusapi, "ClusterResourceControl");
-    resourceState = entry<PFN_GetClusterResourceState>(clusapi, "GetClusterResourceState");
-    nodeState = entry<PFN_GetNodeClusterState>(clusapi, "GetNodeClusterState");
-    typesEqual = entry<PFN_ResUtilResourceTypesEqual>(resutils, "ResUtilResourceTypesEqual");
-  }
   ~ClusterApi() {
-    if (clusapi != nullptr)
-      FreeLibrary(clusapi);
-    if (resutils != nullptr)
-      FreeLibrary(resutils);
+    FreeLibrary(clusapi);
+    FreeLibrary(resutils);
   }
 
   std::vector<std::u16string> dependencies(HRESOURCE resource) {
@@ -174,70 +109,69 @@ class ClusterTest : public ModulesTest {
 protected:
   void SetUp() override {
     ModulesTest::SetUp();
-    installModules();
-    setMachineDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", ClusterStateRunning);
-    setMachineDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\G1", "State", 0);
-    api.bind();
+    setDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", ClusterStateRunning);
+    setDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\G1", "State", 0);
+    api.emplace();
   }
-  ClusterApi api;
+  std::optional<ClusterApi> api; // bound once the world is entered
 };
 
 TEST_F(ClusterTest, ResourcesAreCreatedEnumeratedLinkedAndDeleted) {
-  HCLUSTER cluster = api.openCluster(nullptr);
+  HCLUSTER cluster = api->openCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  EXPECT_EQ(api.createType(cluster, u"KXL Server", u"KXL Server", u"kxlserver.dll", 5000, 60000), 0u);
-  EXPECT_EQ(api.createType(cluster, u"kxl server", u"KXL Server", u"kxlserver.dll", 5000, 60000),
+  EXPECT_EQ(api->createType(cluster, u"KXL Server", u"KXL Server", u"kxlserver.dll", 5000, 60000), 0u);
+  EXPECT_EQ(api->createType(cluster, u"kxl server", u"KXL Server", u"kxlserver.dll", 5000, 60000),
             static_cast<DWORD>(ERROR_ALREADY_EXISTS));
-  EXPECT_EQ(api.createType(cluster, u"Physical Disk", u"Physical Disk", u"clusres.dll", 5000, 60000), 0u);
+  EXPECT_EQ(api->createType(cluster, u"Physical Disk", u"Physical Disk", u"clusres.dll", 5000, 60000), 0u);
 
-  EXPECT_EQ(api.openGroup(cluster, u"NoGroup"), nullptr);
+  EXPECT_EQ(api->openGroup(cluster, u"NoGroup"), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_GROUP_NOT_FOUND));
-  HGROUP group = api.openGroup(cluster, u"g1");
+  HGROUP group = api->openGroup(cluster, u"g1");
   ASSERT_NE(group, nullptr);
-  HRESOURCE server = api.createResource(group, u"INST1", u"KXL Server", CLUSTER_RESOURCE_SEPARATE_MONITOR);
-  HRESOURCE disk = api.createResource(group, u"Disk1", u"Physical Disk", 0);
+  HRESOURCE server = api->createResource(group, u"INST1", u"KXL Server", CLUSTER_RESOURCE_SEPARATE_MONITOR);
+  HRESOURCE disk = api->createResource(group, u"Disk1", u"Physical Disk", 0);
   ASSERT_NE(server, nullptr);
   ASSERT_NE(disk, nullptr);
-  EXPECT_EQ(api.createResource(group, u"inst1", u"KXL Server", 0), nullptr);
+  EXPECT_EQ(api->createResource(group, u"inst1", u"KXL Server", 0), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_OBJECT_ALREADY_EXISTS));
-  EXPECT_EQ(api.createResource(group, u"Other", u"No Such Type", 0), nullptr);
+  EXPECT_EQ(api->createResource(group, u"Other", u"No Such Type", 0), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_RESOURCE_TYPE_NOT_FOUND));
 
-  EXPECT_EQ(api.addDependency(server, disk), 0u);
-  EXPECT_EQ(api.addDependency(server, disk), static_cast<DWORD>(ERROR_DEPENDENCY_ALREADY_EXISTS));
-  EXPECT_EQ(api.addDependency(disk, server), static_cast<DWORD>(ERROR_CIRCULAR_DEPENDENCY));
-  EXPECT_EQ(api.dependencies(server), std::vector<std::u16string>{u"Disk1"});
+  EXPECT_EQ(api->addDependency(server, disk), 0u);
+  EXPECT_EQ(api->addDependency(server, disk), static_cast<DWORD>(ERROR_DEPENDENCY_ALREADY_EXISTS));
+  EXPECT_EQ(api->addDependency(disk, server), static_cast<DWORD>(ERROR_CIRCULAR_DEPENDENCY));
+  EXPECT_EQ(api->dependencies(server), std::vector<std::u16string>{u"Disk1"});
 
   BYTE type[130] = {};
   DWORD returned = 0;
-  EXPECT_EQ(api.control(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type, sizeof type,
-                        &returned),
+  EXPECT_EQ(api->control(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type, sizeof type,
+                         &returned),
             0u);
   EXPECT_EQ(std::u16string(reinterpret_cast<const char16_t *>(type)), u"KXL Server");
   EXPECT_EQ(returned, 22u);
-  EXPECT_EQ(api.control(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type, 4, &returned),
+  EXPECT_EQ(api->control(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type, 4, &returned),
             static_cast<DWORD>(ERROR_MORE_DATA));
   EXPECT_EQ(returned, 22u);
 
   WCHAR groupName[65];
   DWORD groupSize = 65;
-  EXPECT_EQ(api.resourceState(server, nullptr, nullptr, groupName, &groupSize), ClusterResourceOffline);
+  EXPECT_EQ(api->resourceState(server, nullptr, nullptr, groupName, &groupSize), ClusterResourceOffline);
   EXPECT_EQ(std::u16string(groupName), u"G1") << "the group's name as stored";
-  EXPECT_TRUE(api.typesEqual(u"kxl server", server));
-  EXPECT_FALSE(api.typesEqual(u"KXL", server));
+  EXPECT_TRUE(api->typesEqual(u"kxl server", server));
+  EXPECT_FALSE(api->typesEqual(u"KXL", server));
 
-  EXPECT_EQ(api.deleteResource(disk), static_cast<DWORD>(ERROR_DEPENDENT_RESOURCE_EXISTS));
-  EXPECT_EQ(api.dependencies(server), std::vector<std::u16string>{u"Disk1"});
-  EXPECT_EQ(api.deleteResource(server), 0u);
-  EXPECT_EQ(api.deleteResource(disk), 0u);
-  EXPECT_EQ(api.openResource(cluster, u"Disk1"), nullptr);
+  EXPECT_EQ(api->deleteResource(disk), static_cast<DWORD>(ERROR_DEPENDENT_RESOURCE_EXISTS));
+  EXPECT_EQ(api->dependencies(server), std::vector<std::u16string>{u"Disk1"});
+  EXPECT_EQ(api->deleteResource(server), 0u);
+  EXPECT_EQ(api->deleteResource(disk), 0u);
+  EXPECT_EQ(api->openResource(cluster, u"Disk1"), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_RESOURCE_NOT_FOUND));
-  EXPECT_EQ(api.openResource(cluster, u"inst1"), nullptr);
-  EXPECT_TRUE(api.closeResource(disk));
-  EXPECT_TRUE(api.closeResource(server));
-  EXPECT_FALSE(api.closeResource(server));
-  EXPECT_TRUE(api.closeGroup(group));
-  EXPECT_TRUE(api.closeCluster(cluster));
+  EXPECT_EQ(api->openResource(cluster, u"inst1"), nullptr);
+  EXPECT_TRUE(api->closeResource(disk));
+  EXPECT_TRUE(api->closeResource(server));
+  EXPECT_FALSE(api->closeResource(server));
+  EXPECT_TRUE(api->closeGroup(group));
+  EXPECT_TRUE(api->closeCluster(cluster));
 }
 
 // The rules by which the cluster refuses a change: an online resource cannot
@@ -246,59 +180,59 @@ TEST_F(ClusterTest, ResourcesAreCreatedEnumeratedLinkedAndDeleted) {
 TEST_F(ClusterTest, OnlineResourcesStayAndDependenciesStayInTheirGroup) {
   const std::string services = "SOFTWARE\\ZAV\\KXLSIM\\Services\\";
   const std::string remoteServices = "SOFTWARE\\ZAV\\KXLSIM\\Machines\\NODE2\\" + services;
-  setMachineDword((services + "INST1").c_str(), "State", 4);
-  setMachineDword((remoteServices + "INST2").c_str(), "State", 1);
-  setMachineString("SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\G2", "OwnerNode", "NODE2");
-  HCLUSTER cluster = api.openCluster(nullptr);
+  setDword(services + "INST1", "State", 4);
+  setDword(remoteServices + "INST2", "State", 1);
+  setString("SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\G2", "OwnerNode", "NODE2");
+  HCLUSTER cluster = api->openCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  api.createType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
-  HGROUP g1 = api.openGroup(cluster, u"G1");
-  HGROUP g2 = api.openGroup(cluster, u"G2");
-  HRESOURCE inst1 = api.createResource(g1, u"INST1", u"KXL", 0);
-  HRESOURCE inst2 = api.createResource(g2, u"INST2", u"KXL", 0);
-  HRESOURCE disk = api.createResource(g1, u"Disk1", u"KXL", 0);
+  api->createType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
+  HGROUP g1 = api->openGroup(cluster, u"G1");
+  HGROUP g2 = api->openGroup(cluster, u"G2");
+  HRESOURCE inst1 = api->createResource(g1, u"INST1", u"KXL", 0);
+  HRESOURCE inst2 = api->createResource(g2, u"INST2", u"KXL", 0);
+  HRESOURCE disk = api->createResource(g1, u"Disk1", u"KXL", 0);
   ASSERT_TRUE(inst1 != nullptr && inst2 != nullptr && disk != nullptr);
   WCHAR group[65];
   DWORD size = 65;
-  EXPECT_EQ(api.resourceState(inst1, nullptr, nullptr, group, &size), ClusterResourceOnline);
+  EXPECT_EQ(api->resourceState(inst1, nullptr, nullptr, group, &size), ClusterResourceOnline);
   size = 65;
-  EXPECT_EQ(api.resourceState(inst2, nullptr, nullptr, group, &size), ClusterResourceOffline);
+  EXPECT_EQ(api->resourceState(inst2, nullptr, nullptr, group, &size), ClusterResourceOffline);
 
-  EXPECT_EQ(api.addDependency(inst2, disk), static_cast<DWORD>(ERROR_INVALID_PARAMETER));
-  EXPECT_TRUE(api.dependencies(inst2).empty());
-  EXPECT_EQ(api.deleteResource(inst1), static_cast<DWORD>(ERROR_RESOURCE_ONLINE));
-  setMachineDword((services + "INST1").c_str(), "State", 1);
-  EXPECT_EQ(api.deleteResource(inst1), 0u);
-  setMachineDword((remoteServices + "INST2").c_str(), "State", 4);
-  EXPECT_EQ(api.deleteResource(inst2), static_cast<DWORD>(ERROR_RESOURCE_ONLINE))
+  EXPECT_EQ(api->addDependency(inst2, disk), static_cast<DWORD>(ERROR_INVALID_PARAMETER));
+  EXPECT_TRUE(api->dependencies(inst2).empty());
+  EXPECT_EQ(api->deleteResource(inst1), static_cast<DWORD>(ERROR_RESOURCE_ONLINE));
+  setDword(services + "INST1", "State", 1);
+  EXPECT_EQ(api->deleteResource(inst1), 0u);
+  setDword(remoteServices + "INST2", "State", 4);
+  EXPECT_EQ(api->deleteResource(inst2), static_cast<DWORD>(ERROR_RESOURCE_ONLINE))
       << "the service of the owning node counts";
   for (HRESOURCE resource : {inst1, inst2, disk})
-    api.closeResource(resource);
-  api.closeGroup(g1);
-  api.closeGroup(g2);
-  api.closeCluster(cluster);
+    api->closeResource(resource);
+  api->closeGroup(g1);
+  api->closeGroup(g2);
+  api->closeCluster(cluster);
 }
 
 TEST_F(ClusterTest, EnumerationReportsLengthsAndEndsWithNoMoreItems) {
-  HCLUSTER cluster = api.openCluster(nullptr);
+  HCLUSTER cluster = api->openCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  api.createType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
-  HGROUP group = api.openGroup(cluster, u"G1");
+  api->createType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
+  HGROUP group = api->openGroup(cluster, u"G1");
   for (const char16_t *name : {u"A-resource", u"B"})
-    api.closeResource(api.createResource(group, name, u"KXL", 0));
-  api.closeGroup(group);
+    api->closeResource(api->createResource(group, name, u"KXL", 0));
+  api->closeGroup(group);
 
-  HCLUSENUM listing = api.openEnum(cluster, CLUSTER_ENUM_RESOURCE);
+  HCLUSENUM listing = api->openEnum(cluster, CLUSTER_ENUM_RESOURCE);
   ASSERT_NE(listing, nullptr);
   std::set<std::u16string> names;
   WCHAR name[65];
   DWORD type = 0;
   DWORD size = 3;
-  EXPECT_EQ(api.enumerate(listing, 0, &type, name, &size), static_cast<DWORD>(ERROR_MORE_DATA));
+  EXPECT_EQ(api->enumerate(listing, 0, &type, name, &size), static_cast<DWORD>(ERROR_MORE_DATA));
   DWORD needed = size;
   for (DWORD i = 0;; ++i) {
     size = 65;
-    DWORD rc = api.enumerate(listing, i, &type, name, &size);
+    DWORD rc = api->enumerate(listing, i, &type, name, &size);
     if (rc == static_cast<DWORD>(ERROR_NO_MORE_ITEMS))
       break;
     ASSERT_EQ(rc, 0u);
@@ -310,19 +244,19 @@ TEST_F(ClusterTest, EnumerationReportsLengthsAndEndsWithNoMoreItems) {
     names.insert(name);
   }
   EXPECT_EQ(names, (std::set<std::u16string>{u"A-resource", u"B"}));
-  EXPECT_EQ(api.closeEnum(listing), 0u);
-  EXPECT_EQ(api.closeEnum(listing), static_cast<DWORD>(ERROR_INVALID_HANDLE));
-  api.closeCluster(cluster);
+  EXPECT_EQ(api->closeEnum(listing), 0u);
+  EXPECT_EQ(api->closeEnum(listing), static_cast<DWORD>(ERROR_INVALID_HANDLE));
+  api->closeCluster(cluster);
 }
 
 TEST_F(ClusterTest, ANodeWhoseServiceIsStoppedHasNoCluster) {
   DWORD state = 0;
-  EXPECT_EQ(api.nodeState(nullptr, &state), 0u);
+  EXPECT_EQ(api->nodeState(nullptr, &state), 0u);
   EXPECT_EQ(state, static_cast<DWORD>(ClusterStateRunning));
-  setMachineDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", ClusterStateNotRunning);
-  EXPECT_EQ(api.nodeState(nullptr, &state), 0u);
+  setDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", ClusterStateNotRunning);
+  EXPECT_EQ(api->nodeState(nullptr, &state), 0u);
   EXPECT_EQ(state, static_cast<DWORD>(ClusterStateNotRunning));
-  EXPECT_EQ(api.openCluster(nullptr), nullptr);
+  EXPECT_EQ(api->openCluster(nullptr), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(RPC_S_SERVER_UNAVAILABLE));
 }
 
@@ -330,8 +264,7 @@ class OdbcTest : public ModulesTest {
 protected:
   void SetUp() override {
     ModulesTest::SetUp();
-    installModules();
-    setMachineString(kSources, "SystemSource", "ZAV KXL ODBC DRIVER - COPY1");
+    setString(kSources, "SystemSource", "ZAV KXL ODBC DRIVER - COPY1");
     HKEY user = nullptr;
     ASSERT_EQ(
         RegCreateKeyExA(HKEY_CURRENT_USER, kSources, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &user, nullptr),
@@ -399,4 +332,3 @@ TEST_F(OdbcTest, CutsLongTextsAndRefusesBadHandles) {
 }
 
 } // namespace
-} // namespace kxlposixtest

@@ -1,22 +1,24 @@
 // Programs of the world started through CreateProcessA, the module path, the
 // environment and the computer name.
-#include "world_fixture.h"
+#include "tests/support/world_access.h"
 
 #include "sim/posix/cmdline.h"
 
 #include <cstdlib>
+#include <filesystem>
 #include <string>
 #include <unistd.h>
 #include <vector>
 
-namespace kxlposixtest {
 namespace {
 
-class ProcessTest : public WorldTest {
+using kxltestsupport::readHostFile;
+
+class ProcessTest : public kxltest::WorldTest {
 protected:
   void SetUp() override {
     WorldTest::SetUp();
-    makeDir("drive_c/KXL/bin");
+    std::filesystem::create_directories(host("drive_c/KXL/bin"));
     ASSERT_EQ(symlink(KXL_POSIX_CHILD, host("drive_c/KXL/bin/child.exe").c_str()), 0);
     setenv("KXL_CHILD_REPORT", host("report.txt").c_str(), 1);
   }
@@ -44,7 +46,7 @@ protected:
 
   std::vector<std::string> reportLines(const char *prefix) const {
     std::vector<std::string> lines;
-    std::string text = readFile(host("report.txt"));
+    std::string text = readHostFile(host("report.txt"));
     size_t start = 0;
     for (size_t end; (end = text.find('\n', start)) != std::string::npos; start = end + 1)
       if (text.compare(start, std::string(prefix).size(), prefix) == 0)
@@ -55,7 +57,7 @@ protected:
 };
 
 TEST_F(ProcessTest, ChildGetsQuotedArgumentsEnvironmentAndDirectoryAndReturnsItsExitCode) {
-  makeDir("drive_c/Work");
+  std::filesystem::create_directories(host("drive_c/Work"));
   ASSERT_TRUE(SetEnvironmentVariableA("KXL_CHILD_VALUE", "inherited"));
   ASSERT_TRUE(SetEnvironmentVariableA("KXL_CHILD_EXIT", "200"));
   EXPECT_EQ(run(nullptr, R"("C:\KXL\bin\child.exe" plain "with space" a\\\"b "" tail\)", "c:\\work"), 200);
@@ -67,12 +69,12 @@ TEST_F(ProcessTest, ChildGetsQuotedArgumentsEnvironmentAndDirectoryAndReturnsIts
 }
 
 TEST_F(ProcessTest, ProgramsNamedWithoutPathAreSearchedInSystemDirectoryAndPath) {
-  makeDir("drive_c/windows/system32");
+  std::filesystem::create_directories(host("drive_c/windows/system32"));
   ASSERT_EQ(symlink(KXL_POSIX_CHILD, host("drive_c/windows/system32/sysprog.exe").c_str()), 0);
   EXPECT_EQ(run(nullptr, "sysprog first"), 0);
   EXPECT_EQ(reportLines("module="), std::vector<std::string>{"C:\\windows\\system32\\sysprog.exe"});
 
-  makeDir("drive_c/Tools");
+  std::filesystem::create_directories(host("drive_c/Tools"));
   ASSERT_EQ(symlink(KXL_POSIX_CHILD, host("drive_c/Tools/pathprog.exe").c_str()), 0);
   std::string savedPath = std::getenv("PATH") != nullptr ? std::getenv("PATH") : "";
   setenv("PATH", "C:\\Nope;C:\\Tools", 1);
@@ -97,7 +99,7 @@ TEST_F(ProcessTest, RunningChildIsStillActiveUntilItEnds) {
   DWORD code = 0;
   EXPECT_TRUE(GetExitCodeProcess(info.hProcess, &code));
   EXPECT_EQ(code, static_cast<DWORD>(STILL_ACTIVE));
-  makeFile("go");
+  kxltestsupport::writeHostFile(host("go"), "");
   EXPECT_EQ(WaitForSingleObject(info.hThread, INFINITE), static_cast<DWORD>(WAIT_OBJECT_0));
   EXPECT_TRUE(GetExitCodeProcess(info.hProcess, &code));
   EXPECT_EQ(code, 0u);
@@ -136,7 +138,7 @@ TEST_F(ProcessTest, ComputerNameComesFromTheWorldsIdentity) {
   EXPECT_STREQ(buffer, "KXLHOST");
   EXPECT_EQ(size, 7u);
 
-  setMachineString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "ComputerName", "NODE7");
+  setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "ComputerName", "NODE7");
   size = 3;
   EXPECT_FALSE(GetComputerNameA(buffer, &size));
   EXPECT_EQ(GetLastError(), 111u);
@@ -159,4 +161,3 @@ TEST(CommandLineSplit, FollowsWindowsQuotingAndBackslashRules) {
 }
 
 } // namespace
-} // namespace kxlposixtest

@@ -1,7 +1,7 @@
 // Message catalogs: the MO reader on good, swapped and damaged images,
 // placeholder filling, and the message service over a world's catalogs.
-#include "fixture.h"
 #include "sim/product/mocatalog.h"
+#include "tests/support/product_world.h"
 
 #include <gtest/gtest.h>
 
@@ -11,8 +11,9 @@ using kxlprod::MoCatalog;
 
 namespace {
 
-std::string bytesOf(const std::vector<unsigned char> &bytes) {
-  return std::string(bytes.begin(), bytes.end());
+std::vector<unsigned char> hostFileBytes(const char *path) {
+  std::string text = kxltestsupport::readHostFile(path);
+  return std::vector<unsigned char>(text.begin(), text.end());
 }
 
 void put32le(std::vector<unsigned char> &image, size_t at, uint32_t value) {
@@ -28,7 +29,7 @@ std::string lookup(const MoCatalog &catalog, const char *key) {
 TEST(MoCatalog, ReadsBothByteOrders) {
   for (const char *path : {KXL_TESTCAT_LE, KXL_TESTCAT_BE}) {
     MoCatalog catalog;
-    ASSERT_TRUE(catalog.load(kxltest::hostFileBytes(path))) << path;
+    ASSERT_TRUE(catalog.load(hostFileBytes(path))) << path;
     EXPECT_EQ("KXL1951W  The instance \"<instance-name>\" was not found.", lookup(catalog, "KXL1951"));
     EXPECT_EQ("SQL0100W  No row was found.", lookup(catalog, "SQL0100W"));
     EXPECT_EQ("first form", lookup(catalog, "KXL0042")) << "plural entries give their first form";
@@ -38,7 +39,7 @@ TEST(MoCatalog, ReadsBothByteOrders) {
 }
 
 TEST(MoCatalog, RefusesOrSurvivesDamagedImages) {
-  std::vector<unsigned char> good = kxltest::hostFileBytes(KXL_TESTCAT_LE);
+  std::vector<unsigned char> good = hostFileBytes(KXL_TESTCAT_LE);
   ASSERT_GT(good.size(), 28u);
   MoCatalog catalog;
   // Every truncation either fails to load or finds nothing outside the image.
@@ -100,11 +101,16 @@ TEST(Placeholders, OutputIsCutToTheBuffer) {
   EXPECT_EQ('\0', one[0]);
 }
 
-class MessageService : public kxltest::LibraryWorld {
+class MessageService : public kxltest::ProductWorld {
 protected:
+  static constexpr const char *kInstall = "C:\\KXL101";
+  void SetUp() override {
+    ProductWorld::SetUp();
+    useCopy("KXL101", kInstall);
+  }
   void installCatalog(const char *language, const char *name, const char *hostMo) {
     writeFile(std::string(kInstall) + "\\msg\\" + language + "\\" + name,
-              bytesOf(kxltest::hostFileBytes(hostMo)));
+              kxltestsupport::readHostFile(hostMo));
   }
   std::string message(const char *catalog, uint32_t number, const char *const *tokens = nullptr) {
     char buffer[SQLO_MSG_BUFFER_SZ];

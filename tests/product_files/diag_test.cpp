@@ -1,8 +1,8 @@
 // Diagnostics: the lines of the trace file, silence without KXLTRACE, and
 // the diagnostic log beside the world's event log.
-#include "fixture.h"
 #include "sim/common/events.h"
 #include "sim/product/diag.h"
+#include "tests/support/product_world.h"
 
 #include <gtest/gtest.h>
 
@@ -60,7 +60,7 @@ TEST_F(Tracing, EveryHookWritesOneLine) {
             "exit 0x00000004 rc=0 -5\n"
             "error 0x00000005 probe=2 rc=-1\n"
             "exit 0x18780502 rc=-1969\n",
-            kxltest::hostFileText(tracePath_));
+            kxltestsupport::readHostFile(tracePath_));
 }
 
 TEST_F(Tracing, LongDataIsCutAndTheLineStaysWhole) {
@@ -68,7 +68,7 @@ TEST_F(Tracing, LongDataIsCutAndTheLineStaysWhole) {
   std::string longText(5000, 'x');
   pdtData1(0x1, 1, PD_TYPE_STRING, 0, longText.c_str());
   pdtExit(0x1, 0, 0);
-  std::string text = kxltest::hostFileText(tracePath_);
+  std::string text = kxltestsupport::readHostFile(tracePath_);
   size_t firstEnd = text.find('\n');
   ASSERT_NE(std::string::npos, firstEnd);
   EXPECT_LT(firstEnd, 1024u);
@@ -91,7 +91,7 @@ TEST_F(Tracing, DiagnosticLogLiesBesideTheEventLog) {
   EXPECT_EQ(0, pdLog(PD_LEVEL_INFO, 0x18780001, 11, 0, "%s", "two\nlines"));
   EXPECT_EQ("level=3 function=0x18780001 probe=10 rc=1168 ODBC status 1168\n"
             "level=4 function=0x18780001 probe=11 rc=0 two lines\n",
-            kxltest::hostFileText(log));
+            kxltestsupport::readHostFile(log));
   failCalls("pdLog:1");
   EXPECT_NE(0, pdLog(PD_LEVEL_INFO, 1, 1, 0, "dropped"));
 }

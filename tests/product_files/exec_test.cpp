@@ -1,7 +1,7 @@
 // Running programs: the command line a program receives, its exit code, and
 // the failure codes when it cannot be started.
-#include "fixture.h"
 #include "sim/product/cmdline.h"
+#include "tests/support/product_world.h"
 
 #include <gtest/gtest.h>
 
@@ -48,23 +48,19 @@ TEST(CommandLine, BlocksAndCommandTexts) {
   EXPECT_EQ("", rest);
 }
 
-#ifndef _WIN32
-class Programs : public kxltest::LibraryWorld {
+class Programs : public kxltest::ProductWorld {
 protected:
   void SetUp() override {
-    LibraryWorld::SetUp();
-    if (IsSkipped() || HasFatalFailure())
-      return;
-    namespace fs = std::filesystem;
-    fs::path bin = fs::path(worldRoot()) / "drive_c" / "KXL101" / "bin";
-    fs::create_directories(bin);
-    fs::copy_file(KXL_ARGDUMP, bin / "argdump.exe");
-    dumpPath_ = (fs::path(worldRoot()) / "args.txt").string();
+    ProductWorld::SetUp();
+    useCopy("KXL101", "C:\\KXL101");
+    makeDirectories("C:\\KXL101\\bin");
+    std::filesystem::copy_file(KXL_ARGDUMP, host("drive_c/KXL101/bin/argdump.exe"));
+    dumpPath_ = host("args.txt");
     kxltest::setProcessVariable("KXLTEST_ARGDUMP", dumpPath_.c_str());
   }
   void TearDown() override {
     kxltest::setProcessVariable("KXLTEST_ARGDUMP", nullptr);
-    LibraryWorld::TearDown();
+    ProductWorld::TearDown();
   }
   std::string dumpPath_;
 };
@@ -79,16 +75,16 @@ TEST_F(Programs, ArgumentsArriveUnchangedAndTheExitCodeIsReported) {
   EXPECT_EQ(7u, result.exitCode);
   EXPECT_NE(0u, pid);
   EXPECT_EQ("-l\nC:\\my dir\\upgrade.log\ntwo words\nsay \"hi\"\nback\\slash\\\n",
-            kxltest::hostFileText(dumpPath_));
+            kxltestsupport::readHostFile(dumpPath_));
 }
 
 TEST_F(Programs, ProgramsByNameAreFoundInTheCurrentCopy) {
   SQLO_EXEC_RESULT result{};
   ASSERT_EQ(0, sqloexec2("argdump.exe -cleanup", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
   EXPECT_EQ(7u, result.exitCode);
-  EXPECT_EQ("-cleanup\n", kxltest::hostFileText(dumpPath_));
+  EXPECT_EQ("-cleanup\n", kxltestsupport::readHostFile(dumpPath_));
   ASSERT_EQ(0, sqloexec2("argdump", nullptr, 0, 0xC0, nullptr, &result, 0, 0)) << "\".exe\" is implied";
-  EXPECT_EQ("", kxltest::hostFileText(dumpPath_));
+  EXPECT_EQ("", kxltestsupport::readHostFile(dumpPath_));
 }
 
 TEST_F(Programs, AProgramThatCannotStartIsAnError) {
@@ -110,11 +106,10 @@ TEST_F(Programs, AFailedWaitIsTriedAgain) {
   failCalls("WaitForSingleObject:1");
   EXPECT_EQ(0, sqloexec2("argdump.exe -x", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
   EXPECT_EQ(7u, result.exitCode);
-  EXPECT_EQ("-x\n", kxltest::hostFileText(dumpPath_));
+  EXPECT_EQ("-x\n", kxltestsupport::readHostFile(dumpPath_));
   failCalls("WaitForSingleObject:1,WaitForSingleObject:2");
   EXPECT_NE(0, sqloexec2("argdump.exe", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
   failCalls(nullptr);
 }
-#endif
 
 } // namespace

@@ -1,6 +1,6 @@
 // Files and directories: open flags, copies and their failure codes, whole
 // trees, path tests and directory creation, quoted paths.
-#include "fixture.h"
+#include "tests/support/product_world.h"
 
 #include <gtest/gtest.h>
 
@@ -8,8 +8,12 @@
 
 namespace {
 
-class Files : public kxltest::LibraryWorld {
+class Files : public kxltest::ProductWorld {
 protected:
+  void SetUp() override {
+    ProductWorld::SetUp();
+    useCopy("KXL101", "C:\\KXL101");
+  }
   static uint32_t pathTest(const char *path) {
     OSSPathParam param{OSS_PATH_PARAM_VERSION, path, 1, 0};
     return ossPathTest(&param);
@@ -44,7 +48,7 @@ TEST_F(Files, OpenFlagsSelectReadingCreatingAndReplacing) {
   ASSERT_EQ(SQLO_RC_FILE_EXISTED, sqloopenp("C:\\KXL101\\new.cfg", 843, 1604, &handle, 0));
   EXPECT_EQ(0, sqlowrite(handle, "two", 3, &done));
   EXPECT_EQ(0, sqloclose(handle));
-  EXPECT_EQ("two", readFile("C:\\KXL101\\new.cfg"));
+  EXPECT_EQ("two", readText("C:\\KXL101\\new.cfg"));
 
   // Open existing for reading, read to the end.
   ASSERT_EQ(0, sqloopenp("C:\\KXL101\\new.cfg", 0x314, 0x750, &handle, 0));
@@ -62,20 +66,20 @@ TEST_F(Files, CopyReplacesTheTargetAndNamesWhatIsMissing) {
   writeFile("C:\\src\\a.txt", "new");
   writeFile("C:\\dst\\a.txt", "old and longer");
   EXPECT_EQ(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\a.txt", 0));
-  EXPECT_EQ("new", readFile("C:\\dst\\a.txt"));
+  EXPECT_EQ("new", readText("C:\\dst\\a.txt"));
 
   EXPECT_EQ(int32_t(0x870F000Au), sqlocopy("C:\\src\\missing.txt", "C:\\dst\\b.txt", 0));
   EXPECT_EQ(int32_t(0x870F0011u), sqlocopy("C:\\src\\cfg\\missing.txt", "C:\\dst\\b.txt", 0));
-  EXPECT_FALSE(exists("C:\\dst\\b.txt"));
+  EXPECT_FALSE(pathExists("C:\\dst\\b.txt"));
 
   // A file carried into a folder the target lacks gets that folder.
   EXPECT_EQ(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\bin\\a.txt", 0));
-  EXPECT_EQ("new", readFile("C:\\dst\\bin\\a.txt"));
+  EXPECT_EQ("new", readText("C:\\dst\\bin\\a.txt"));
 
   // Quoted paths, as directories with blanks are passed, work as well.
   writeFile("C:\\with blank\\q.txt", "quoted");
   EXPECT_EQ(0, sqlocopy("\"C:\\with blank\\q.txt\"", "\"C:\\with blank\\r.txt\"", 0));
-  EXPECT_EQ("quoted", readFile("C:\\with blank\\r.txt"));
+  EXPECT_EQ("quoted", readText("C:\\with blank\\r.txt"));
 }
 
 TEST_F(Files, DirectoryTreesAreCopiedWholeAndDeletedWhole) {
@@ -84,20 +88,20 @@ TEST_F(Files, DirectoryTreesAreCopiedWholeAndDeletedWhole) {
   writeFile("C:\\backup\\kxlsystm", "stale");
   writeFile("C:\\backup\\keep.txt", "kept");
   ASSERT_EQ(0, sqlocopydir("C:\\backup", "C:\\inst\\INST1", 0));
-  EXPECT_EQ(std::string("\x01\x02\0\x03", 4), readFile("C:\\backup\\kxlsystm"));
-  EXPECT_EQ("dj", readFile("C:\\backup\\cfg\\kxldj.ini"));
-  EXPECT_EQ("audit", readFile("C:\\backup\\security\\audit\\kxlaudit.cfg"));
+  EXPECT_EQ(std::string("\x01\x02\0\x03", 4), readText("C:\\backup\\kxlsystm"));
+  EXPECT_EQ("dj", readText("C:\\backup\\cfg\\kxldj.ini"));
+  EXPECT_EQ("audit", readText("C:\\backup\\security\\audit\\kxlaudit.cfg"));
   EXPECT_TRUE(ossIsDirectory("C:\\backup\\empty"));
-  EXPECT_EQ("kept", readFile("C:\\backup\\keep.txt"));
+  EXPECT_EQ("kept", readText("C:\\backup\\keep.txt"));
 
   // A missing target is created with its parents.
   ASSERT_EQ(0, sqlocopydir("C:\\new\\profile\\INST1", "C:\\inst\\INST1", 0));
-  EXPECT_EQ("dj", readFile("C:\\new\\profile\\INST1\\cfg\\kxldj.ini"));
+  EXPECT_EQ("dj", readText("C:\\new\\profile\\INST1\\cfg\\kxldj.ini"));
 
   EXPECT_EQ(SQLO_RC_PATH_NOT_FOUND, sqlocopydir("C:\\x", "C:\\inst\\none", 0));
   EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, sqlocopydir("C:\\inst\\INST1\\cfg\\inner", "C:\\inst\\INST1", 0))
       << "a tree is never copied into itself";
-  EXPECT_FALSE(exists("C:\\inst\\INST1\\cfg\\inner"));
+  EXPECT_FALSE(pathExists("C:\\inst\\INST1\\cfg\\inner"));
 
   // A listing that fails part way fails the copy instead of ending it early.
   kxltest::setProcessVariable("KXLSIM_FAIL", "FindNextFileA:4");
@@ -107,12 +111,12 @@ TEST_F(Files, DirectoryTreesAreCopiedWholeAndDeletedWhole) {
   kxlsim::resetFaults();
 
   ASSERT_EQ(0, sqlodeletedir("C:\\backup"));
-  EXPECT_FALSE(exists("C:\\backup"));
-  EXPECT_TRUE(exists("C:\\inst\\INST1\\kxlsystm"));
+  EXPECT_FALSE(pathExists("C:\\backup"));
+  EXPECT_TRUE(pathExists("C:\\inst\\INST1\\kxlsystm"));
   EXPECT_EQ(SQLO_RC_PATH_NOT_FOUND, sqlodeletedir("C:\\backup"));
   EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, sqlodeletedir("C:\\"));
   EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, sqlodeletedir("C:"));
-  EXPECT_TRUE(exists("C:\\inst"));
+  EXPECT_TRUE(pathExists("C:\\inst"));
 }
 
 // A tree copy checks the target's drive for room first and writes nothing
@@ -134,7 +138,7 @@ TEST_F(Files, TreeCopiesNeedRoomForTheTreeBeforeWritingAnything) {
     kxltest::setProcessVariable("KXLSIM_FAIL", c.fault);
     kxlsim::resetFaults();
     EXPECT_EQ(c.rc, sqlocopydir("C:\\copy", "C:\\inst\\INST1", 0));
-    EXPECT_EQ(c.rc == 0, exists("C:\\copy")) << "nothing written when it fails";
+    EXPECT_EQ(c.rc == 0, pathExists("C:\\copy")) << "nothing written when it fails";
     kxltest::setProcessVariable("KXLSIM_FAIL", nullptr);
     kxlsim::resetFaults();
     sqlodeletedir("C:\\copy");
@@ -173,7 +177,7 @@ TEST_F(Files, PathTestsAndDirectoryCreation) {
   EXPECT_TRUE(ossIsDirectory("C:\\a\\b\\c"));
   EXPECT_EQ(0u, createDirectory("C:\\a\\b\\c", 2)) << "an existing directory is fine";
   EXPECT_EQ(0x9000001Au, createDirectory("C:\\x\\y", 0));
-  EXPECT_FALSE(exists("C:\\x"));
+  EXPECT_FALSE(pathExists("C:\\x"));
   EXPECT_NE(0u, createDirectory("C:\\p\\file.txt", 2));
 }
 
@@ -191,7 +195,7 @@ TEST_F(Files, InjectedFailures) {
   failCalls("sqlocopy:2,ossPathTest:1");
   EXPECT_EQ(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\a.txt", 0));
   EXPECT_NE(0, sqlocopy("C:\\src\\a.txt", "C:\\dst\\b.txt", 0));
-  EXPECT_FALSE(exists("C:\\dst\\b.txt"));
+  EXPECT_FALSE(pathExists("C:\\dst\\b.txt"));
   EXPECT_NE(0u, pathTest("C:\\src\\a.txt"));
   EXPECT_EQ(0u, pathTest("C:\\src\\a.txt"));
 }
@@ -221,8 +225,8 @@ TEST_F(Files, UnreadableAttributesAreNotAMissingFile) {
   EXPECT_EQ(OSS_RC_FAILED, pathTest("C:\\src\\missing.txt"));
   failCalls(nullptr);
   EXPECT_EQ(OSS_RC_PATH_NOT_FOUND, pathTest("C:\\src\\missing.txt"));
-  EXPECT_TRUE(exists("C:\\src\\a.txt"));
-  EXPECT_FALSE(exists("C:\\dst\\c.txt"));
+  EXPECT_TRUE(pathExists("C:\\src\\a.txt"));
+  EXPECT_FALSE(pathExists("C:\\dst\\c.txt"));
 }
 
 } // namespace

@@ -1,19 +1,14 @@
 // Names and text: comparisons, upper-casing, instance names, languages and
 // the password prompt.
-#include "fixture.h"
 #include "sim/product/text.h"
+#include "tests/support/product_world.h"
 
 #include <gtest/gtest.h>
 
 #include <cstdio>
 #include <string>
 
-#ifdef _WIN32
-#include <fcntl.h>
-#include <io.h>
-#else
 #include <unistd.h>
-#endif
 
 namespace {
 
@@ -106,31 +101,17 @@ class PipedInput : public kxltest::ProductWorld {
 protected:
   void feed(const std::string &input) {
     int fds[2];
-#ifdef _WIN32
-    ASSERT_EQ(0, _pipe(fds, 4096, _O_BINARY));
-    saved_ = _dup(0);
-    ASSERT_EQ(int(input.size()), _write(fds[1], input.data(), unsigned(input.size())));
-    _close(fds[1]);
-    _dup2(fds[0], 0);
-    _close(fds[0]);
-#else
     ASSERT_EQ(0, pipe(fds));
     saved_ = dup(0);
     ASSERT_EQ(ssize_t(input.size()), write(fds[1], input.data(), input.size()));
     close(fds[1]);
     dup2(fds[0], 0);
     close(fds[0]);
-#endif
   }
   void TearDown() override {
     if (saved_ >= 0) {
-#ifdef _WIN32
-      _dup2(saved_, 0);
-      _close(saved_);
-#else
       dup2(saved_, 0);
       close(saved_);
-#endif
     }
     ProductWorld::TearDown();
   }

@@ -1,39 +1,51 @@
-// A fresh demo world per case, with the current copy (KXL101) as the
+// A copy of the demo world per case, with the current copy (KXL101) as the
 // library's current installation, and readable differences against a
 // snapshot taken earlier in the case.
 #pragma once
 
-#include "platform/kxlsys.h"
-#include "tests/support/world_access.h"
-
-#include <gtest/gtest.h>
+#include "sim/kxlsim/diff.h"
+#include "sim/kxlsim/snapshot.h"
+#include "tests/support/product_world.h"
+#include "tests/support/scenario_world.h"
 
 #include <cstdint>
+#include <sstream>
 #include <string>
 #include <vector>
 
 namespace kxltest {
 
-class DemoWorld : public ::testing::Test, public WorldAccess {
+class DemoWorld : public ProductWorld {
 protected:
-  void SetUp() override;
-  void TearDown() override;
+  DemoWorld() : ProductWorld(kxltestsupport::CopyOf{kxltestsupport::scenarioWorld("demo")}) {}
+  void SetUp() override {
+    ProductWorld::SetUp();
+    ASSERT_EQ(0, sqloSwitchToInstallationName("KXL101"));
+  }
 
   // Copies the world aside; diff() compares against the latest snapshot.
-  void snapshot();
+  void snapshot() {
+    before_ = world_.scratch("snapshot" + std::to_string(++snapshots_));
+    std::string error;
+    ASSERT_TRUE(kxlsim::snapshotWorld(worldRoot(), before_, error)) << error;
+  }
   // The difference lines of the world against the snapshot ("" when equal).
-  std::string diff();
+  std::string diff() const {
+    std::ostringstream out;
+    kxlsim::diffWorlds(before_, worldRoot(), out);
+    return out.str();
+  }
 
-  // KXLSIM_FAIL for the rest of the case.
-  static void failCalls(const char *faults);
-  static void setInstance(const char *name);
-
+  static void setInstance(const char *name) { setProcessVariable("KXLINSTANCE", name); }
   // A string value, "<no key>" or "<no value>".
-  static std::string regString(const std::string &path, const char *name);
-  static std::vector<uint8_t> readFile(const std::string &windowsPath);
-  static std::string readText(const std::string &windowsPath);
-
-  const std::string &root() const { return world_; }
+  static std::string regString(const std::string &path, const char *name) {
+    return regStringOr(path, name, "<no key>", "<no value>");
+  }
+  static std::vector<uint8_t> readFile(const std::string &windowsPath) {
+    std::vector<uint8_t> data;
+    readWholeFile(windowsPath, data);
+    return data;
+  }
 
   static constexpr const char *kCopy = "C:\\Program Files\\ZAV\\KXL101";
   static constexpr const char *kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
@@ -42,12 +54,8 @@ protected:
   static constexpr const char *kRemote = "SOFTWARE\\ZAV\\KXLSIM\\Machines\\WINSRV2\\";
 
 private:
-  std::string base_, world_, before_;
+  std::string before_;
   int snapshots_ = 0;
 };
-
-uint32_t checksumOf(const std::vector<uint8_t> &image);
-uint32_t le32(const std::vector<uint8_t> &image, size_t offset);
-uint16_t le16(const std::vector<uint8_t> &image, size_t offset);
 
 } // namespace kxltest

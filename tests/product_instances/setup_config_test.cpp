@@ -1,6 +1,7 @@
 // The application environment's partition table, parameter lookup, and
 // updates of the current instance's configuration file.
 #include "demo_world.h"
+#include "sim/kxlsim/dbmcfg_image.h"
 
 #include <algorithm>
 #include <cstring>
@@ -92,8 +93,8 @@ TEST_F(Configuration, AuthenticationTypeGoesIntoTheCurrentInstanceWithAValidChec
   EXPECT_EQ(ca.sqlcode, 0);
   std::vector<uint8_t> after = readFile(path);
   ASSERT_EQ(after.size(), 16384u);
-  EXPECT_EQ(le16(after, 28), 3u);
-  EXPECT_EQ(le32(after, 0), checksumOf(after));
+  EXPECT_EQ(sqloLe16(after.data(), 28), 3u);
+  EXPECT_TRUE(kxlsim::dbmCfgChecksumValid(after));
   after[28] = before[28];
   after[29] = before[29];
   EXPECT_TRUE(std::equal(after.begin() + 4, after.end(), before.begin() + 4)) << "nothing else changes";

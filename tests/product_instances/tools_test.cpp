@@ -7,7 +7,7 @@
 
 #include <sys/wait.h>
 
-#include <fstream>
+#include <sstream>
 
 namespace kxltest {
 namespace {
@@ -19,7 +19,7 @@ protected:
     std::string host;
     EXPECT_TRUE(kxlsim::posix::hostPath(std::string(kCopy) + "\\bin\\" + program, host));
     std::string command =
-        "KXLSIM_ROOT='" + root() + "' KXLINSTANCE=INST1 '" + host + "' " + args + " 2>/dev/null";
+        "KXLSIM_ROOT='" + worldRoot() + "' KXLINSTANCE=INST1 '" + host + "' " + args + " 2>/dev/null";
     int status = std::system(command.c_str());
     return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
   }
@@ -69,7 +69,7 @@ TEST_F(Tools, ProgramsWorkForTheirOwnCopyUnlessConfiguredToFail) {
   EXPECT_EQ(0, run("kxlimaudcfg.exe", ""));
   EXPECT_EQ(readText(kAudit), before + "# upgraded for copy KXL101\r\n");
   EXPECT_EQ(2, run("kxlimsslcfg.exe", "-c")) << "usage error";
-  std::ifstream events(root() + "/events.jsonl");
+  std::istringstream events(kxltestsupport::readHostFile(host("events.jsonl")));
   std::string line;
   int runs = 0;
   while (std::getline(events, line))

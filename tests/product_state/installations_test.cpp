@@ -4,9 +4,7 @@
 #include <map>
 #include <string>
 
-#ifndef _WIN32
 #include <filesystem>
-#endif
 
 namespace {
 
@@ -38,13 +36,9 @@ protected:
   std::string probeFrom(const std::string &folder, DWORD &exitCode) {
     makeDirectories(folder);
     std::string target = folder + "\\probe.exe";
-#ifdef _WIN32
-    EXPECT_TRUE(CopyFileA(KXL_PRODUCT_PROBE, target.c_str(), FALSE));
-#else
     std::string host;
     EXPECT_TRUE(kxlsim::posix::hostPath(target, host));
     std::filesystem::create_symlink(KXL_PRODUCT_PROBE, host);
-#endif
     STARTUPINFOA startup{};
     startup.cb = sizeof startup;
     PROCESS_INFORMATION process{};

@@ -96,11 +96,6 @@ int runCommand(const CommandRun &run) {
   return WIFEXITED(status) ? WEXITSTATUS(status) : kRunNotExited;
 }
 
-std::string readHostFile(const std::string &path) {
-  std::ifstream in(path, std::ios::binary);
-  return std::string(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-}
-
 std::string drivePath(const std::string &worldRoot, const std::string &windowsPath) {
   std::string path =
       worldRoot + "/drive_c/" + windowsPath.substr(std::min<std::size_t>(3, windowsPath.size()));

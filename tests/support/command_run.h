@@ -4,6 +4,8 @@
 // such tests share.
 #pragma once
 
+#include "tests/support/temp_world.h"
+
 #include <string>
 #include <vector>
 
@@ -29,9 +31,6 @@ int runCommand(const CommandRun &run);
 // reads (KXLSIM_ROOT, KXLTRACE, KXLSIM_FAIL and the other fault settings,
 // KXLINSTANCE, KXLTEST_DRIVER, TMP, TEMP), followed by `settings`.
 std::vector<std::string> scrubbedEnvironment(const std::vector<std::string> &settings);
-
-// The whole content of a host file ("" when it cannot be read).
-std::string readHostFile(const std::string &path);
 
 // Host path below `worldRoot` of a Windows path on drive C: ("C:\a\b" ->
 // "<worldRoot>/drive_c/a/b"), without a trailing "/".

@@ -1,65 +1,34 @@
-// A machine of its own for every product library test: a fresh temporary world
-// on non-Windows hosts. On Windows the world is the machine itself, so the cases
-// run only where that machine is disposable (KXL_TEST_DISPOSABLE_MACHINE=1,
-// e.g. a throw-away Wine prefix) and remove SOFTWARE\ZAV afterwards.
+// A machine of its own for every product library case, with the library's
+// process state (fault plan, current instance, caches) forgotten before and
+// after it, and the registry entries those cases set up most.
 #pragma once
 
 #include "platform/kxlsys.h"
-#include "platform/win32.h"
-#include "sim/common/simfail.h"
 #include "sim/product/state.h"
 #include "tests/support/world_access.h"
 
-#include <gtest/gtest.h>
-
-#include <cstdlib>
 #include <string>
-
-#include "tests/support/temp_world.h"
 
 namespace kxltest {
 
 inline void setProcessVariable(const char *name, const char *value) {
-#ifdef _WIN32
-  _putenv_s(name, value != nullptr ? value : "");
-#else
   if (value != nullptr)
     setenv(name, value, 1);
   else
     unsetenv(name);
-#endif
 }
 
-class ProductWorld : public ::testing::Test, public WorldAccess {
+class ProductWorld : public WorldTest {
 protected:
+  using WorldTest::WorldTest;
+
   void SetUp() override {
-#ifdef _WIN32
-    const char *disposable = std::getenv("KXL_TEST_DISPOSABLE_MACHINE");
-    if (disposable == nullptr || std::string(disposable) != "1")
-      GTEST_SKIP() << "the product library cases change HKLM; set KXL_TEST_DISPOSABLE_MACHINE=1";
-#else
-    ASSERT_FALSE(world_.root().empty()) << "cannot create a temporary world";
-    world_.enter();
-#endif
-    started_ = true;
+    WorldTest::SetUp();
     resetProcess();
   }
-
   void TearDown() override {
-    if (!started_)
-      return;
     resetProcess();
-#ifdef _WIN32
-    SHDeleteKeyA(HKEY_LOCAL_MACHINE, "SOFTWARE\\ZAV");
-#else
-    world_.leave();
-#endif
-  }
-
-  // KXLSIM_FAIL for the rest of the case ("name:n,...").
-  static void failCalls(const char *faults) {
-    setProcessVariable("KXLSIM_FAIL", faults);
-    kxlsim::resetFaults();
+    WorldTest::TearDown();
   }
 
   // The "State" of a service of this machine ("") or of another one.
@@ -73,6 +42,13 @@ protected:
   // A copy registered under InstalledCopies with its installation path.
   static void registerCopy(const std::string &copy, const std::string &path) {
     setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\" + copy, "KXL Path Name", path);
+  }
+
+  // A registered copy whose folder exists, made the library's current installation.
+  static void useCopy(const std::string &copy, const std::string &path) {
+    registerCopy(copy, path);
+    makeDirectories(path);
+    ASSERT_EQ(0, sqloSwitchToInstallationName(copy.c_str()));
   }
 
   // The version-8 installation in the single-copy layout.
@@ -89,25 +65,12 @@ protected:
     setString(key, "Copy", copy);
   }
 
-#ifndef _WIN32
-  // Host directory of the world.
-  const std::string &worldRoot() const {
-    return world_.root();
-  }
-#endif
-
 private:
   static void resetProcess() {
-    setProcessVariable("KXLSIM_FAIL", nullptr);
-    setProcessVariable("KXLINSTANCE", nullptr);
-    kxlsim::resetFaults();
+    failCalls(nullptr);
+    unsetenv("KXLINSTANCE");
     kxlprod::resetLibraryState();
   }
-
-#ifndef _WIN32
-  kxltestsupport::TempWorld world_{"kxlprod"};
-#endif
-  bool started_ = false;
 };
 
 } // namespace kxltest

@@ -1,9 +1,11 @@
 // Reading and writing the registry and the files of the test's machine
 // through the Win32 surface: what the in-process fixtures set up before a case
-// and look at afterwards. HKEY_LOCAL_MACHINE throughout.
+// and look at afterwards. HKEY_LOCAL_MACHINE throughout. And the fixture that
+// gives each case a machine of its own.
 #pragma once
 
 #include "platform/win32.h"
+#include "tests/support/temp_world.h"
 
 #include <gtest/gtest.h>
 
@@ -116,9 +118,44 @@ struct WorldAccess {
     return true;
   }
 
+  // The whole content of a file at a Windows path, or "<missing>".
+  static std::string readText(const std::string &windowsPath) {
+    std::vector<unsigned char> bytes;
+    return readWholeFile(windowsPath, bytes) ? std::string(bytes.begin(), bytes.end()) : "<missing>";
+  }
+
   static bool pathExists(const std::string &windowsPath) {
     return GetFileAttributesA(windowsPath.c_str()) != INVALID_FILE_ATTRIBUTES;
   }
+
+  // KXLSIM_FAIL for the rest of the case ("name:n,..."; nullptr: none).
+  static void failCalls(const char *faults) {
+    if (faults != nullptr)
+      setenv("KXLSIM_FAIL", faults, 1);
+    else
+      unsetenv("KXLSIM_FAIL");
+    kxlsim::resetFaults();
+  }
+};
+
+// A fresh temporary machine per case (see temp_world.h), entered for the case
+// and removed after it.
+class WorldTest : public ::testing::Test, public WorldAccess {
+protected:
+  explicit WorldTest(kxltestsupport::Machine machine = kxltestsupport::Machine::kEmpty)
+      : world_("kxltest", machine) {}
+  explicit WorldTest(const kxltestsupport::CopyOf &source) : world_("kxltest", source) {}
+  void SetUp() override {
+    ASSERT_FALSE(world_.root().empty()) << "cannot create a temporary world";
+    world_.enter();
+  }
+  void TearDown() override { world_.leave(); }
+
+  // The world's host folder, and host paths in it ("drive_c/A/b").
+  const std::string &worldRoot() const { return world_.root(); }
+  std::string host(const std::string &relative) const { return world_.host(relative); }
+
+  kxltestsupport::TempWorld world_;
 };
 
 } // namespace kxltest

@@ -5,15 +5,6 @@
 #include <random>
 #include <vector>
 
-#ifndef _WIN32
-#include "sim/posix/world.h"
-
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
-#include <unistd.h>
-#endif
-
 namespace kxltest {
 
 bool runningUnderWine() {
@@ -42,56 +33,16 @@ bool sameIgnoringCase(const std::string &a, const std::string &b) {
   return true;
 }
 
-#ifndef _WIN32
-namespace {
-
-void writeText(const std::filesystem::path &path, const char *text) {
-  std::ofstream out(path, std::ios::binary);
-  out << text;
-}
-
-// A minimal world: empty registries and a drive C: whose system folder holds
-// the run-time modules the module cases load.
-std::string makeWorld() {
-  std::string pattern = (std::filesystem::temp_directory_path() / "kxlconf.XXXXXX").string();
-  std::vector<char> name(pattern.begin(), pattern.end());
-  name.push_back('\0');
-  if (mkdtemp(name.data()) == nullptr)
-    return std::string();
-  std::filesystem::path root(name.data());
-  writeText(root / "system.reg", "REGEDIT4\n\n");
-  writeText(root / "user.reg", "REGEDIT4\n\n");
-  std::filesystem::path system32 = root / "drive_c" / "windows" / "system32";
-  std::filesystem::create_directories(system32);
-  writeText(system32 / "odbc32.dll", "");
-  return root.string();
-}
-
-} // namespace
-#endif
-
 void Win32Test::SetUp() {
 #ifndef _WIN32
-  char cwd[4096];
-  if (getcwd(cwd, sizeof cwd) != nullptr)
-    hostCwd_ = cwd;
-  worldDir_ = makeWorld();
-  ASSERT_FALSE(worldDir_.empty()) << "cannot create a temporary world";
-  setenv("KXLSIM_ROOT", worldDir_.c_str(), 1);
-  kxlsim::posix::resetWorldRoot();
+  ASSERT_FALSE(world_.root().empty()) << "cannot create a temporary world";
+  world_.enter();
 #endif
 }
 
 void Win32Test::TearDown() {
 #ifndef _WIN32
-  if (!hostCwd_.empty() && chdir(hostCwd_.c_str()) != 0)
-    ADD_FAILURE() << "cannot return to the starting directory";
-  if (!worldDir_.empty()) {
-    std::error_code ignored;
-    std::filesystem::remove_all(worldDir_, ignored);
-  }
-  unsetenv("KXLSIM_ROOT");
-  kxlsim::posix::resetWorldRoot();
+  world_.leave();
 #endif
 }
 

@@ -4,6 +4,7 @@
 #pragma once
 
 #include "platform/win32.h"
+#include "tests/support/temp_world.h"
 
 #include <gtest/gtest.h>
 
@@ -21,16 +22,17 @@ std::string uniqueName();
 // Byte-wise equality ignoring ASCII case, as Windows compares names.
 bool sameIgnoringCase(const std::string &a, const std::string &b);
 
-// Every case runs in a machine of its own: a fresh temporary world on
-// non-Windows hosts, the real machine on Windows.
+// Every case runs in a machine of its own: a fresh temporary world with the
+// run-time modules' files on non-Windows hosts, the real machine on Windows.
 class Win32Test : public ::testing::Test {
 protected:
   void SetUp() override;
   void TearDown() override;
 
+#ifndef _WIN32
 private:
-  std::string worldDir_;
-  std::string hostCwd_;
+  kxltestsupport::TempWorld world_{"kxlconf", kxltestsupport::Machine::kModules};
+#endif
 };
 
 // An open registry key, closed when it goes out of scope.

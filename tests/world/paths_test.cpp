@@ -1,6 +1,6 @@
 // Windows paths onto the world's folders, and finding the world at all.
 #include "platform/win32.h"
-#include "world_fixture.h"
+#include "tests/support/world_access.h"
 
 #include <fcntl.h>
 #include <sys/wait.h>
@@ -14,121 +14,112 @@
 namespace kxlsim::testing {
 namespace {
 
+using kxltestsupport::readHostFile;
 using posix::hostPath;
 using posix::windowsPath;
 
-class PathTest : public WorldTest {
+class PathTest : public kxltest::WorldTest {
 protected:
   void SetUp() override {
     WorldTest::SetUp();
-    std::filesystem::create_directories(root + "/drive_c/Program Files/KXL/bin");
-    std::filesystem::create_directories(root + "/unc/SRV01/Share/dir");
-    char buffer[PATH_MAX];
-    ASSERT_NE(getcwd(buffer, sizeof buffer), nullptr);
-    startDir = buffer;
-  }
-  void TearDown() override {
-    EXPECT_EQ(chdir(startDir.c_str()), 0);
-    WorldTest::TearDown();
+    std::filesystem::create_directories(host("drive_c/Program Files/KXL/bin"));
+    std::filesystem::create_directories(host("unc/SRV01/Share/dir"));
   }
   std::string mapped(const std::string &windows) {
     std::string out;
     return hostPath(windows, out) ? out : "<refused>";
   }
-  std::string startDir;
+  // Each Windows path maps to the host path below the world ("" for refused).
+  void expectMapped(const std::vector<std::pair<std::string, std::string>> &rows) {
+    for (const auto &[windows, relative] : rows)
+      EXPECT_EQ(mapped(windows), relative.empty() ? "<refused>" : host(relative)) << windows;
+  }
 };
 
-TEST_F(PathTest, DrivesAndSharesMapToTheirFolders) {
-  EXPECT_EQ(mapped("C:\\A\\b"), root + "/drive_c/A/b");
-  EXPECT_EQ(mapped("c:/A/b"), root + "/drive_c/A/b");
-  EXPECT_EQ(mapped("D:\\"), root + "/drive_d");
-  EXPECT_EQ(mapped("C:\\dir\\"), root + "/drive_c/dir");
-  EXPECT_EQ(mapped("\\\\srv01\\SHARE\\Dir\\new"), root + "/unc/SRV01/Share/dir/new");
-  EXPECT_EQ(mapped("//OTHER/s/x"), root + "/unc/OTHER/s/x");
-}
-
-TEST_F(PathTest, ExistingNamesWinIgnoringCase) {
-  EXPECT_EQ(mapped("C:\\PROGRAM FILES\\kxl\\BIN"), root + "/drive_c/Program Files/KXL/bin");
-  // Missing components keep their spelling, and so does everything below them.
-  EXPECT_EQ(mapped("C:\\program files\\New\\Bin"), root + "/drive_c/Program Files/New/Bin");
-  // Windows drops trailing dots and spaces of a name.
-  EXPECT_EQ(mapped("C:\\Program Files.\\kxl  \\bin"), root + "/drive_c/Program Files/KXL/bin");
+TEST_F(PathTest, WindowsPathsMapIgnoringCaseAndNeverLeaveTheirDriveOrShare) {
+  expectMapped({
+      {"C:\\A\\b", "drive_c/A/b"},
+      {"c:/A/b", "drive_c/A/b"},
+      {"D:\\", "drive_d"},
+      {"C:\\dir\\", "drive_c/dir"},
+      {"\\\\srv01\\SHARE\\Dir\\new", "unc/SRV01/Share/dir/new"},
+      {"//OTHER/s/x", "unc/OTHER/s/x"},
+      // Existing names win ignoring case; missing ones and all below them keep their spelling.
+      {"C:\\PROGRAM FILES\\kxl\\BIN", "drive_c/Program Files/KXL/bin"},
+      {"C:\\program files\\New\\Bin", "drive_c/Program Files/New/Bin"},
+      // Windows drops trailing dots and spaces of a name.
+      {"C:\\Program Files.\\kxl  \\bin", "drive_c/Program Files/KXL/bin"},
+      {"C:\\a\\..\\b\\.\\c", "drive_c/b/c"},
+      {"C:\\..\\..\\x", "drive_c/x"},
+      {"\\\\SRV01\\Share\\..\\..\\x", "unc/SRV01/Share/x"},
+      // Names Windows refuses.
+      {"", ""},
+      {"\"C:\\Program Files\\KXL\"", ""}, // quotes stay and make no path
+      {"C:\\a|b", ""},
+      {"C:\\a\\b:c", ""},
+      {"\\\\server", ""},
+      {"\\\\?\\C:\\x", ""},
+      {std::string("C:\\a\0b", 6), ""},
+  });
 }
 
 // A folder's listing is kept between lookups: changes by other processes (and
 // by hand) are still seen at once, and so are this process's own.
 TEST_F(PathTest, KeptListingsFollowEveryChangeOfTheFolder) {
-  const std::string bin = root + "/drive_c/Program Files/KXL/bin";
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\Tool.exe"), bin + "/Tool.exe") << "listed, not there";
+  const std::string bin = host("drive_c/Program Files/KXL/bin");
+  const std::string windowsBin = "C:\\Program Files\\KXL\\bin\\";
+  EXPECT_EQ(mapped(windowsBin + "Tool.exe"), bin + "/Tool.exe") << "listed, not there";
   pid_t child = fork();
   if (child == 0)
     _exit(std::ofstream(bin + "/TOOL.EXE") ? 0 : 1);
   int status = 0;
   ASSERT_EQ(waitpid(child, &status, 0), child);
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\Tool.exe"), bin + "/TOOL.EXE") << "another process's file";
+  EXPECT_EQ(mapped(windowsBin + "Tool.exe"), bin + "/TOOL.EXE") << "another process's file";
   std::filesystem::remove(bin + "/TOOL.EXE");
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\tool.exe"), bin + "/tool.exe") << "removed by hand";
+  EXPECT_EQ(mapped(windowsBin + "tool.exe"), bin + "/tool.exe") << "removed by hand";
 
   // This process's own changes through the file calls.
-  ASSERT_TRUE(CreateDirectoryA("C:\\Program Files\\KXL\\bin\\Sub", nullptr));
+  ASSERT_TRUE(CreateDirectoryA((windowsBin + "Sub").c_str(), nullptr));
   EXPECT_EQ(mapped("C:\\Program Files\\KXL\\BIN\\sub\\x"), bin + "/Sub/x");
-  HANDLE file = CreateFileA("C:\\Program Files\\KXL\\bin\\Made.txt", GENERIC_WRITE, 0, nullptr, CREATE_NEW,
+  HANDLE file = CreateFileA((windowsBin + "Made.txt").c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW,
                             FILE_ATTRIBUTE_NORMAL, nullptr);
   ASSERT_NE(file, INVALID_HANDLE_VALUE);
   CloseHandle(file);
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\MADE.TXT"), bin + "/Made.txt");
-  ASSERT_TRUE(
-      CopyFileA("C:\\Program Files\\KXL\\bin\\made.txt", "C:\\Program Files\\KXL\\bin\\Copy.txt", TRUE));
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\COPY.txt"), bin + "/Copy.txt");
-  ASSERT_TRUE(
-      MoveFileExA("C:\\Program Files\\KXL\\bin\\copy.txt", "C:\\Program Files\\KXL\\bin\\Moved.txt", 0));
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\copy.txt"), bin + "/copy.txt");
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\moved.TXT"), bin + "/Moved.txt");
-  ASSERT_TRUE(DeleteFileA("C:\\Program Files\\KXL\\bin\\MOVED.txt"));
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\bin\\moved.txt"), bin + "/moved.txt");
-}
-
-TEST_F(PathTest, DotsNeverClimbOutOfTheDriveOrShare) {
-  EXPECT_EQ(mapped("C:\\a\\..\\b\\.\\c"), root + "/drive_c/b/c");
-  EXPECT_EQ(mapped("C:\\..\\..\\x"), root + "/drive_c/x");
-  EXPECT_EQ(mapped("\\\\SRV01\\Share\\..\\..\\x"), root + "/unc/SRV01/Share/x");
+  EXPECT_EQ(mapped(windowsBin + "MADE.TXT"), bin + "/Made.txt");
+  ASSERT_TRUE(CopyFileA((windowsBin + "made.txt").c_str(), (windowsBin + "Copy.txt").c_str(), TRUE));
+  EXPECT_EQ(mapped(windowsBin + "COPY.txt"), bin + "/Copy.txt");
+  ASSERT_TRUE(MoveFileExA((windowsBin + "copy.txt").c_str(), (windowsBin + "Moved.txt").c_str(), 0));
+  EXPECT_EQ(mapped(windowsBin + "copy.txt"), bin + "/copy.txt");
+  EXPECT_EQ(mapped(windowsBin + "moved.TXT"), bin + "/Moved.txt");
+  ASSERT_TRUE(DeleteFileA((windowsBin + "MOVED.txt").c_str()));
+  EXPECT_EQ(mapped(windowsBin + "moved.txt"), bin + "/moved.txt");
 }
 
 TEST_F(PathTest, RelativePathsFollowTheCurrentDirectory) {
-  ASSERT_EQ(chdir((root + "/drive_c/Program Files/KXL").c_str()), 0);
-  EXPECT_EQ(mapped("bin\\f.exe"), root + "/drive_c/Program Files/KXL/bin/f.exe");
-  EXPECT_EQ(mapped("..\\y"), root + "/drive_c/Program Files/y");
-  EXPECT_EQ(mapped("\\top"), root + "/drive_c/top");
-  EXPECT_EQ(mapped("c:BIN"), root + "/drive_c/Program Files/KXL/bin");
-  EXPECT_EQ(mapped("D:rel"), root + "/drive_d/rel");
-
-  ASSERT_EQ(chdir((root + "/unc/SRV01/Share/dir").c_str()), 0);
-  EXPECT_EQ(mapped("\\x"), root + "/unc/SRV01/Share/x");
-
-  // Outside the world the current directory counts as C:\.
+  ASSERT_EQ(chdir(host("drive_c/Program Files/KXL").c_str()), 0);
+  expectMapped({{"bin\\f.exe", "drive_c/Program Files/KXL/bin/f.exe"},
+                {"..\\y", "drive_c/Program Files/y"},
+                {"\\top", "drive_c/top"},
+                {"c:BIN", "drive_c/Program Files/KXL/bin"},
+                {"D:rel", "drive_d/rel"}});
+  ASSERT_EQ(chdir(host("unc/SRV01/Share/dir").c_str()), 0);
+  EXPECT_EQ(mapped("\\x"), host("unc/SRV01/Share/x"));
   ASSERT_EQ(chdir("/"), 0);
-  EXPECT_EQ(mapped("rel\\x"), root + "/drive_c/rel/x");
-}
-
-TEST_F(PathTest, NamesWindowsRefusesDoNotMap) {
-  EXPECT_EQ(mapped(""), "<refused>");
-  EXPECT_EQ(mapped("\"C:\\Program Files\\KXL\""), "<refused>"); // quotes stay and make no path
-  EXPECT_EQ(mapped("C:\\a|b"), "<refused>");
-  EXPECT_EQ(mapped("C:\\a\\b:c"), "<refused>");
-  EXPECT_EQ(mapped("\\\\server"), "<refused>");
-  EXPECT_EQ(mapped("\\\\?\\C:\\x"), "<refused>");
-  EXPECT_EQ(mapped(std::string("C:\\a\0b", 6)), "<refused>");
+  EXPECT_EQ(mapped("rel\\x"), host("drive_c/rel/x")) << "outside the world the current directory is C:\\";
 }
 
 TEST_F(PathTest, HostPathsGiveWindowsPathsBack) {
-  EXPECT_EQ(windowsPath(root + "/drive_c/Program Files/KXL"), "C:\\Program Files\\KXL");
-  EXPECT_EQ(windowsPath(root + "/drive_c"), "C:\\");
-  EXPECT_EQ(windowsPath(root + "/drive_d/"), "D:\\");
-  EXPECT_EQ(windowsPath(root + "/unc/SRV01/Share/dir"), "\\\\SRV01\\Share\\dir");
-  EXPECT_EQ(windowsPath(root + "/unc/SRV01"), "");
-  EXPECT_EQ(windowsPath(root + "/system.reg"), "");
-  EXPECT_EQ(windowsPath(root + "x/drive_c"), "");
-  EXPECT_EQ(windowsPath("/usr/bin"), "");
+  const std::pair<std::string, std::string> rows[] = {
+      {host("drive_c/Program Files/KXL"), "C:\\Program Files\\KXL"},
+      {host("drive_c"), "C:\\"},
+      {host("drive_d/"), "D:\\"},
+      {host("unc/SRV01/Share/dir"), "\\\\SRV01\\Share\\dir"},
+      {host("unc/SRV01"), ""},
+      {host("system.reg"), ""},
+      {worldRoot() + "x/drive_c", ""},
+      {"/usr/bin", ""}};
+  for (const auto &[hostFile, windows] : rows)
+    EXPECT_EQ(windowsPath(hostFile), windows) << hostFile;
 }
 
 // Started through a link by the tests below: writes the world it finds to the
@@ -139,7 +130,7 @@ TEST(WorldProbe, Report) {
     GTEST_SKIP() << "only run as a child of the root search tests";
   if (std::getenv("KXL_WORLD_PROBE_REQUIRE") != nullptr)
     posix::requireWorld();
-  writeText(out, posix::worldRoot());
+  kxltestsupport::writeHostFile(out, posix::worldRoot());
 }
 
 // Runs this test program through `link` without KXLSIM_ROOT; returns its exit status.
@@ -170,17 +161,15 @@ int runProbe(const std::string &link, const std::string &report, bool require, c
 }
 
 TEST_F(PathTest, WorldIsFoundAboveTheProgramAsStarted) {
-  std::string link = root + "/drive_c/Program Files/KXL/bin/probe";
-  EXPECT_EQ(runProbe(link, root + "/report", false, root + "/errors"), 0);
-  EXPECT_EQ(readText(root + "/report"), root);
+  EXPECT_EQ(runProbe(host("drive_c/Program Files/KXL/bin/probe"), host("report"), false, host("errors")), 0);
+  EXPECT_EQ(readHostFile(host("report")), worldRoot());
 }
 
 TEST_F(PathTest, NoWorldStopsWithOneLine) {
-  std::string outside = root + "/outside";
+  std::string outside = world_.scratch("outside");
   std::filesystem::create_directories(outside);
-  std::filesystem::remove(root + "/system.reg"); // nothing above the link holds a hive now
   EXPECT_EQ(runProbe(outside + "/probe", outside + "/report", true, outside + "/errors"), 3);
-  EXPECT_EQ(readText(outside + "/errors"),
+  EXPECT_EQ(readHostFile(outside + "/errors"),
             "kxlsim: no world found: set KXLSIM_ROOT or run from inside a world\n");
   EXPECT_FALSE(std::filesystem::exists(outside + "/report"));
 }

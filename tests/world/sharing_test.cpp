@@ -3,7 +3,7 @@
 // whole hive behind.
 #include "platform/win32.h"
 #include "sim/posix/regfile.h"
-#include "world_fixture.h"
+#include "tests/support/world_access.h"
 
 #include <signal.h>
 #include <sys/wait.h>
@@ -16,6 +16,9 @@
 namespace kxlsim::testing {
 namespace {
 
+using kxltestsupport::readHostFile;
+using kxltestsupport::writeHostFile;
+
 using posix::hive::HiveFile;
 using posix::hive::Key;
 
@@ -25,11 +28,11 @@ int waitExit(pid_t pid) {
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
-LONG setDword(HKEY key, const char *name, DWORD value) {
+LONG putDword(HKEY key, const char *name, DWORD value) {
   return RegSetValueExA(key, name, 0, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
 }
 
-LONG getDword(HKEY key, const char *name, DWORD &value) {
+LONG queryDword(HKEY key, const char *name, DWORD &value) {
   DWORD size = sizeof value;
   return RegQueryValueExA(key, name, nullptr, nullptr, reinterpret_cast<BYTE *>(&value), &size);
 }
@@ -41,21 +44,21 @@ HKEY createKey(const char *path) {
   return key;
 }
 
-using SharingTest = WorldTest;
+using SharingTest = kxltest::WorldTest;
 
 TEST_F(SharingTest, AnOpenKeySeesAnotherProcessChanges) {
   HKEY key = createKey("SOFTWARE\\Shared");
-  ASSERT_EQ(setDword(key, "Value", 0), ERROR_SUCCESS);
+  ASSERT_EQ(putDword(key, "Value", 0), ERROR_SUCCESS);
   // Same-sized rewrites in quick succession: each must still be noticed.
   for (DWORD round = 1; round <= 20; ++round) {
     pid_t child = fork();
     if (child == 0) {
       HKEY own = createKey("SOFTWARE\\SHARED");
-      _exit(setDword(own, "value", round) == ERROR_SUCCESS ? 0 : 1);
+      _exit(putDword(own, "value", round) == ERROR_SUCCESS ? 0 : 1);
     }
     ASSERT_EQ(waitExit(child), 0);
     DWORD seen = 0;
-    ASSERT_EQ(getDword(key, "Value", seen), ERROR_SUCCESS);
+    ASSERT_EQ(queryDword(key, "Value", seen), ERROR_SUCCESS);
     ASSERT_EQ(seen, round);
   }
   // A key deleted by another process is gone for this process's handle too.
@@ -64,7 +67,7 @@ TEST_F(SharingTest, AnOpenKeySeesAnotherProcessChanges) {
     _exit(SHDeleteKeyA(HKEY_LOCAL_MACHINE, "Software\\Shared") == ERROR_SUCCESS ? 0 : 1);
   ASSERT_EQ(waitExit(child), 0);
   DWORD seen = 0;
-  EXPECT_EQ(getDword(key, "Value", seen), ERROR_KEY_DELETED);
+  EXPECT_EQ(queryDword(key, "Value", seen), ERROR_KEY_DELETED);
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
@@ -77,7 +80,7 @@ TEST_F(SharingTest, ConcurrentWritersLoseNothing) {
       HKEY key = createKey("SOFTWARE\\Busy");
       for (int i = 0; i < kValues; ++i) {
         std::string name = "w" + std::to_string(writer) + "_" + std::to_string(i);
-        if (setDword(key, name.c_str(), static_cast<DWORD>(i)) != ERROR_SUCCESS)
+        if (putDword(key, name.c_str(), static_cast<DWORD>(i)) != ERROR_SUCCESS)
           _exit(1);
       }
       _exit(0);
@@ -86,7 +89,7 @@ TEST_F(SharingTest, ConcurrentWritersLoseNothing) {
   }
   for (pid_t child : children)
     ASSERT_EQ(waitExit(child), 0);
-  HiveFile file(root + "/system.reg", "HKEY_LOCAL_MACHINE");
+  HiveFile file(worldRoot() + "/system.reg", "HKEY_LOCAL_MACHINE");
   ASSERT_EQ(file.read([](const Key &tree) -> LONG {
     const Key *busy = posix::hive::findKey(tree, {"SOFTWARE", "Busy"});
     EXPECT_NE(busy, nullptr);
@@ -100,7 +103,7 @@ TEST_F(SharingTest, ConcurrentWritersLoseNothing) {
 // them all in one update, again and again, and is killed at random moments.
 TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
   constexpr int kKeys = 1500;
-  const std::string hivePath = root + "/system.reg";
+  const std::string hivePath = worldRoot() + "/system.reg";
   auto setGeneration = [&](Key &tree, bool &changed, DWORD generation) -> LONG {
     for (int i = 0; i < kKeys; ++i) {
       bool created = false;
@@ -130,7 +133,7 @@ TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
 
     Key tree;
     std::string error;
-    ASSERT_TRUE(posix::hive::parseHive(readText(hivePath), "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    ASSERT_TRUE(posix::hive::parseHive(readHostFile(hivePath), "HKEY_LOCAL_MACHINE", tree, error)) << error;
     const Key *load = posix::hive::findKey(tree, {"SOFTWARE", "Load"});
     ASSERT_NE(load, nullptr);
     ASSERT_EQ(load->subkeys.size(), static_cast<size_t>(kKeys));
@@ -140,7 +143,7 @@ TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
   }
   // The hive stays writable after the kills.
   HKEY key = createKey("SOFTWARE\\After");
-  EXPECT_EQ(setDword(key, "Fine", 1), ERROR_SUCCESS);
+  EXPECT_EQ(putDword(key, "Fine", 1), ERROR_SUCCESS);
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
@@ -152,23 +155,24 @@ TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
   auto othersSee = [this](const char *value) {
     Key tree;
     std::string error;
-    EXPECT_TRUE(posix::hive::loadHive(root + "/system.reg", "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    EXPECT_TRUE(posix::hive::loadHive(worldRoot() + "/system.reg", "HKEY_LOCAL_MACHINE", tree, error))
+        << error;
     const Key *batch = posix::hive::findKey(tree, {"SOFTWARE", "Batch"});
     return batch != nullptr && batch->values.count(posix::hive::fold(value)) != 0;
   };
-  std::string before = readText(root + "/system.reg");
+  std::string before = readHostFile(worldRoot() + "/system.reg");
   {
     posix::hive::WriteBatch outer;
     HKEY key = createKey("SOFTWARE\\Batch");
-    ASSERT_EQ(setDword(key, "First", 1), ERROR_SUCCESS);
+    ASSERT_EQ(putDword(key, "First", 1), ERROR_SUCCESS);
     {
       posix::hive::WriteBatch inner; // nested: only the outermost one writes
-      ASSERT_EQ(setDword(key, "Second", 2), ERROR_SUCCESS);
+      ASSERT_EQ(putDword(key, "Second", 2), ERROR_SUCCESS);
     }
     DWORD seen = 0;
-    EXPECT_EQ(getDword(key, "Second", seen), ERROR_SUCCESS); // this process sees its own changes
+    EXPECT_EQ(queryDword(key, "Second", seen), ERROR_SUCCESS); // this process sees its own changes
     EXPECT_EQ(seen, 2u);
-    EXPECT_EQ(readText(root + "/system.reg"), before);
+    EXPECT_EQ(readHostFile(worldRoot() + "/system.reg"), before);
     EXPECT_FALSE(othersSee("First"));
     EXPECT_TRUE(outer.commit());
     EXPECT_TRUE(othersSee("First"));
@@ -177,7 +181,7 @@ TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
   }
   // After the batch, changes reach the others at once again.
   HKEY key = createKey("SOFTWARE\\Batch");
-  ASSERT_EQ(setDword(key, "Third", 3), ERROR_SUCCESS);
+  ASSERT_EQ(putDword(key, "Third", 3), ERROR_SUCCESS);
   EXPECT_TRUE(othersSee("Third"));
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
@@ -204,59 +208,52 @@ bool exists(const std::string &path) {
 // another reader replays from the log is exactly the writer's tree, and once
 // the writer ends the hive file is that tree written whole, with no log left.
 TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
-  const std::string hivePath = root + "/system.reg";
-  const std::vector<BYTE> binary = {0, 1, 0xfe, '"', '\\', '\n'};
-  const std::vector<std::function<void(posix::hive::Change &)>> changes = {
-      [](auto &c) {
-        c.createKey({"SOFTWARE", "Kinds", "Empty"});
-      },
-      [](auto &c) {
-        c.setValue({"SOFTWARE", "Kinds"}, {"Quote\"and\\slash", REG_SZ, {'a', '"', 0}});
-      },
-      [&](auto &c) {
-        c.setValue({"SOFTWARE", "Kinds"}, {"", REG_BINARY, binary});
-      },
-      [](auto &c) {
-        c.setValue({"SOFTWARE", "Kinds"}, {"Lines", REG_SZ, {'a', '\r', '\n', 'b', 0}});
-      },
-      [](auto &c) {
-        c.setValue({"SOFTWARE", "Kinds"}, {"Number", REG_DWORD, {1, 2, 3, 4}});
-      },
-      [](auto &c) {
-        c.setValue({"SOFTWARE", "Kinds", "Gone"}, {"X", REG_MULTI_SZ, {'x', 0, 0}});
-      },
-      [](auto &c) {
-        c.setValue({"SOFTWARE", "Kinds"}, {"Dropped", REG_NONE, {}});
-      },
-      [](auto &c) {
-        c.deleteValue({"SOFTWARE", "Kinds"}, "DROPPED");
-      },
-      [](auto &c) {
-        c.deleteValue({"SOFTWARE", "Kinds"}, "");
-      },
-      [](auto &c) {
-        c.setValue({"SOFTWARE", "Kinds"}, {"", REG_SZ, {'d', 0}});
-      },
-      [](auto &c) {
-        Key source;
-        bool created = false;
-        Key &sub = posix::hive::createKey(source, {"Deep", "Er"}, created);
-        posix::hive::setValue(sub, "V", REG_EXPAND_SZ, {'%', 'p', '%', 0});
-        c.mergeKey({"SOFTWARE", "Copied"}, source);
-      },
-      [](auto &c) {
-        c.deleteKey({"software", "KINDS", "gone"});
-      },
-      [](auto &c) {
-        c.setValue({"software", "kinds"}, {"number", REG_DWORD, {9, 9, 9, 9}});
-      },
+  const std::string hivePath = worldRoot() + "/system.reg";
+  using posix::hive::Value;
+  enum Kind { kCreate, kSet, kDeleteValue, kDeleteKey, kMerge };
+  const struct {
+    Kind kind;
+    posix::hive::KeyPath path;
+    Value value; // for kDeleteValue only its name
+  } changes[] = {
+      {kCreate, {"SOFTWARE", "Kinds", "Empty"}, {}},
+      {kSet, {"SOFTWARE", "Kinds"}, {"Quote\"and\\slash", REG_SZ, {'a', '"', 0}}},
+      {kSet, {"SOFTWARE", "Kinds"}, {"", REG_BINARY, {0, 1, 0xfe, '"', '\\', '\n'}}},
+      {kSet, {"SOFTWARE", "Kinds"}, {"Lines", REG_SZ, {'a', '\r', '\n', 'b', 0}}},
+      {kSet, {"SOFTWARE", "Kinds"}, {"Number", REG_DWORD, {1, 2, 3, 4}}},
+      {kSet, {"SOFTWARE", "Kinds", "Gone"}, {"X", REG_MULTI_SZ, {'x', 0, 0}}},
+      {kSet, {"SOFTWARE", "Kinds"}, {"Dropped", REG_NONE, {}}},
+      {kDeleteValue, {"SOFTWARE", "Kinds"}, {"DROPPED", REG_NONE, {}}},
+      {kDeleteValue, {"SOFTWARE", "Kinds"}, {"", REG_NONE, {}}},
+      {kSet, {"SOFTWARE", "Kinds"}, {"", REG_SZ, {'d', 0}}},
+      {kMerge, {"SOFTWARE", "Copied"}, {"V", REG_EXPAND_SZ, {'%', 'p', '%', 0}}}, // as Deep\Er\V
+      {kDeleteKey, {"software", "KINDS", "gone"}, {}},
+      {kSet, {"software", "kinds"}, {"number", REG_DWORD, {9, 9, 9, 9}}},
+  };
+  auto apply = [](const auto &row, posix::hive::Change &c) {
+    Key source;
+    bool created = false;
+    switch (row.kind) {
+    case kCreate:
+      return c.createKey(row.path);
+    case kSet:
+      return c.setValue(row.path, row.value);
+    case kDeleteValue:
+      return c.deleteValue(row.path, row.value.name);
+    case kDeleteKey:
+      return c.deleteKey(row.path);
+    case kMerge:
+      posix::hive::setValue(posix::hive::createKey(source, {"Deep", "Er"}, created), row.value.name,
+                            row.value.type, row.value.data);
+      return c.mergeKey(row.path, source);
+    }
   };
   std::string writerTree;
   {
     HiveFile file(hivePath, "HKEY_LOCAL_MACHINE");
-    for (const auto &describe : changes) {
+    for (const auto &row : changes) {
       ASSERT_EQ(file.change([&](const Key &, posix::hive::Change &c) -> LONG {
-        describe(c);
+        apply(row, c);
         return ERROR_SUCCESS;
       }),
                 ERROR_SUCCESS);
@@ -271,7 +268,7 @@ TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
     EXPECT_EQ(writerTree.find("Gone"), std::string::npos);
     EXPECT_NE(writerTree.find("\"Number\"=dword:09090909"), std::string::npos) << "first spelling kept";
   }
-  EXPECT_EQ(readText(hivePath), writerTree);
+  EXPECT_EQ(readHostFile(hivePath), writerTree);
   EXPECT_FALSE(exists(hivePath + ".log"));
 }
 
@@ -279,11 +276,11 @@ TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
 // the records before it and nothing of it; the next writer writes the hive
 // whole instead of appending after it.
 TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
-  const std::string hivePath = root + "/system.reg";
+  const std::string hivePath = worldRoot() + "/system.reg";
   pid_t child = fork();
   if (child == 0) {
     HKEY key = createKey("SOFTWARE\\Cut");
-    _exit(setDword(key, "Whole", 1) == ERROR_SUCCESS ? 0 : 1); // no clean-up: the log stays
+    _exit(putDword(key, "Whole", 1) == ERROR_SUCCESS ? 0 : 1); // no clean-up: the log stays
   }
   ASSERT_EQ(waitExit(child), 0);
   const std::string whole = replayed(hivePath);
@@ -292,16 +289,16 @@ TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
   for (const std::string &cut : {std::string("@"), std::string("@57 00000000"),
                                  "@" + std::to_string(record.size()) + " 0000000000000000\n" + record,
                                  "@" + std::to_string(record.size() + 9) + " 0000000000000000\n" + record}) {
-    std::string log = readText(hivePath + ".log");
-    writeText(hivePath + ".log", log + cut);
+    std::string log = readHostFile(hivePath + ".log");
+    writeHostFile(hivePath + ".log", log + cut);
     EXPECT_EQ(replayed(hivePath), whole) << cut;
-    writeText(hivePath + ".log", log);
+    writeHostFile(hivePath + ".log", log);
   }
-  writeText(hivePath + ".log", readText(hivePath + ".log") + record.substr(0, 20));
+  writeHostFile(hivePath + ".log", readHostFile(hivePath + ".log") + record.substr(0, 20));
   HKEY key = createKey("SOFTWARE\\Cut");
-  ASSERT_EQ(setDword(key, "After", 3), ERROR_SUCCESS);
+  ASSERT_EQ(putDword(key, "After", 3), ERROR_SUCCESS);
   EXPECT_FALSE(exists(hivePath + ".log")) << "folded";
-  std::string text = readText(hivePath);
+  std::string text = readHostFile(hivePath);
   EXPECT_NE(text.find("\"Whole\"=dword:00000001"), std::string::npos);
   EXPECT_NE(text.find("\"After\"=dword:00000003"), std::string::npos);
   EXPECT_EQ(text.find("Torn"), std::string::npos);
@@ -313,15 +310,15 @@ TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
 // bring back what was changed after them, so readers ignore that log, and the
 // next change starts a new one.
 TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
-  const std::string hivePath = root + "/system.reg";
+  const std::string hivePath = worldRoot() + "/system.reg";
   std::string oldLog;
   pid_t child = fork();
   if (child == 0) {
     HKEY key = createKey("SOFTWARE\\Stale");
-    bool ok = setDword(key, "Value", 1) == ERROR_SUCCESS;
-    oldLog = readText(hivePath + ".log");
+    bool ok = putDword(key, "Value", 1) == ERROR_SUCCESS;
+    oldLog = readHostFile(hivePath + ".log");
     ok = ok && RegDeleteValueA(key, "Value") == ERROR_SUCCESS;
-    writeText(root + "/old.log", oldLog);
+    writeHostFile(worldRoot() + "/old.log", oldLog);
     _exit(ok ? 0 : 1);
   }
   ASSERT_EQ(waitExit(child), 0);
@@ -334,12 +331,12 @@ TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
               ERROR_SUCCESS);
   }
   ASSERT_FALSE(exists(hivePath + ".log"));
-  std::filesystem::rename(root + "/old.log", hivePath + ".log");
+  std::filesystem::rename(worldRoot() + "/old.log", hivePath + ".log");
   const std::string folded = replayed(hivePath);
-  EXPECT_EQ(folded, readText(hivePath));
+  EXPECT_EQ(folded, readHostFile(hivePath));
   EXPECT_EQ(folded.find("\"Value\""), std::string::npos);
   HKEY key = createKey("SOFTWARE\\Stale");
-  ASSERT_EQ(setDword(key, "Next", 2), ERROR_SUCCESS);
+  ASSERT_EQ(putDword(key, "Next", 2), ERROR_SUCCESS);
   const std::string next = replayed(hivePath);
   EXPECT_EQ(next.find("\"Value\""), std::string::npos);
   EXPECT_NE(next.find("\"Next\"=dword:00000002"), std::string::npos);
@@ -350,7 +347,7 @@ TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
 // as a prefix of its changes, none lost before the last one seen, and the
 // next process goes on from there.
 TEST_F(SharingTest, KilledLogWriterLeavesAPrefixOfItsChanges) {
-  const std::string hivePath = root + "/system.reg";
+  const std::string hivePath = worldRoot() + "/system.reg";
   std::mt19937 random(777);
   DWORD highest = 0;
   for (int round = 0; round < 6; ++round) {
@@ -359,7 +356,7 @@ TEST_F(SharingTest, KilledLogWriterLeavesAPrefixOfItsChanges) {
       HKEY key = createKey("SOFTWARE\\Prefix");
       for (DWORD n = highest + 1;; ++n) {
         std::string name = "V" + std::to_string(n);
-        setDword(key, name.c_str(), n);
+        putDword(key, name.c_str(), n);
       }
     }
     usleep(20000 + random() % 60000);
@@ -368,7 +365,7 @@ TEST_F(SharingTest, KilledLogWriterLeavesAPrefixOfItsChanges) {
     Key tree;
     std::string error;
     ASSERT_TRUE(posix::hive::loadHive(hivePath, "HKEY_LOCAL_MACHINE", tree, error)) << error;
-    ASSERT_TRUE(posix::hive::parseHive(readText(hivePath), "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    ASSERT_TRUE(posix::hive::parseHive(readHostFile(hivePath), "HKEY_LOCAL_MACHINE", tree, error)) << error;
     ASSERT_TRUE(posix::hive::loadHive(hivePath, "HKEY_LOCAL_MACHINE", tree, error)) << error;
     const Key *prefix = posix::hive::findKey(tree, {"SOFTWARE", "Prefix"});
     size_t count = prefix == nullptr ? 0 : prefix->values.size();

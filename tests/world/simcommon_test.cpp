@@ -2,7 +2,7 @@
 // several processes append at once.
 #include "platform/win32.h"
 #include "sim/common/events.h"
-#include "world_fixture.h"
+#include "tests/support/world_access.h"
 
 #include <nlohmann/json.hpp>
 #include <sys/wait.h>
@@ -11,7 +11,10 @@
 namespace kxlsim::testing {
 namespace {
 
-using FaultTest = WorldTest;
+using kxltestsupport::readHostFile;
+using kxltestsupport::writeHostFile;
+
+using FaultTest = kxltest::WorldTest;
 
 TEST_F(FaultTest, ExactlyTheNamedCallsFail) {
   setenv("KXLSIM_FAIL", "Open:3,Other:1,Open:5,broken,Open:0,:2,Open:x", 1);
@@ -100,7 +103,7 @@ TEST_F(FaultTest, KillAtARegistryWriteLeavesTheRegistryWhole) {
 }
 
 TEST_F(FaultTest, CallsAreCountedIntoTheCountFileAtExit) {
-  std::string counts = root + "/counts";
+  std::string counts = worldRoot() + "/counts";
   EXPECT_EXIT(
       {
         setenv("KXLSIM_COUNT", counts.c_str(), 1);
@@ -111,7 +114,7 @@ TEST_F(FaultTest, CallsAreCountedIntoTheCountFileAtExit) {
         std::exit(0);
       },
       ::testing::ExitedWithCode(0), "");
-  EXPECT_EQ(readText(counts), "Open 3\ntrace 1\n");
+  EXPECT_EQ(readHostFile(counts), "Open 3\ntrace 1\n");
 }
 
 TEST_F(FaultTest, StartedProgramsDoNotInheritThePlan) {
@@ -131,11 +134,11 @@ TEST_F(FaultTest, StartedProgramsDoNotInheritThePlan) {
   EXPECT_STREQ(childFaultPlan(), "");
 }
 
-using EventTest = WorldTest;
+using EventTest = kxltest::WorldTest;
 
 std::vector<nlohmann::json> readEvents(const std::string &path) {
   std::vector<nlohmann::json> events;
-  std::istringstream lines(readText(path));
+  std::istringstream lines(readHostFile(path));
   std::string line;
   while (std::getline(lines, line))
     events.push_back(nlohmann::json::parse(line, nullptr, false));
@@ -143,7 +146,7 @@ std::vector<nlohmann::json> readEvents(const std::string &path) {
 }
 
 TEST_F(EventTest, EachEventIsOneJsonLine) {
-  ASSERT_EQ(eventsPath(), root + "/events.jsonl");
+  ASSERT_EQ(eventsPath(), worldRoot() + "/events.jsonl");
   ASSERT_TRUE(appendEvent("run", {{"program", "kxlset.exe"}, {"args", "-cleanup \"x\"\nsecond line"}}));
   ASSERT_TRUE(appendEvent("audit", {{"path", std::string("C:\\caf\xe9")}})); // not UTF-8
   auto events = readEvents(eventsPath());
