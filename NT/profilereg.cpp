@@ -44,8 +44,8 @@ constexpr uint32_t kProbeClusterKey = 70;
 constexpr uint32_t kProbeCreateKey = 100;
 constexpr uint32_t kProbeCopyKey = 110;
 constexpr uint32_t kProbeDropKey = 120;
-constexpr uint32_t kProbeForcedKeysLeft = 210;      // diagnostic log only
-constexpr uint32_t kProbeClusterServicesLeft = 220; // diagnostic log only
+constexpr uint32_t kProbeForcedKeysLeft = 210; // diagnostic log only
+constexpr uint32_t kProbeServiceNotBack = 220; // the undo could not put a service back
 
 // snprintf that reports whether the whole text fitted.
 template <class... Args> bool formatWhole(char *buffer, size_t size, const char *format, Args... args) {
@@ -270,6 +270,9 @@ struct MachineWalk {
   // goes on past a failure once there is one, as for the undo.
   uint32_t forcedDone = 0;
   bool goOnOnceForced = false;
+  // The undo's first service that could not be put back: the undo goes on,
+  // but does not count as complete.
+  int32_t serviceFailure = 0;
 
   bool goesOn() const { return keepGoing || (goOnOnceForced && forcedDone > 0); }
 
@@ -501,12 +504,20 @@ const char *textOrNull(const char *text) {
   return text[0] != '\0' ? text : nullptr;
 }
 
-void repointService(const UpgradeContext &context, const char *service, const char *machine,
-                    const char *program, const char *account, const char *password, const char *display) {
+void serviceNotBack(MachineWalk &walk, int32_t rc) {
+  pdtError(walk.function, kProbeServiceNotBack, rc);
+  if (walk.serviceFailure == 0)
+    walk.serviceFailure = rc;
+}
+
+void repointService(MachineWalk &walk, const char *service, const char *machine, const char *program,
+                    const char *account, const char *password, const char *display) {
   SQLO_SVC_OUT out{};
-  sqloChangeNTServiceConfig(service, machine, SQLO_SVC_NO_CHANGE,
-                            static_cast<uint32_t>(context.serviceStartType), SQLO_SVC_NO_CHANGE, program,
-                            nullptr, nullptr, nullptr, account, password, display, &out);
+  int32_t rc = sqloChangeNTServiceConfig(
+      service, machine, SQLO_SVC_NO_CHANGE, static_cast<uint32_t>(walk.context.serviceStartType),
+      SQLO_SVC_NO_CHANGE, program, nullptr, nullptr, nullptr, account, password, display, &out);
+  if (rc != 0)
+    serviceNotBack(walk, rc);
 }
 
 bool forceCopyName(const UpgradeOptions &options) {
@@ -533,7 +544,7 @@ void repointOwnedService(MachineWalk &walk, const char *service, const OwnedServ
   char display[kDisplayNameSize];
   serviceDisplayName(*walk.keys, service, display);
   const char *account = serviceAccountBefore(walk.context, how.listedAs, service);
-  repointService(walk.context, service, how.machine, how.keepProgram ? nullptr : textOrNull(program), account,
+  repointService(walk, service, how.machine, how.keepProgram ? nullptr : textOrNull(program), account,
                  nullptr, display);
 }
 
@@ -567,8 +578,7 @@ void repointClusterServices(MachineWalk &walk) {
   computer[sizeof computer - 1] = '\0';
   char list[kRegValueBuffer];
   if (!readClusterList(walk.options.instanceName, list)) {
-    pdLog(PD_LEVEL_WARNING, walk.function, kProbeClusterServicesLeft, UPGRADE_RC_NO_COPY,
-          "cluster machine list unreadable: the other machines' services not put back");
+    serviceNotBack(walk, UPGRADE_RC_NO_COPY);
     return;
   }
   bool partitioned = isPartitioned(walk.options);
@@ -599,8 +609,7 @@ void repointLocalService(MachineWalk &walk) {
   char display[kDisplayNameSize];
   ownerProgramPath(walk.context, program);
   serviceDisplayName(*walk.keys, walk.options.instanceName, display);
-  repointService(walk.context, walk.options.instanceName, nullptr, textOrNull(program), nullptr, nullptr,
-                 display);
+  repointService(walk, walk.options.instanceName, nullptr, textOrNull(program), nullptr, nullptr, display);
 }
 
 // ---------------------------------------------------------------------------
@@ -700,6 +709,7 @@ int32_t revertInstanceProfile(UpgradeContext &context, UpgradeOptions &options) 
     rc = rc != 0 ? rc : clusterRc;
     if (isClustered(context) && context.recreatedNodeType != 0)
       repointClusterServices(walk);
+    rc = rc != 0 ? rc : walk.serviceFailure;
   }
   walk.release();
   pdtExit(KXL_FN_REVERT_INSTANCE_PROFILE, rc, 0);

@@ -323,21 +323,34 @@ TEST_F(DriverFailureTest, UnreadableStartTypeFailsTheServicesStep) {
   EXPECT_EQ(dwordValue(service, "Start"), 2u);
 }
 
-// The message never claims a restore that failed: it names the backup, which
-// is kept with the instance's files.
+// The message never claims a restore that failed (the directory, or a
+// service the undo could not point back): it names the backup, which is kept
+// with the instance's files.
 TEST_F(DriverFailureTest, FailedRestoreKeepsTheBackupAndSaysWhere) {
-  Outcome outcome = run({"-p", kOldCopy, "INST1"}, "sqleInitApplicationEnvironment:1,sqlocopydir:2");
-  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
-  EXPECT_EQ(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
-  std::size_t at =
-      outcome.out.find(std::string(kNotRestored) + "  The instance could not be restored completely.");
-  ASSERT_NE(at, std::string::npos) << outcome.out;
-  std::size_t open = outcome.out.find("\"C:\\windows\\temp\\KXL", at);
-  ASSERT_NE(open, std::string::npos) << outcome.out;
-  std::string backup = outcome.out.substr(open + 1, outcome.out.find('"', open + 1) - open - 1);
-  EXPECT_EQ(treeDifferences(before, tree(backup)), "");
-  EXPECT_NE(diagnosticLog().find("kept in " + backup), std::string::npos) << diagnosticLog();
-  expectRerunUpgrades({"-p", kOldCopy, "INST1"});
+  const struct {
+    std::vector<std::string> args;
+    const char *faults;
+  } cases[] = {
+      {{"-p", kOldCopy, "INST1"}, "sqleInitApplicationEnvironment:1,sqlocopydir:2"},
+      {{"INST1"}, "sqleInitApplicationEnvironment:1,sqloChangeNTServiceConfig:2"},
+  };
+  for (const auto &c : cases) {
+    SCOPED_TRACE(c.faults);
+    resetWorld();
+    keepWorld();
+    Outcome outcome = run(c.args, c.faults);
+    ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+    EXPECT_EQ(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
+    std::size_t at =
+        outcome.out.find(std::string(kNotRestored) + "  The instance could not be restored completely.");
+    ASSERT_NE(at, std::string::npos) << outcome.out;
+    std::size_t open = outcome.out.find("\"C:\\windows\\temp\\KXL", at);
+    ASSERT_NE(open, std::string::npos) << outcome.out;
+    std::string backup = outcome.out.substr(open + 1, outcome.out.find('"', open + 1) - open - 1);
+    EXPECT_EQ(treeDifferences(before, tree(backup)), "");
+    EXPECT_NE(diagnosticLog().find("kept in " + backup), std::string::npos) << diagnosticLog();
+    expectRerunUpgrades(c.args);
+  }
 }
 
 TEST_F(DriverFailureTest, ConfigurationConversionFailureIs1947) {
