@@ -516,7 +516,8 @@ void repointService(MachineWalk &walk, const char *service, const char *machine,
   int32_t rc = sqloChangeNTServiceConfig(
       service, machine, SQLO_SVC_NO_CHANGE, static_cast<uint32_t>(walk.context.serviceStartType),
       SQLO_SVC_NO_CHANGE, program, nullptr, nullptr, nullptr, account, password, display, &out);
-  if (rc != 0)
+  // A service that is not there has nothing to put back.
+  if (rc != 0 && rc != SQLO_RC_SVC_NOT_FOUND)
     serviceNotBack(walk, rc);
 }
 
