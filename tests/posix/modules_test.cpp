@@ -51,36 +51,30 @@ TEST_F(ModulesTest, ModulesLoadOnlyWhenTheWorldHasTheirFiles) {
 }
 
 // The entry points the cluster cases use, bound by name as the command does.
+#define KXL_BOUND(module, name) PFN_##name name = entry<PFN_##name>(module, #name)
 struct ClusterApi {
   HMODULE clusapi = LoadLibraryA("clusapi.dll"), resutils = LoadLibraryA("resutils.dll");
-  PFN_OpenCluster openCluster = entry<PFN_OpenCluster>(clusapi, "OpenCluster");
-  PFN_CloseCluster closeCluster = entry<PFN_CloseCluster>(clusapi, "CloseCluster");
-  PFN_OpenClusterGroup openGroup = entry<PFN_OpenClusterGroup>(clusapi, "OpenClusterGroup");
-  PFN_CloseClusterGroup closeGroup = entry<PFN_CloseClusterGroup>(clusapi, "CloseClusterGroup");
-  PFN_ClusterOpenEnum openEnum = entry<PFN_ClusterOpenEnum>(clusapi, "ClusterOpenEnum");
-  PFN_ClusterEnum enumerate = entry<PFN_ClusterEnum>(clusapi, "ClusterEnum");
-  PFN_ClusterCloseEnum closeEnum = entry<PFN_ClusterCloseEnum>(clusapi, "ClusterCloseEnum");
-  PFN_CreateClusterResourceType createType =
-      entry<PFN_CreateClusterResourceType>(clusapi, "CreateClusterResourceType");
-  PFN_CreateClusterResource createResource =
-      entry<PFN_CreateClusterResource>(clusapi, "CreateClusterResource");
-  PFN_OpenClusterResource openResource = entry<PFN_OpenClusterResource>(clusapi, "OpenClusterResource");
-  PFN_CloseClusterResource closeResource = entry<PFN_CloseClusterResource>(clusapi, "CloseClusterResource");
-  PFN_DeleteClusterResource deleteResource =
-      entry<PFN_DeleteClusterResource>(clusapi, "DeleteClusterResource");
-  PFN_AddClusterResourceDependency addDependency =
-      entry<PFN_AddClusterResourceDependency>(clusapi, "AddClusterResourceDependency");
-  PFN_ClusterResourceOpenEnum openResourceEnum =
-      entry<PFN_ClusterResourceOpenEnum>(clusapi, "ClusterResourceOpenEnum");
-  PFN_ClusterResourceEnum resourceEnum = entry<PFN_ClusterResourceEnum>(clusapi, "ClusterResourceEnum");
-  PFN_ClusterResourceCloseEnum closeResourceEnum =
-      entry<PFN_ClusterResourceCloseEnum>(clusapi, "ClusterResourceCloseEnum");
-  PFN_ClusterResourceControl control = entry<PFN_ClusterResourceControl>(clusapi, "ClusterResourceControl");
-  PFN_GetClusterResourceState resourceState =
-      entry<PFN_GetClusterResourceState>(clusapi, "GetClusterResourceState");
-  PFN_GetNodeClusterState nodeState = entry<PFN_GetNodeClusterState>(clusapi, "GetNodeClusterState");
-  PFN_ResUtilResourceTypesEqual typesEqual =
-      entry<PFN_ResUtilResourceTypesEqual>(resutils, "ResUtilResourceTypesEqual");
+  KXL_BOUND(clusapi, OpenCluster);
+  KXL_BOUND(clusapi, CloseCluster);
+  KXL_BOUND(clusapi, OpenClusterGroup);
+  KXL_BOUND(clusapi, CloseClusterGroup);
+  KXL_BOUND(clusapi, ClusterOpenEnum);
+  KXL_BOUND(clusapi, ClusterEnum);
+  KXL_BOUND(clusapi, ClusterCloseEnum);
+  KXL_BOUND(clusapi, CreateClusterResourceType);
+  KXL_BOUND(clusapi, CreateClusterResource);
+  KXL_BOUND(clusapi, OpenClusterResource);
+  KXL_BOUND(clusapi, CloseClusterResource);
+  KXL_BOUND(clusapi, DeleteClusterResource);
+  KXL_BOUND(clusapi, AddClusterResourceDependency);
+  KXL_BOUND(clusapi, ClusterResourceOpenEnum);
+  KXL_BOUND(clusapi, ClusterResourceEnum);
+  KXL_BOUND(clusapi, ClusterResourceCloseEnum);
+  KXL_BOUND(clusapi, ClusterResourceControl);
+  KXL_BOUND(clusapi, GetClusterResourceState);
+  KXL_BOUND(clusapi, GetNodeClusterState);
+  KXL_BOUND(resutils, ResUtilResourceTypesEqual);
+#undef KXL_BOUND
 
   ~ClusterApi() {
     FreeLibrary(clusapi);
@@ -89,18 +83,18 @@ struct ClusterApi {
 
   std::vector<std::u16string> dependencies(HRESOURCE resource) {
     std::vector<std::u16string> names;
-    HRESENUM listing = openResourceEnum(resource, CLUSTER_RESOURCE_ENUM_DEPENDS);
+    HRESENUM listing = ClusterResourceOpenEnum(resource, CLUSTER_RESOURCE_ENUM_DEPENDS);
     WCHAR name[65];
     DWORD type = 0;
     DWORD rc = ERROR_SUCCESS;
     for (DWORD i = 0;; ++i) {
       DWORD size = 65;
-      if ((rc = resourceEnum(listing, i, &type, name, &size)) != ERROR_SUCCESS)
+      if ((rc = ClusterResourceEnum(listing, i, &type, name, &size)) != ERROR_SUCCESS)
         break;
       names.emplace_back(name);
     }
     EXPECT_EQ(rc, static_cast<DWORD>(ERROR_NO_MORE_ITEMS));
-    closeResourceEnum(listing);
+    ClusterResourceCloseEnum(listing);
     return names;
   }
 };
@@ -117,61 +111,70 @@ protected:
 };
 
 TEST_F(ClusterTest, ResourcesAreCreatedEnumeratedLinkedAndDeleted) {
-  HCLUSTER cluster = api->openCluster(nullptr);
+  HCLUSTER cluster = api->OpenCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  EXPECT_EQ(api->createType(cluster, u"KXL Server", u"KXL Server", u"kxlserver.dll", 5000, 60000), 0u);
-  EXPECT_EQ(api->createType(cluster, u"kxl server", u"KXL Server", u"kxlserver.dll", 5000, 60000),
-            static_cast<DWORD>(ERROR_ALREADY_EXISTS));
-  EXPECT_EQ(api->createType(cluster, u"Physical Disk", u"Physical Disk", u"clusres.dll", 5000, 60000), 0u);
+  EXPECT_EQ(
+      api->CreateClusterResourceType(cluster, u"KXL Server", u"KXL Server", u"kxlserver.dll", 5000, 60000),
+      0u);
+  EXPECT_EQ(
+      api->CreateClusterResourceType(cluster, u"kxl server", u"KXL Server", u"kxlserver.dll", 5000, 60000),
+      static_cast<DWORD>(ERROR_ALREADY_EXISTS));
+  EXPECT_EQ(api->CreateClusterResourceType(cluster, u"Physical Disk", u"Physical Disk", u"clusres.dll", 5000,
+                                           60000),
+            0u);
 
-  EXPECT_EQ(api->openGroup(cluster, u"NoGroup"), nullptr);
+  EXPECT_EQ(api->OpenClusterGroup(cluster, u"NoGroup"), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_GROUP_NOT_FOUND));
-  HGROUP group = api->openGroup(cluster, u"g1");
+  HGROUP group = api->OpenClusterGroup(cluster, u"g1");
   ASSERT_NE(group, nullptr);
-  HRESOURCE server = api->createResource(group, u"INST1", u"KXL Server", CLUSTER_RESOURCE_SEPARATE_MONITOR);
-  HRESOURCE disk = api->createResource(group, u"Disk1", u"Physical Disk", 0);
+  HRESOURCE server =
+      api->CreateClusterResource(group, u"INST1", u"KXL Server", CLUSTER_RESOURCE_SEPARATE_MONITOR);
+  HRESOURCE disk = api->CreateClusterResource(group, u"Disk1", u"Physical Disk", 0);
   ASSERT_NE(server, nullptr);
   ASSERT_NE(disk, nullptr);
-  EXPECT_EQ(api->createResource(group, u"inst1", u"KXL Server", 0), nullptr);
+  EXPECT_EQ(api->CreateClusterResource(group, u"inst1", u"KXL Server", 0), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_OBJECT_ALREADY_EXISTS));
-  EXPECT_EQ(api->createResource(group, u"Other", u"No Such Type", 0), nullptr);
+  EXPECT_EQ(api->CreateClusterResource(group, u"Other", u"No Such Type", 0), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_RESOURCE_TYPE_NOT_FOUND));
 
-  EXPECT_EQ(api->addDependency(server, disk), 0u);
-  EXPECT_EQ(api->addDependency(server, disk), static_cast<DWORD>(ERROR_DEPENDENCY_ALREADY_EXISTS));
-  EXPECT_EQ(api->addDependency(disk, server), static_cast<DWORD>(ERROR_CIRCULAR_DEPENDENCY));
+  EXPECT_EQ(api->AddClusterResourceDependency(server, disk), 0u);
+  EXPECT_EQ(api->AddClusterResourceDependency(server, disk),
+            static_cast<DWORD>(ERROR_DEPENDENCY_ALREADY_EXISTS));
+  EXPECT_EQ(api->AddClusterResourceDependency(disk, server), static_cast<DWORD>(ERROR_CIRCULAR_DEPENDENCY));
   EXPECT_EQ(api->dependencies(server), std::vector<std::u16string>{u"Disk1"});
 
   BYTE type[130] = {};
   DWORD returned = 0;
-  EXPECT_EQ(api->control(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type, sizeof type,
-                         &returned),
+  EXPECT_EQ(api->ClusterResourceControl(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type,
+                                        sizeof type, &returned),
             0u);
   EXPECT_EQ(std::u16string(reinterpret_cast<const char16_t *>(type)), u"KXL Server");
   EXPECT_EQ(returned, 22u);
-  EXPECT_EQ(api->control(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type, 4, &returned),
+  EXPECT_EQ(api->ClusterResourceControl(server, nullptr, CLUSCTL_RESOURCE_GET_RESOURCE_TYPE, nullptr, 0, type,
+                                        4, &returned),
             static_cast<DWORD>(ERROR_MORE_DATA));
   EXPECT_EQ(returned, 22u);
 
   WCHAR groupName[65];
   DWORD groupSize = 65;
-  EXPECT_EQ(api->resourceState(server, nullptr, nullptr, groupName, &groupSize), ClusterResourceOffline);
+  EXPECT_EQ(api->GetClusterResourceState(server, nullptr, nullptr, groupName, &groupSize),
+            ClusterResourceOffline);
   EXPECT_EQ(std::u16string(groupName), u"G1") << "the group's name as stored";
-  EXPECT_TRUE(api->typesEqual(u"kxl server", server));
-  EXPECT_FALSE(api->typesEqual(u"KXL", server));
+  EXPECT_TRUE(api->ResUtilResourceTypesEqual(u"kxl server", server));
+  EXPECT_FALSE(api->ResUtilResourceTypesEqual(u"KXL", server));
 
-  EXPECT_EQ(api->deleteResource(disk), static_cast<DWORD>(ERROR_DEPENDENT_RESOURCE_EXISTS));
+  EXPECT_EQ(api->DeleteClusterResource(disk), static_cast<DWORD>(ERROR_DEPENDENT_RESOURCE_EXISTS));
   EXPECT_EQ(api->dependencies(server), std::vector<std::u16string>{u"Disk1"});
-  EXPECT_EQ(api->deleteResource(server), 0u);
-  EXPECT_EQ(api->deleteResource(disk), 0u);
-  EXPECT_EQ(api->openResource(cluster, u"Disk1"), nullptr);
+  EXPECT_EQ(api->DeleteClusterResource(server), 0u);
+  EXPECT_EQ(api->DeleteClusterResource(disk), 0u);
+  EXPECT_EQ(api->OpenClusterResource(cluster, u"Disk1"), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_RESOURCE_NOT_FOUND));
-  EXPECT_EQ(api->openResource(cluster, u"inst1"), nullptr);
-  EXPECT_TRUE(api->closeResource(disk));
-  EXPECT_TRUE(api->closeResource(server));
-  EXPECT_FALSE(api->closeResource(server));
-  EXPECT_TRUE(api->closeGroup(group));
-  EXPECT_TRUE(api->closeCluster(cluster));
+  EXPECT_EQ(api->OpenClusterResource(cluster, u"inst1"), nullptr);
+  EXPECT_TRUE(api->CloseClusterResource(disk));
+  EXPECT_TRUE(api->CloseClusterResource(server));
+  EXPECT_FALSE(api->CloseClusterResource(server));
+  EXPECT_TRUE(api->CloseClusterGroup(group));
+  EXPECT_TRUE(api->CloseCluster(cluster));
 }
 
 // The rules by which the cluster refuses a change: an online resource cannot
@@ -183,56 +186,56 @@ TEST_F(ClusterTest, OnlineResourcesStayAndDependenciesStayInTheirGroup) {
   setDword(services + "INST1", "State", 4);
   setDword(remoteServices + "INST2", "State", 1);
   setString("SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\G2", "OwnerNode", "NODE2");
-  HCLUSTER cluster = api->openCluster(nullptr);
+  HCLUSTER cluster = api->OpenCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  api->createType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
-  HGROUP g1 = api->openGroup(cluster, u"G1");
-  HGROUP g2 = api->openGroup(cluster, u"G2");
-  HRESOURCE inst1 = api->createResource(g1, u"INST1", u"KXL", 0);
-  HRESOURCE inst2 = api->createResource(g2, u"INST2", u"KXL", 0);
-  HRESOURCE disk = api->createResource(g1, u"Disk1", u"KXL", 0);
+  api->CreateClusterResourceType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
+  HGROUP g1 = api->OpenClusterGroup(cluster, u"G1");
+  HGROUP g2 = api->OpenClusterGroup(cluster, u"G2");
+  HRESOURCE inst1 = api->CreateClusterResource(g1, u"INST1", u"KXL", 0);
+  HRESOURCE inst2 = api->CreateClusterResource(g2, u"INST2", u"KXL", 0);
+  HRESOURCE disk = api->CreateClusterResource(g1, u"Disk1", u"KXL", 0);
   ASSERT_TRUE(inst1 != nullptr && inst2 != nullptr && disk != nullptr);
   WCHAR group[65];
   DWORD size = 65;
-  EXPECT_EQ(api->resourceState(inst1, nullptr, nullptr, group, &size), ClusterResourceOnline);
+  EXPECT_EQ(api->GetClusterResourceState(inst1, nullptr, nullptr, group, &size), ClusterResourceOnline);
   size = 65;
-  EXPECT_EQ(api->resourceState(inst2, nullptr, nullptr, group, &size), ClusterResourceOffline);
+  EXPECT_EQ(api->GetClusterResourceState(inst2, nullptr, nullptr, group, &size), ClusterResourceOffline);
 
-  EXPECT_EQ(api->addDependency(inst2, disk), static_cast<DWORD>(ERROR_INVALID_PARAMETER));
+  EXPECT_EQ(api->AddClusterResourceDependency(inst2, disk), static_cast<DWORD>(ERROR_INVALID_PARAMETER));
   EXPECT_TRUE(api->dependencies(inst2).empty());
-  EXPECT_EQ(api->deleteResource(inst1), static_cast<DWORD>(ERROR_RESOURCE_ONLINE));
+  EXPECT_EQ(api->DeleteClusterResource(inst1), static_cast<DWORD>(ERROR_RESOURCE_ONLINE));
   setDword(services + "INST1", "State", 1);
-  EXPECT_EQ(api->deleteResource(inst1), 0u);
+  EXPECT_EQ(api->DeleteClusterResource(inst1), 0u);
   setDword(remoteServices + "INST2", "State", 4);
-  EXPECT_EQ(api->deleteResource(inst2), static_cast<DWORD>(ERROR_RESOURCE_ONLINE))
+  EXPECT_EQ(api->DeleteClusterResource(inst2), static_cast<DWORD>(ERROR_RESOURCE_ONLINE))
       << "the service of the owning node counts";
   for (HRESOURCE resource : {inst1, inst2, disk})
-    api->closeResource(resource);
-  api->closeGroup(g1);
-  api->closeGroup(g2);
-  api->closeCluster(cluster);
+    api->CloseClusterResource(resource);
+  api->CloseClusterGroup(g1);
+  api->CloseClusterGroup(g2);
+  api->CloseCluster(cluster);
 }
 
 TEST_F(ClusterTest, EnumerationReportsLengthsAndEndsWithNoMoreItems) {
-  HCLUSTER cluster = api->openCluster(nullptr);
+  HCLUSTER cluster = api->OpenCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  api->createType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
-  HGROUP group = api->openGroup(cluster, u"G1");
+  api->CreateClusterResourceType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
+  HGROUP group = api->OpenClusterGroup(cluster, u"G1");
   for (const char16_t *name : {u"A-resource", u"B"})
-    api->closeResource(api->createResource(group, name, u"KXL", 0));
-  api->closeGroup(group);
+    api->CloseClusterResource(api->CreateClusterResource(group, name, u"KXL", 0));
+  api->CloseClusterGroup(group);
 
-  HCLUSENUM listing = api->openEnum(cluster, CLUSTER_ENUM_RESOURCE);
+  HCLUSENUM listing = api->ClusterOpenEnum(cluster, CLUSTER_ENUM_RESOURCE);
   ASSERT_NE(listing, nullptr);
   std::set<std::u16string> names;
   WCHAR name[65];
   DWORD type = 0;
   DWORD size = 3;
-  EXPECT_EQ(api->enumerate(listing, 0, &type, name, &size), static_cast<DWORD>(ERROR_MORE_DATA));
+  EXPECT_EQ(api->ClusterEnum(listing, 0, &type, name, &size), static_cast<DWORD>(ERROR_MORE_DATA));
   DWORD needed = size;
   for (DWORD i = 0;; ++i) {
     size = 65;
-    DWORD rc = api->enumerate(listing, i, &type, name, &size);
+    DWORD rc = api->ClusterEnum(listing, i, &type, name, &size);
     if (rc == static_cast<DWORD>(ERROR_NO_MORE_ITEMS))
       break;
     ASSERT_EQ(rc, 0u);
@@ -244,19 +247,19 @@ TEST_F(ClusterTest, EnumerationReportsLengthsAndEndsWithNoMoreItems) {
     names.insert(name);
   }
   EXPECT_EQ(names, (std::set<std::u16string>{u"A-resource", u"B"}));
-  EXPECT_EQ(api->closeEnum(listing), 0u);
-  EXPECT_EQ(api->closeEnum(listing), static_cast<DWORD>(ERROR_INVALID_HANDLE));
-  api->closeCluster(cluster);
+  EXPECT_EQ(api->ClusterCloseEnum(listing), 0u);
+  EXPECT_EQ(api->ClusterCloseEnum(listing), static_cast<DWORD>(ERROR_INVALID_HANDLE));
+  api->CloseCluster(cluster);
 }
 
 TEST_F(ClusterTest, ANodeWhoseServiceIsStoppedHasNoCluster) {
   DWORD state = 0;
-  EXPECT_EQ(api->nodeState(nullptr, &state), 0u);
+  EXPECT_EQ(api->GetNodeClusterState(nullptr, &state), 0u);
   EXPECT_EQ(state, static_cast<DWORD>(ClusterStateRunning));
   setDword("SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", ClusterStateNotRunning);
-  EXPECT_EQ(api->nodeState(nullptr, &state), 0u);
+  EXPECT_EQ(api->GetNodeClusterState(nullptr, &state), 0u);
   EXPECT_EQ(state, static_cast<DWORD>(ClusterStateNotRunning));
-  EXPECT_EQ(api->openCluster(nullptr), nullptr);
+  EXPECT_EQ(api->OpenCluster(nullptr), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(RPC_S_SERVER_UNAVAILABLE));
 }
 

@@ -71,13 +71,6 @@ TEST_F(FaultTest, KillAtARegistryWriteLeavesTheRegistryWhole) {
       RegCloseKey(key);
     return rc;
   };
-  auto keyExists = [](const char *name) {
-    HKEY key = nullptr;
-    LONG rc = RegOpenKeyExA(HKEY_LOCAL_MACHINE, name, 0, KEY_READ, &key);
-    if (key != nullptr)
-      RegCloseKey(key);
-    return rc == ERROR_SUCCESS;
-  };
   for (int write = 1; write <= 3; ++write) {
     SCOPED_TRACE(write);
     std::string kill = "hivewrite:" + std::to_string(write);
