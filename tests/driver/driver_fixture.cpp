@@ -1,10 +1,7 @@
 #include "driver_fixture.h"
 
-#include "sim/kxlsim/diff.h"
-#include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/world_reader.h"
 #include "tests/support/command_run.h"
-#include "tests/support/temp_world.h"
 
 #include <algorithm>
 #include <filesystem>
@@ -20,29 +17,6 @@ using kxltestsupport::readHostFile;
 namespace {
 
 constexpr const char *kDriverId = "0x18780502";
-
-// The demo and the cluster world with the command installed, built once for
-// the program and copied for every case.
-class DemoWorld : public ::testing::Environment {
-public:
-  void SetUp() override {
-    fs::path dir = kxltestsupport::newTempDir("kxldrv-demo");
-    kxlsim::InstallSources sources{KXL_TOOLS, KXL_COMMAND, KXL_MESSAGES};
-    std::vector<std::string> errors;
-    if (!dir.empty() && kxlsim::createWorld((dir / "world").string(), "demo", sources, errors) &&
-        kxlsim::createWorld((dir / "cluster").string(), "cluster", sources, errors))
-      built = dir;
-  }
-  void TearDown() override {
-    std::error_code ignored;
-    if (!built.empty())
-      fs::remove_all(built, ignored);
-  }
-  static inline fs::path built;
-};
-
-[[maybe_unused]] const ::testing::Environment *const kDemoWorld =
-    ::testing::AddGlobalTestEnvironment(new DemoWorld);
 
 void readDriverTrace(const std::string &trace, Outcome &outcome) {
   std::regex error(std::string("error ") + kDriverId + " probe=(-?[0-9]+) rc=(-?[0-9]+)");
@@ -85,78 +59,23 @@ std::string treeDifferences(const Tree &before, const Tree &after) {
   return lines;
 }
 
-void DriverTest::SetUp() {
-  ASSERT_FALSE(DemoWorld::built.empty()) << "the demo world could not be built";
-  fs::path dir = kxltestsupport::newTempDir("kxldrv");
-  ASSERT_FALSE(dir.empty());
-  temp_ = dir.string();
-  root_ = (dir / "world").string();
-  resetWorld();
-}
-
-void DriverTest::resetWorld(const char *scenario) {
-  std::error_code failure;
-  fs::remove_all(root_, failure);
-  fs::copy(DemoWorld::built / (std::string(scenario) == "demo" ? "world" : scenario), root_,
-           fs::copy_options::recursive, failure);
-  ASSERT_FALSE(failure) << failure.message();
-  std::string reason;
-  ASSERT_TRUE(kxlsim::selectWorld(root_, reason)) << reason;
-}
-
-void DriverTest::TearDown() {
-  if (HasFailure()) {
-    std::cerr << "the world of this case stays in " << temp_ << '\n';
-    return;
-  }
-  std::error_code ignored;
-  fs::remove_all(temp_, ignored);
-}
-
 Outcome DriverTest::run(const std::vector<std::string> &args, const std::string &faults,
                         const std::string &kill) {
-  Outcome outcome;
-  std::string tag = temp_ + "/run" + std::to_string(++runs_);
-  std::string eventLog = root_ + "/events.jsonl";
-  std::size_t eventsBefore = readHostFile(eventLog).size();
-  std::string diagLog = root_ + "/kxldiag.log";
-  std::size_t diagBefore = readHostFile(diagLog).size();
-  kxltestsupport::CommandRun command;
-  command.program = hostPath(std::string(kCurrentCopy) + "\\bin\\kxliupgrade.exe");
-  command.args = args;
-  command.settings = {"KXLSIM_ROOT=" + root_, "KXLTRACE=" + tag + ".trace"};
+  std::vector<std::string> settings;
   if (!faults.empty())
-    command.settings.push_back("KXLSIM_FAIL=" + faults);
+    settings.push_back("KXLSIM_FAIL=" + faults);
   if (!kill.empty())
-    command.settings.push_back("KXLSIM_KILL=" + kill);
-  command.outFile = tag + ".out";
-  command.errFile = tag + ".err";
-  outcome.exitCode = kxltestsupport::runCommand(command);
-  outcome.out = readHostFile(tag + ".out");
-  outcome.err = readHostFile(tag + ".err");
-  outcome.trace = readHostFile(tag + ".trace");
+    settings.push_back("KXLSIM_KILL=" + kill);
+  Outcome outcome;
+  static_cast<kxltest::CommandOutcome &>(outcome) = runInWorld(args, settings);
   readDriverTrace(outcome.trace, outcome);
-  std::istringstream added(readHostFile(eventLog).substr(eventsBefore));
-  for (std::string line; std::getline(added, line);)
-    outcome.events.push_back(line);
-  outcome.diagnostics = readHostFile(diagLog).substr(diagBefore);
   return outcome;
-}
-
-void DriverTest::keepWorld() {
-  kept_ = temp_ + "/kept" + std::to_string(runs_);
-  std::error_code failure;
-  fs::remove_all(kept_, failure);
-  fs::copy(root_, kept_, fs::copy_options::recursive, failure);
-  ASSERT_FALSE(failure) << failure.message();
 }
 
 std::string DriverTest::worldChanges() const {
   static const char *const kIgnored[] = {"events.jsonl", "kxldiag.log", "C:\\KXLDBMIG.TXT",
                                          "C:\\upgrade.log"};
-  std::ostringstream diff;
-  kxlsim::diffWorlds(kept_, root_, diff);
-  std::istringstream lines(diff.str());
+  std::istringstream lines(changesSince(kept_));
   std::string changes;
   bool skipping = false;
   for (std::string line; std::getline(lines, line);) {
@@ -169,10 +88,6 @@ std::string DriverTest::worldChanges() const {
       changes += line + "\n";
   }
   return changes;
-}
-
-std::string DriverTest::hostPath(const std::string &windowsPath) const {
-  return kxltestsupport::drivePath(root_, windowsPath);
 }
 
 Tree DriverTest::tree(const std::string &windowsPath) const {
@@ -195,7 +110,7 @@ std::string DriverTest::fileContent(const std::string &windowsPath) const {
 }
 
 std::string DriverTest::diagnosticLog() const {
-  return readHostFile(root_ + "/kxldiag.log");
+  return readHostFile(root() + "/kxldiag.log");
 }
 
 void DriverTest::removeTree(const std::string &windowsPath) const {

@@ -1,11 +1,9 @@
-// A fresh demo world per case with the command installed in the current copy,
-// run there with an optional fault, and the means to see what the upgrade
-// driver did: its trace, the registry, and the files of a directory tree.
+// The demo world afresh for every case (tests/support/command_world.h), the
+// command run there with an optional fault, and the means to see what the
+// upgrade driver did: its trace, the registry, and the files of a directory tree.
 #pragma once
 
-#include "sim/kxlsim/scenario_parts.h"
-
-#include <gtest/gtest.h>
+#include "tests/support/command_world.h"
 
 #include <map>
 #include <string>
@@ -13,8 +11,6 @@
 
 namespace drivertest {
 
-inline constexpr const char *kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
-inline constexpr const char *kCurrentCopy = "C:\\Program Files\\ZAV\\KXL101";
 inline constexpr const char *kOldInstanceDir = "C:\\Program Files\\ZAV\\KXL95\\INST1";
 inline constexpr const char *kNewInstanceDir = "C:\\Program Files\\ZAV\\KXL101\\INST1";
 inline constexpr const char *kTempDir = "C:\\windows\\temp";
@@ -24,30 +20,22 @@ struct DriverFailure {
   long long rc;
 };
 
-struct Outcome {
-  int exitCode = -1;
+struct Outcome : kxltest::CommandOutcome {
   long long driverResult = -999999; // from the driver's exit trace line
   bool driverRan = false;
   std::vector<DriverFailure> failures; // the driver's error trace lines
-  std::string out, err, trace;
-  std::vector<std::string> events; // lines appended to events.jsonl
-  std::string diagnostics;         // what the run appended to the diagnostic log
 };
 
 // Relative path -> content of every file below a directory.
 using Tree = std::map<std::string, std::string>;
 
-class DriverTest : public ::testing::Test {
+class DriverTest : public kxltest::CommandWorld {
 protected:
-  void SetUp() override;
-  void TearDown() override;
-
   // Runs the command with `args`; `faults` is the KXLSIM_FAIL value ("" none),
   // `kill` the KXLSIM_KILL value ("" none).
   Outcome run(const std::vector<std::string> &args, const std::string &faults = "",
               const std::string &kill = "");
 
-  std::string hostPath(const std::string &windowsPath) const;
   Tree tree(const std::string &windowsPath) const;
   bool exists(const std::string &windowsPath) const;
   // The whole content of a file ("" when it cannot be read).
@@ -58,10 +46,8 @@ protected:
   // Entries of the world's temporary directory.
   std::vector<std::string> tempEntries() const;
 
-  // The demo world afresh, or the world of another scenario ("cluster").
-  void resetWorld(const char *scenario = "demo");
   // Keeps a copy of the world as it is now, for worldChanges.
-  void keepWorld();
+  void keepWorld() { kept_ = snapshot(); }
   // What differs between the kept world and the world now, as `kxlsim diff`
   // shows it, without the logs and the database check tool's files in the
   // current directory ("" when nothing else differs).
@@ -72,13 +58,8 @@ protected:
   std::string stringValue(const std::string &key, const std::string &name) const;
   DWORD dwordValue(const std::string &key, const std::string &name) const;
 
-  kxlsim::WorldWriter world;
-
 private:
-  std::string temp_;
-  std::string root_;
   std::string kept_;
-  int runs_ = 0;
 };
 
 // The files that differ between two trees, one name a line ("" when equal).

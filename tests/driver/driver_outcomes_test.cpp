@@ -31,8 +31,6 @@ protected:
                                      "10.1.0.0");
   }
 
-  void expectCompletedDespiteAudit(const std::string &fault);
-
   // 1231 at `probe`, the message naming the instance's type and the type the
   // copy's last-ranked product hosts; nothing copied.
   void expectEditionMismatch(const Outcome &outcome, long long probe, const std::string &tokens) {
@@ -53,12 +51,8 @@ TEST_F(DriverOutcomeTest, CopyWithoutServerEditionCannotHostAStandaloneInstance)
   EXPECT_NE(outcome.out.find("type  only"), std::string::npos) << outcome.out;
   EXPECT_EQ(outcome.exitCode, 1231 & 0xFF);
   EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
-}
-
-TEST_F(DriverOutcomeTest, CopyWithoutProductsNamesTypeZero) {
   setProducts({});
-  Outcome outcome = run({"INST1"});
-  expectEditionMismatch(outcome, 17, "type STANDALONE cannot");
+  expectEditionMismatch(run({"INST1"}), 17, "type STANDALONE cannot");
 }
 
 // A refusal is a run that did not upgrade: audited as a failure with its code,
@@ -69,10 +63,7 @@ TEST_F(DriverOutcomeTest, RefusedUpgradeIsAuditedAsAFailureWithItsCode) {
   setProducts({"cli", "zqc"});
   Outcome refused = run({"INST1"});
   ASSERT_EQ(refused.driverResult, 1231) << refused.out;
-  std::vector<std::string> audits;
-  for (const std::string &event : refused.events)
-    if (event.find("\"event\":\"audit\"") != std::string::npos)
-      audits.push_back(event);
+  std::vector<std::string> audits = kxltest::eventsOf(refused, "audit");
   ASSERT_EQ(audits.size(), 2u) << refused.out;
   for (const std::string &audit : audits)
     EXPECT_NE(audit.find("\"sqlcode\":\"1231\""), std::string::npos) << audit;
@@ -180,27 +171,24 @@ TEST_F(DriverOutcomeTest, CleanupRunThatCannotStartDoesNotChangeTheResult) {
 
 // The audit record comes after the instance has moved: it can no longer undo
 // anything, and a rerun would only find the instance upgraded. So a completed
-// upgrade stays completed, and the audit failure is shown and logged.
-void DriverOutcomeTest::expectCompletedDespiteAudit(const std::string &fault) {
-  world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
-                  "active = yes\ninstance = both\n");
-  Outcome outcome = run({"INST1"}, fault);
-  EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
-  EXPECT_EQ(outcome.driverResult, 0);
-  EXPECT_TRUE(keyExists(profileKey("KXL101", "INST1")));
-  EXPECT_NE(outcome.out.find("KXL1000I"), std::string::npos) << outcome.out;
-  EXPECT_NE(outcome.out.find("1042"), std::string::npos) << "the audit failure is shown: " << outcome.out;
-  EXPECT_NE(outcome.diagnostics.find("audit record was not written"), std::string::npos)
-      << outcome.diagnostics;
-  EXPECT_EQ(run({"-q", "INST1"}).exitCode, -1949 & 0xFF) << "a rerun finds it on the current copy";
-}
-
-TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompletedWhenItsAuditEventIsLost) {
-  expectCompletedDespiteAudit("logEvent:1");
-}
-
-TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompletedWhenItsAuditSettingsCannotBeRead) {
-  expectCompletedDespiteAudit("sqlexAuditGetInstanceSettings:1");
+// upgrade stays completed when its audit event is lost or its audit settings
+// cannot be read, and the audit failure is shown and logged.
+TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompletedWhenItsAuditFails) {
+  for (const char *fault : {"logEvent:1", "sqlexAuditGetInstanceSettings:1"}) {
+    SCOPED_TRACE(fault);
+    resetWorld();
+    world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
+                    "active = yes\ninstance = both\n");
+    Outcome outcome = run({"INST1"}, fault);
+    EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
+    EXPECT_EQ(outcome.driverResult, 0);
+    EXPECT_TRUE(keyExists(profileKey("KXL101", "INST1")));
+    EXPECT_NE(outcome.out.find("KXL1000I"), std::string::npos) << outcome.out;
+    EXPECT_NE(outcome.out.find("1042"), std::string::npos) << "the audit failure is shown: " << outcome.out;
+    EXPECT_NE(outcome.diagnostics.find("audit record was not written"), std::string::npos)
+        << outcome.diagnostics;
+    EXPECT_EQ(run({"-q", "INST1"}).exitCode, -1949 & 0xFF) << "a rerun finds it on the current copy";
+  }
 }
 
 TEST_F(DriverOutcomeTest, VersionEightProfileKeyMovesAndIsDeleted) {

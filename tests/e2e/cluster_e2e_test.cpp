@@ -317,193 +317,95 @@ void setDependsOn(ClusterE2eTest &t, const std::string &resource, const std::vec
   t.world.setMultiString(kxlsim::localMachine(), kResources + resource, "DependsOn", names);
 }
 
+using Prepare = std::function<void(ClusterE2eTest &)>;
+const std::vector<std::string> kCinst2Unchanged = {
+    "    CINST2-0       KXL              offline  depends on Disk F:",
+    "    CINST2-1       KXL              offline  depends on Disk G:, CINST2 IP"};
+const std::vector<std::string> kCinst2Converted = {
+    "    CINST2-0       KXL Server       offline  depends on Disk F:",
+    "    CINST2-1       KXL Server       offline  depends on Disk G:, CINST2 IP"};
+
+// A failure of CINST1's step: its resource stays as it was, the type is not
+// left registered, and after `repair` a plain run converts the resource.
+StepCase singleFails(const char *name, const std::string &faults, int result, std::vector<std::string> errors,
+                     Prepare prepare = {}, Prepare repair = {},
+                     std::vector<std::string> afterwards = {kCinst1Unchanged}) {
+  return {name, &kSingle, prepare, faults, result, errors, false, afterwards, repair, {kCinst1Converted}};
+}
+
+// The same for CINST2, whose partitions 0 and 1 have resources of the old type.
+StepCase partitionedFails(const char *name, const std::string &faults, int result,
+                          std::vector<std::string> errors) {
+  return {name, &kPartitioned, {}, faults, result, errors, false, kCinst2Unchanged, {}, kCinst2Converted};
+}
+
+// Not a failure: CINST1's run succeeds, the type is registered, `shown` is in the cluster.
+StepCase singleSucceeds(const char *name, Prepare prepare, const std::string &shown) {
+  return {name, &kSingle, prepare, "", 0, {}, true, {shown}, {}, {}};
+}
+
+const std::vector<std::string> kStillOwned = {"probe=47 rc=-1", "probe=50 rc=-1254"};
+
 const StepCase kStepCases[] = {
-    {"ClusterLibraryMissing",
-     &kSingle,
-     [](ClusterE2eTest &t) {
-       fs::remove(kxltestsupport::drivePath(t.world_, "C:\\windows\\system32\\clusapi.dll"));
-     },
-     "",
-     -1251,
-     {"probe=10 rc=-1251"},
-     false,
-     {kCinst1Unchanged},
-     [](ClusterE2eTest &t) {
-       t.world.writeText("C:\\windows\\system32\\clusapi.dll",
-                         "MZ simulated run-time module clusapi.dll\r\n");
-     },
-     {kCinst1Converted}},
-    {"EntryPointMissing",
-     &kSingle,
-     {},
-     "GetProcAddress:37",
-     -1251,
-     {"probe=10 rc=-1251"},
-     false,
-     {kCinst1Unchanged},
-     {},
-     {kCinst1Converted}},
-    {"LocalClusterServiceStopped",
-     &kSingle,
-     [](ClusterE2eTest &t) {
-       setDword(t, kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", 3);
-     },
-     "",
-     -1252,
-     {"probe=20 rc=-1252"},
-     false,
-     {kCinst1Unchanged},
-     [](ClusterE2eTest &t) {
-       setDword(t, kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", 19);
-     },
-     {kCinst1Converted}},
-    {"TypeRegistrationRefused",
-     &kSingle,
-     {},
-     "CreateClusterResourceType:1",
-     -1252,
-     {"probe=20 rc=-1252"},
-     false,
-     {kCinst1Unchanged},
-     {},
-     {kCinst1Converted}},
-    {"PutBackWithItsDependencies",
-     &kSingle,
-     {},
-     "CreateClusterResource:1",
-     -1252,
-     {"probe=70 rc=-1252"},
-     false,
-     {kCinst1Unchanged},
-     {},
-     {kCinst1Converted}},
+    singleFails(
+        "ClusterLibraryMissing", "", -1251, {"probe=10 rc=-1251"},
+        [](ClusterE2eTest &t) {
+          fs::remove(kxltestsupport::drivePath(t.world_, "C:\\windows\\system32\\clusapi.dll"));
+        },
+        [](ClusterE2eTest &t) {
+          t.world.writeText("C:\\windows\\system32\\clusapi.dll",
+                            "MZ simulated run-time module clusapi.dll\r\n");
+        }),
+    singleFails("EntryPointMissing", "GetProcAddress:37", -1251, {"probe=10 rc=-1251"}),
+    singleFails(
+        "LocalClusterServiceStopped", "", -1252, {"probe=20 rc=-1252"},
+        [](ClusterE2eTest &t) {
+          setDword(t, kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", 3);
+        },
+        [](ClusterE2eTest &t) {
+          setDword(t, kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", 19);
+        }),
+    singleFails("TypeRegistrationRefused", "CreateClusterResourceType:1", -1252, {"probe=20 rc=-1252"}),
+    singleFails("PutBackWithItsDependencies", "CreateClusterResource:1", -1252, {"probe=70 rc=-1252"}),
     // From here on the undo puts back what the step had changed: each
     // resource as it was, and the type it registered.
-    {"NewResourceWithoutAllDependencies",
-     &kSingle,
-     {},
-     "AddClusterResourceDependency:1",
-     -1252,
-     {"probe=80 rc=-1252"},
-     false,
-     {kCinst1Unchanged},
-     {},
-     {kCinst1Converted}},
-    {"PutBackWithoutAllDependencies",
-     &kSingle,
-     {},
-     "CreateClusterResource:1,AddClusterResourceDependency:1",
-     -1253,
-     {"probe=65 rc=-1253"},
-     false,
-     {kCinst1Unchanged},
-     {},
-     {kCinst1Converted}},
-    {"ResourceGone",
-     &kSingle,
-     {},
-     "CreateClusterResource:1,CreateClusterResource:2",
-     -1253,
-     {"probe=60 rc=-1253"},
-     false,
-     {kCinst1Unchanged},
-     {},
-     {kCinst1Converted}},
-    {"OnlineOnTheOtherNode",
-     &kSingle,
-     [](ClusterE2eTest &t) { runOnOtherNode(t, 4); },
-     "",
-     -1254,
-     {"probe=47 rc=-1", "probe=50 rc=-1254"},
-     false,
-     {"    CINST1         KXL              online   depends on Disk E:, Disk H:"},
-     [](ClusterE2eTest &t) { runOnOtherNode(t, 1); },
-     {kCinst1Converted}},
-    {"AnotherResourceDependsOnIt",
-     &kSingle,
-     [](ClusterE2eTest &t) {
-       kxlsim::addClusterResource(t.world, {"CINST1 App", "Generic Service", "CINST1 Group", {"CINST1"}});
-     },
-     "",
-     -1254,
-     {"probe=47 rc=-1", "probe=50 rc=-1254"},
-     false,
-     {kCinst1Unchanged},
-     [](ClusterE2eTest &t) { setDependsOn(t, "CINST1 App", {}); },
-     {kCinst1Converted}},
-    {"LaterPartitionNotDeleted",
-     &kPartitioned,
-     {},
-     "DeleteClusterResource:2",
-     -1254,
-     {"probe=47 rc=-1", "probe=50 rc=-1254"},
-     false,
-     {"    CINST2-0       KXL              offline  depends on Disk F:",
-      "    CINST2-1       KXL              offline  depends on Disk G:, CINST2 IP"},
-     {},
-     {"    CINST2-0       KXL Server       offline  depends on Disk F:",
-      "    CINST2-1       KXL Server       offline  depends on Disk G:, CINST2 IP"}},
+    singleFails("NewResourceWithoutAllDependencies", "AddClusterResourceDependency:1", -1252,
+                {"probe=80 rc=-1252"}),
+    singleFails("PutBackWithoutAllDependencies", "CreateClusterResource:1,AddClusterResourceDependency:1",
+                -1253, {"probe=65 rc=-1253"}),
+    singleFails("ResourceGone", "CreateClusterResource:1,CreateClusterResource:2", -1253,
+                {"probe=60 rc=-1253"}),
+    singleFails(
+        "OnlineOnTheOtherNode", "", -1254, kStillOwned, [](ClusterE2eTest &t) { runOnOtherNode(t, 4); },
+        [](ClusterE2eTest &t) { runOnOtherNode(t, 1); },
+        {"    CINST1         KXL              online   depends on Disk E:, Disk H:"}),
+    singleFails(
+        "AnotherResourceDependsOnIt", "", -1254, kStillOwned,
+        [](ClusterE2eTest &t) {
+          kxlsim::addClusterResource(t.world, {"CINST1 App", "Generic Service", "CINST1 Group", {"CINST1"}});
+        },
+        [](ClusterE2eTest &t) { setDependsOn(t, "CINST1 App", {}); }),
+    partitionedFails("LaterPartitionNotDeleted", "DeleteClusterResource:2", -1254, kStillOwned),
     // A state the step cannot read ends it; nothing is taken for a value.
-    {"TypeCannotBeLookedUp",
-     &kSingle,
-     {},
-     "ClusterResourceTypeOpenEnum:1",
-     -1252,
-     {"probe=20 rc=-1252"},
-     false,
-     {kCinst1Unchanged},
-     {},
-     {kCinst1Converted}},
-    {"ListingFails",
-     &kSingle,
-     {},
-     "ClusterEnum:1",
-     -1252,
-     {"probe=40 rc=-1252"},
-     false,
-     {kCinst1Unchanged},
-     {},
-     {kCinst1Converted}},
+    singleFails("TypeCannotBeLookedUp", "ClusterResourceTypeOpenEnum:1", -1252, {"probe=20 rc=-1252"}),
+    singleFails("ListingFails", "ClusterEnum:1", -1252, {"probe=40 rc=-1252"}),
     // The run's own reads of the nodes file come first and must succeed; the
     // step's first is the third.
-    {"NodesFileUnreadable",
-     &kPartitioned,
-     {},
-     "sqloReadKxlnodes:3",
-     -1252,
-     {"probe=35 rc=-1252"},
-     false,
-     {"    CINST2-0       KXL              offline  depends on Disk F:",
-      "    CINST2-1       KXL              offline  depends on Disk G:, CINST2 IP"},
-     {},
-     {"    CINST2-0       KXL Server       offline  depends on Disk F:",
-      "    CINST2-1       KXL Server       offline  depends on Disk G:, CINST2 IP"}},
+    partitionedFails("NodesFileUnreadable", "sqloReadKxlnodes:3", -1252, {"probe=35 rc=-1252"}),
     // Not failures: a name in another letter case, a dependency that is gone.
-    {"NameInAnotherCase",
-     &kSingle,
-     [](ClusterE2eTest &t) {
-       SHDeleteKeyA(HKEY_LOCAL_MACHINE, (std::string(kResources) + "CINST1").c_str());
-       kxlsim::addClusterResource(t.world, {"cinst1", "KXL", "CINST1 Group", {"Disk E:", "Disk H:"}});
-     },
-     "",
-     0,
-     {},
-     true,
-     {"    cinst1         KXL Server       offline  depends on Disk E:, Disk H:"},
-     {},
-     {}},
-    {"DependencyGone",
-     &kSingle,
-     [](ClusterE2eTest &t) {
-       setDependsOn(t, "CINST1", {"Disk E:", "Disk Z:", "Disk H:"});
-     },
-     "",
-     0,
-     {},
-     true,
-     {kCinst1Converted},
-     {},
-     {}},
+    singleSucceeds(
+        "NameInAnotherCase",
+        [](ClusterE2eTest &t) {
+          SHDeleteKeyA(HKEY_LOCAL_MACHINE, (std::string(kResources) + "CINST1").c_str());
+          kxlsim::addClusterResource(t.world, {"cinst1", "KXL", "CINST1 Group", {"Disk E:", "Disk H:"}});
+        },
+        "    cinst1         KXL Server       offline  depends on Disk E:, Disk H:"),
+    singleSucceeds(
+        "DependencyGone",
+        [](ClusterE2eTest &t) {
+          setDependsOn(t, "CINST1", {"Disk E:", "Disk Z:", "Disk H:"});
+        },
+        kCinst1Converted),
 };
 
 void PrintTo(const StepCase &c, std::ostream *out) {

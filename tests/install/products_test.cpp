@@ -53,24 +53,6 @@ TEST(ProductCodes, DeriveByRaisingTheFourthGroup) {
   EXPECT_FALSE(kxliDerivedCode(kServerCode, 1, out, 20));
 }
 
-TEST(ProductTables, HaveTheirRowsAndTheSixServerEditions) {
-  EXPECT_EQ(15u, kxliProductTable(false).count);
-  EXPECT_EQ(27u, kxliProductTable(true).count);
-  Names servers;
-  KxliProductTable current = kxliProductTable(false);
-  for (size_t i = 0; i < current.count; ++i) {
-    EXPECT_EQ(i + 1, current.rows[i].rankNumber);
-    if (current.rows[i].category == KXLI_CATEGORY_SERVER)
-      servers.push_back(current.rows[i].editionName);
-  }
-  EXPECT_EQ(Names({"HALDOR_PRIME_EDITION", "HALDOR_EDITION", "VESTRA_SERVER", "MERIDA_EDITION",
-                   "TALVEN_EDITION", "SOLENT_EDITION"}),
-            servers);
-  EXPECT_NE(nullptr, kxliFindProductRow("HPE", false));
-  EXPECT_EQ(nullptr, kxliFindProductRow("hpe", true));
-  EXPECT_EQ(nullptr, kxliFindProductRow(nullptr, false));
-}
-
 TEST_F(Products, NeedTheMarkerAndTheInstallerRegistrationAtTheSameFolder) {
   char registered[KXLI_PRODUCT_CODE_SZ] = {};
   registerInstaller(kServerCode, "C:\\K101\\");

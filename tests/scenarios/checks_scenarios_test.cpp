@@ -3,6 +3,7 @@
 #include "scenario_fixture.h"
 
 #include "sim/kxlsim/world_reader.h"
+#include "tests/support/command_run.h"
 
 namespace {
 
@@ -168,13 +169,13 @@ TEST_F(CheckScenario, MessageFileFallsBackToEnglish) {
   inDir.cwd = "C:\\work";
   run({"INST1"}, inDir);
   std::string copied = hostPath("C:\\work\\KXLDBMIG.TXT");
-  EXPECT_EQ(kxltest::readFile(copied),
-            kxltest::readFile(std::string(KXL_MESSAGE_SOURCES) + "/en_US/KXLDBMIG.TXT"));
+  EXPECT_EQ(kxltestsupport::readHostFile(copied),
+            kxltestsupport::readHostFile(std::string(KXL_MESSAGE_SOURCES) + "/en_US/KXLDBMIG.TXT"));
 
   world.setString(localMachine(), kIdentity, "Language", "de_DE");
   run({"INST1"}, inDir);
-  EXPECT_EQ(kxltest::readFile(copied),
-            kxltest::readFile(std::string(KXL_MESSAGE_SOURCES) + "/de_DE/KXLDBMIG.TXT"));
+  EXPECT_EQ(kxltestsupport::readHostFile(copied),
+            kxltestsupport::readHostFile(std::string(KXL_MESSAGE_SOURCES) + "/de_DE/KXLDBMIG.TXT"));
 }
 
 // A failed read of which installation is current, or a switch between the

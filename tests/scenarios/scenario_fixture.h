@@ -1,24 +1,16 @@
-// A fresh demo world per case, the command installed in the current copy's
-// bin, and a way to run it there and see what it did: exit code, full result
-// (from the trace of the run's exit), standard output, new events and the
-// differences the run made to the world.
+// The demo world afresh for every case (tests/support/command_world.h), and a
+// way to run the command there as a case sets it up and see what it did:
+// besides the outcome, the full result (from the trace of the run's exit) and
+// the world as it was before the run, for the differences the run made.
 #pragma once
 
-#include "sim/kxlsim/scenario_parts.h"
-
-#include <gtest/gtest.h>
-
-#include <string>
-#include <vector>
+#include "tests/support/command_world.h"
 
 namespace kxltest {
 
-struct RunResult {
-  int exitCode = -1;               // low 8 bits, as the host keeps them
-  long long result = 0;            // the run's full result
-  std::string out, err;            // standard output and error
-  std::vector<std::string> events; // lines appended to events.jsonl
-  std::string before;              // host folder of the world as it was before the run
+struct RunResult : CommandOutcome {
+  long long result = 0; // the run's full result
+  std::string before;   // snapshot of the world before the run
 };
 
 struct RunSetup {
@@ -29,19 +21,9 @@ struct RunSetup {
   std::string faults;                      // KXLSIM_FAIL for the command ("" none)
 };
 
-class ScenarioTest : public ::testing::Test {
+class ScenarioTest : public CommandWorld {
 protected:
-  static constexpr const char *kCurrentCopy = "C:\\Program Files\\ZAV\\KXL101";
-  static constexpr const char *kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
   static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
-  static constexpr const char *kTools = "SOFTWARE\\ZAV\\KXLSIM\\Tools\\kxlckupgrade";
-  static constexpr const char *kRun = "0x187805B0";
-
-  // The demo world is built once and copied for every case.
-  static void SetUpTestSuite();
-  static void TearDownTestSuite();
-  void SetUp() override;
-  void TearDown() override;
 
   // Installs the command with the stand-in driver in place of the real one.
   void useStandInDriver();
@@ -54,27 +36,10 @@ protected:
                    int version, int release);
   // Makes \\server\share reachable.
   void addShare(const std::string &server, const std::string &share);
-  // Host path of a Windows path on drive C:.
-  std::string hostPath(const std::string &windowsPath) const;
 
   RunResult run(const std::vector<std::string> &args, const RunSetup &setup = RunSetup());
   // What the run changed in the world, as kxlsim diff shows it ("" for nothing).
-  std::string changes(const RunResult &result) const;
-
-  kxlsim::WorldWriter world;
-
-private:
-  static std::string templateDir_;
-  std::string temp_;
-  std::string root_;
-  int runs_ = 0;
+  std::string changes(const RunResult &result) const { return changesSince(result.before); }
 };
-
-// The whole content of a host file ("" when it cannot be read).
-std::string readFile(const std::string &hostPath);
-// The "key":"value" pair as it stands in an event line.
-std::string field(const std::string &name, const std::string &value);
-// Events of `kind` among the lines.
-std::vector<std::string> eventsOf(const RunResult &result, const std::string &kind);
 
 } // namespace kxltest
