@@ -77,12 +77,6 @@ int32_t flagIndexOf(uint32_t token) {
   return index;
 }
 
-void DbmWorld::SetUp() {
-  ProductWorld::SetUp();
-  makeDirectories("C:\\dbm\\new");
-  makeDirectories("C:\\dbm\\saved");
-}
-
 void DbmWorld::TearDown() {
   sqlz_krcbp->partitionTable = nullptr;
   sqlz_krcbp->currentPartition = 0;
@@ -92,24 +86,12 @@ void DbmWorld::TearDown() {
 }
 
 void DbmWorld::put(const char *path, const Bytes &bytes) {
-  SQLO_FHANDLE file = nullptr;
-  int32_t rc = sqloopenp(path, SQLO_CREATE | SQLO_WRITEONLY | SQLO_BINARY, SQLO_MODE_FILE, &file, 0);
-  ASSERT_TRUE(rc == 0 || rc == SQLO_RC_FILE_EXISTED) << path;
-  uint32_t written = 0;
-  EXPECT_EQ(0, sqlowrite(file, bytes.data(), uint32_t(bytes.size()), &written));
-  sqloclose(file);
+  writeFile(path, bytes);
 }
 
 Bytes DbmWorld::get(const char *path) {
   Bytes bytes;
-  SQLO_FHANDLE file = nullptr;
-  if (sqloopenp(path, SQLO_OPEN | SQLO_READONLY | SQLO_BINARY, SQLO_MODE_FILE, &file, 0) != 0)
-    return bytes;
-  uint8_t chunk[4096];
-  uint32_t got = 0;
-  while (sqloread(file, chunk, sizeof chunk, &got) == 0 && got > 0)
-    bytes.insert(bytes.end(), chunk, chunk + got);
-  sqloclose(file);
+  readWholeFile(path, bytes);
   return bytes;
 }
 

@@ -48,7 +48,6 @@ protected:
   static constexpr const char *kTarget = "C:\\dbm\\new\\kxlsystm";
   static constexpr const char *kSource = "C:\\dbm\\saved\\kxlsystm";
 
-  void SetUp() override;
   void TearDown() override;
   static void put(const char *path, const Bytes &bytes);
   static Bytes get(const char *path);

@@ -182,6 +182,8 @@ TEST_F(DriverFailureTest, FaultsAfterTheBackupAreUndoneAndARerunUpgrades) {
       {{"-install", "-p", kOldCopy, "INST1"}, "sqloexec2:1", 95, kExecFailed},
       // A function directory that cannot be tested is neither there nor missing.
       {{"INST1"}, "ossPathTest:5", 190, kPathTestFailed},
+      // A move that fails on the second machine: the first one gets its key back.
+      {kPartitioned, "sqloPRegMachineOpen:2", 80, -1913},
   };
   for (const Case &c : cases) {
     SCOPED_TRACE(std::string(c.fault) + " " + c.args.front() + " " + c.args.back());
@@ -232,18 +234,6 @@ TEST_F(DriverFailureTest, NewProfilePathThatExistedStaysAndTheCopyGoes) {
   expectUndone();
   EXPECT_TRUE(exists("C:\\Profiles\\other\\keep.txt"));
   expectRerunUpgrades({"-p", "C:\\Profiles", "INST1"});
-}
-
-// A move that fails on the second machine: the first one gets its key back.
-TEST_F(DriverFailureTest, PartialProfileMoveIsRevertedMachineByMachine) {
-  std::vector<std::string> args = kPartitioned;
-  Outcome outcome = run(args, "sqloPRegMachineOpen:2");
-  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
-  EXPECT_EQ(outcome.failures[0].probe, 80);
-  EXPECT_EQ(outcome.driverResult, -1913);
-  expectUndone();
-  EXPECT_NE(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;
-  expectRerunUpgrades(args, "INST2");
 }
 
 TEST_F(DriverFailureTest, ForceCopyNameKeepsTheOtherMachinesProfileValues) {

@@ -70,6 +70,9 @@ TEST_F(CopyList, IsEmptyButValidWithoutAnyRegistration) {
   InstallCopyList none(false, false);
   EXPECT_EQ(0u, none.status);
   EXPECT_EQ(0, none.GetCount());
+  InstallCopy *found = nullptr;
+  EXPECT_EQ(KXLI_RC_NAME_NOT_FOUND, none.Find("KXL95", &found));
+  EXPECT_EQ(nullptr, found);
   registerV8("C:\\SQLLIB");
   InstallCopyList v8Only(false, false);
   EXPECT_EQ(0u, v8Only.status);
@@ -101,13 +104,6 @@ TEST_F(CopyList, FindsCopiesIgnoringCaseAndKeepsTheCallersCursor) {
   EXPECT_EQ(found, untouched);
   EXPECT_EQ(walked, list.Current());
   EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, list.Find("COPY1", nullptr));
-}
-
-TEST_F(CopyList, FindInAnEmptyListReportsNoSuchName) {
-  InstallCopyList empty(false, false);
-  InstallCopy *found = nullptr;
-  EXPECT_EQ(KXLI_RC_NAME_NOT_FOUND, empty.Find("KXL95", &found));
-  EXPECT_EQ(nullptr, found);
 }
 
 class Copy : public InstallWorld {};
@@ -152,14 +148,7 @@ TEST_F(Copy, ReportsWhyItIsUnusable) {
   registerCopy("KXL64", "C:\\K64");
   InstallCopy bare("KXL64", false, false);
   EXPECT_EQ(KXLI_COPY_OK, bare.GetStatus());
-}
-
-TEST_F(Copy, CutsItsNameTo64Characters) {
-  std::string longName(70, 'N');
-  InstallCopy copy(longName.c_str(), false, false);
-  char name[80] = {};
-  ASSERT_EQ(0u, copy.GetName(name, sizeof name));
-  EXPECT_EQ(std::string(64, 'N'), name);
+  EXPECT_EQ(0, bare.GetComponents().GetCount());
 }
 
 TEST_F(Copy, ListsItsComponentsFromTheMachineOrTheUser) {
@@ -178,13 +167,6 @@ TEST_F(Copy, ListsItsComponentsFromTheMachineOrTheUser) {
   EXPECT_EQ(Names({"KXL Own Client"}), strings(perUser.GetComponents()));
 }
 
-TEST_F(Copy, WithoutComponentsKeyIsStillValid) {
-  registerCopy("BARE", "C:\\Bare");
-  InstallCopy copy("BARE", false, false);
-  EXPECT_EQ(KXLI_COPY_OK, copy.GetStatus());
-  EXPECT_EQ(0, copy.GetComponents().GetCount());
-}
-
 TEST_F(Copy, StringGettersNeedRoomForTheTerminator) {
   registerCopy("KXL95", "C:\\Prog");
   InstallCopy copy("KXL95", false, false);
@@ -196,6 +178,11 @@ TEST_F(Copy, StringGettersNeedRoomForTheTerminator) {
   EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, copy.GetName(nullptr, 6));
   EXPECT_EQ(KXLI_RC_BUFFER_TOO_SMALL, copy.GetPath(name, 7));
   EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, copy.GetRegistryKey(nullptr, 300));
+  // A name is cut to 64 characters.
+  InstallCopy longName(std::string(70, 'N').c_str(), false, false);
+  char cut[80] = {};
+  ASSERT_EQ(0u, longName.GetName(cut, sizeof cut));
+  EXPECT_EQ(std::string(64, 'N'), cut);
 }
 
 class Version : public InstallWorld {
@@ -272,12 +259,8 @@ TEST_F(Copy, KeepsItsInstanceListAndRetriesAFailedOne) {
   IKXLINSTANCELIST *again = nullptr;
   ASSERT_EQ(0u, copy.GetInstanceList(&again));
   EXPECT_EQ(list, again);
-}
-
-TEST_F(Copy, WithoutANameHasNoInstances) {
-  InstallCopy copy("", false, false);
-  IKXLINSTANCELIST *list = nullptr;
-  EXPECT_EQ(KXLI_RC_NOT_USABLE, copy.GetInstanceList(&list));
+  InstallCopy nameless("", false, false);
+  EXPECT_EQ(KXLI_RC_NOT_USABLE, nameless.GetInstanceList(&again));
 }
 
 } // namespace

@@ -3,9 +3,6 @@
 
 #include <gtest/gtest.h>
 
-#include <cstdlib>
-#include <cstring>
-#include <string>
 #include <vector>
 
 namespace {
@@ -125,27 +122,6 @@ TEST(ItemListOwnership, DestroyingTheListDestroysEveryElementOnce) {
     EXPECT_EQ(1, destroyed);
   }
   EXPECT_EQ(5, destroyed);
-}
-
-TEST(TextList, OwnsMallocedStrings) {
-  ILIST<char> list;
-  for (const char *text : {"alpha", "beta"}) {
-    char *copy = static_cast<char *>(std::malloc(std::strlen(text) + 1));
-    std::memcpy(copy, text, std::strlen(text) + 1);
-    ASSERT_EQ(0u, list.Append(copy));
-  }
-  EXPECT_STREQ("alpha", list.Next());
-  EXPECT_STREQ("beta", list.Next());
-  EXPECT_EQ(0u, list.Remove(list.Current()));
-  EXPECT_EQ(1, list.GetCount());
-}
-
-TEST(Names, CompareWholeNamesIgnoringCase) {
-  EXPECT_TRUE(kxliSameName("copy1", "COPY1"));
-  EXPECT_TRUE(kxliSameName("", ""));
-  EXPECT_FALSE(kxliSameName("COPY", "COPY1"));
-  EXPECT_FALSE(kxliSameName("COPY1", "COPY"));
-  EXPECT_FALSE(kxliSameName("A", nullptr));
 }
 
 } // namespace

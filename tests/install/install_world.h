@@ -5,8 +5,12 @@
 #include "tests/support/product_world.h"
 #include "install/ilist.h"
 #include "sim/common/installer.h"
+#include "sim/product/diag.h"
 
 #include <cstdint>
+#include <cstdio>
+#include <fstream>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -15,6 +19,29 @@ namespace kxltest {
 class InstallWorld : public ProductWorld {
 protected:
   static constexpr const char *kCopies = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\";
+
+  void TearDown() override {
+    if (!trace_.empty()) {
+      setProcessVariable("KXLTRACE", nullptr);
+      kxlprod::resetTrace();
+      std::remove(trace_.c_str());
+    }
+    ProductWorld::TearDown();
+  }
+
+  // Trace lines written from now on go to a file of the case's own.
+  void startTrace() {
+    trace_ = ::testing::TempDir() + "kxl_install_world_trace.txt";
+    std::remove(trace_.c_str());
+    setProcessVariable("KXLTRACE", trace_.c_str());
+    kxlprod::resetTrace();
+  }
+  std::string traceText() const {
+    std::ifstream in(trace_, std::ios::binary);
+    std::stringstream text;
+    text << in.rdbuf();
+    return text.str();
+  }
 
   static void createKey(HKEY root, const std::string &path) {
     HKEY key = nullptr;
@@ -90,6 +117,9 @@ protected:
       all.push_back(text);
     return all;
   }
+
+private:
+  std::string trace_;
 };
 
 } // namespace kxltest

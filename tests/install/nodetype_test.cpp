@@ -54,13 +54,4 @@ TEST_F(NodeType, KeepsThePreviousValueWhenTheFileGivesNone) {
   EXPECT_NE(0, readNodeType(&exact, nullptr));
 }
 
-TEST_F(NodeType, KeepsThePreviousValueWhenReadingFails) {
-  writeFile("C:\\P\\INST1\\kxlsystm", configImage(4));
-  IKXLINSTANCE inst("INST1", nullptr, "C:\\P\\INST1");
-  failCalls("sqloread:1");
-  uint32_t nodeType = 2;
-  EXPECT_NE(0, readNodeType(&inst, &nodeType));
-  EXPECT_EQ(2u, nodeType);
-}
-
 } // namespace

@@ -22,39 +22,6 @@ TEST_F(MoveProfile, InstanceOfTheCurrentCopyStaysWhereItIs) {
   expectProfileAt(kLocal, kCurrent);
 }
 
-TEST_F(MoveProfile, FailedCopyKeepsOldKeyAndDropsTheKeyItCreated) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  startTrace();
-  failCalls("SHCopyKeyA:1");
-  EXPECT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
-  expectUntouched(kLocal, kOld, kCurrent);
-  std::string trace = traceText();
-  EXPECT_NE(std::string::npos, trace.find("error 0x18780506 probe=110 rc=-1918"));
-  EXPECT_NE(std::string::npos, trace.find("error 0x18780506 probe=30 rc=-1918"));
-  EXPECT_NE(std::string::npos, trace.find("exit 0x18780506 rc=-1918"));
-}
-
-// A copy or a delete of the old key that fails keeps the old key whole and
-// drops the key the move created, but never a parent that was there before.
-TEST_F(MoveProfile, FailedMoveKeepsTheParentsThatWereThere) {
-  ownBy(kOld);
-  const std::string profiles = std::string(kRoot) + "\\InstalledCopies\\" + kCurrent + "\\PROFILES";
-  for (const char *fault : {"SHCopyKeyA:1", "SHDeleteKeyA:1"}) {
-    SCOPED_TRACE(fault);
-    seedProfile(kLocal, kOld);
-    HKEY key = nullptr;
-    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, profiles.c_str(), 0, nullptr, 0,
-                                             KEY_ALL_ACCESS, nullptr, &key, nullptr));
-    RegCloseKey(key);
-    failCalls(fault);
-    EXPECT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
-    failCalls(nullptr);
-    expectUntouched(kLocal, kOld, kCurrent);
-    EXPECT_TRUE(keyExists(profiles));
-  }
-}
-
 TEST_F(MoveProfile, NewKeyThatCannotBeCreatedChangesNothing) {
   ownBy(kOld);
   seedProfile(kLocal, kOld);

@@ -7,13 +7,10 @@
 #include "NT/profilereg.h"
 #include "install/installcopy.h"
 #include "install/kxlinstance.h"
-#include "sim/product/diag.h"
 #include "upgrade/records.h"
 
 #include <cstdio>
-#include <fstream>
 #include <memory>
-#include <sstream>
 #include <string>
 
 namespace kxltest {
@@ -41,15 +38,6 @@ protected:
     setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "FullHostName", "hosta.zav.test");
     ASSERT_EQ(0, sqloSwitchToInstallationName(kCurrent));
     std::snprintf(options_.instanceName, sizeof options_.instanceName, "INST1");
-  }
-
-  void TearDown() override {
-    if (!trace_.empty()) {
-      setProcessVariable("KXLTRACE", nullptr);
-      kxlprod::resetTrace();
-      std::remove(trace_.c_str());
-    }
-    InstallWorld::TearDown();
   }
 
   // The instance belongs to `copy` ("KXLV8" for the version-8 installation).
@@ -128,38 +116,14 @@ protected:
   }
 
   static DWORD serviceStart(const std::string &name) {
-    HKEY key = nullptr;
-    DWORD value = 0, size = sizeof value;
-    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, ("SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name).c_str(), 0, KEY_READ,
-                      &key) == ERROR_SUCCESS) {
-      RegQueryValueExA(key, "Start", nullptr, nullptr, reinterpret_cast<BYTE *>(&value), &size);
-      RegCloseKey(key);
-    }
-    return value;
+    return getDword("SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name, "Start");
   }
 
-  // Trace lines from here on go to a file of the test's own.
-  void startTrace() {
-    trace_ = ::testing::TempDir() + "kxl_profilereg_trace.txt";
-    std::remove(trace_.c_str());
-    setProcessVariable("KXLTRACE", trace_.c_str());
-    kxlprod::resetTrace();
-  }
-
-  std::string traceText() const {
-    std::ifstream in(trace_);
-    std::stringstream text;
-    text << in.rdbuf();
-    return text.str();
-  }
 
   std::unique_ptr<InstallCopy> owner_;
   std::unique_ptr<IKXLINSTANCE> instance_;
   UpgradeContext context_;
   UpgradeOptions options_{};
-
-private:
-  std::string trace_;
 };
 
 } // namespace kxltest

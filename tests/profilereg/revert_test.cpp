@@ -9,22 +9,6 @@ using namespace kxltest;
 
 class RevertProfile : public ProfileWorld {};
 
-TEST_F(RevertProfile, PartialMoveIsUndoneOnlyWhereItHappened) {
-  ownBy(kOld);
-  for (const char *machine : {kLocal, "M2", "M3"})
-    seedProfile(machine, kOld);
-  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostc.zav.test M3 0\n");
-  failCalls("SHCopyKeyA:2");
-  ASSERT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
-  failCalls(nullptr);
-
-  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
-  expectMoved(kLocal, kCurrent, kOld);
-  // The machine whose copy failed still has its old key and no new one.
-  expectUntouched("M2", kOld, kCurrent);
-  expectUntouched("M3", kOld, kCurrent);
-}
-
 TEST_F(RevertProfile, UnreachableMachineDoesNotStopTheOthersComingBack) {
   ownBy(kOld);
   for (const char *machine : {kLocal, "M3"})
@@ -112,36 +96,6 @@ TEST_F(RevertProfile, PartitionServicesOnEveryMachine) {
   EXPECT_EQ(".\\oldacct", service("M2", "INST1-1", "ObjectName"));
   EXPECT_EQ("LocalSystem", service("M2", "INST1-2", "ObjectName"));
   EXPECT_EQ(DWORD(SQLO_SVC_DEMAND_START), serviceStart("INST1-0"));
-}
-
-TEST_F(RevertProfile, ForceCopyNameRoundTripDropsThePlaceholder) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  seedProfile("M2", kOld);
-  options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
-  loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n");
-  addService("M2", "INST1-1", "C:\\KXL101\\bin\\kxlsyscs.exe");
-  ASSERT_EQ(0, moveInstanceProfile(context_, options_));
-
-  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
-  expectMoved(kLocal, kCurrent, kOld);
-  // The forced host's profile values are there as before; the placeholder is gone.
-  expectUntouched("M2", kOld, kCurrent);
-  EXPECT_FALSE(keyExists(at("M2", forceProfile())));
-  EXPECT_EQ("C:\\KXL101\\bin\\kxlsyscs.exe", service("M2", "INST1-1", "ImagePath"));
-  EXPECT_EQ("KXL - KXL95 - INST1-1", service("M2", "INST1-1", "DisplayName"));
-}
-
-TEST_F(RevertProfile, ClusterRoundTripRestoresEveryMachine) {
-  clusterOn("CLUS1", "HOSTA M2 M3");
-  ownBy(kOld);
-  for (const char *machine : {kLocal, "M2", "M3"})
-    seedProfile(machine, kOld);
-  ASSERT_EQ(0, moveInstanceProfile(context_, options_));
-
-  EXPECT_EQ(0, revertInstanceProfile(context_, options_));
-  for (const char *machine : {kLocal, "M2", "M3"})
-    expectMoved(machine, kCurrent, kOld);
 }
 
 // The undo handles the machines the move handled: the partitions' machine and

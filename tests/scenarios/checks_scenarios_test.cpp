@@ -153,15 +153,6 @@ TEST_F(CheckScenario, CheckToolFailureNamesToolAndExitCode) {
   EXPECT_EQ(run({"INST1"}).out, "KXLIMIGR:processing complete, RC = -1069\n");
 }
 
-TEST_F(CheckScenario, RunFromADriveRootPassesTheBareDriveToTheTool) {
-  setToolExit(7);
-  RunResult r = run({"INST1"});
-  ASSERT_EQ(kxltest::eventsOf(r, "program").size(), 1u);
-  std::string tool = kxltest::eventsOf(r, "program")[0];
-  EXPECT_NE(tool.find("-l C:\\\\upgrade.log -t C:\""), std::string::npos) << tool;
-  EXPECT_NE(changes(r).find("file + C:\\KXLDBMIG.TXT"), std::string::npos) << changes(r);
-}
-
 TEST_F(CheckScenario, MessageFileFallsBackToEnglish) {
   setToolExit(7);
   world.setString(localMachine(), kIdentity, "Language", "fr_FR");

@@ -174,12 +174,6 @@ TEST_F(OutcomeScenario, MachineWithoutOdbcCompletesNormally) {
   EXPECT_NE(changes(r).find("kxldiag.log"), std::string::npos) << "the missing driver manager is logged";
 }
 
-TEST_F(OutcomeScenario, QuietSuccessPrintsNothing) {
-  RunResult r = run({"-q", "INST1"});
-  EXPECT_EQ(r.out, "");
-  EXPECT_EQ(r.result, 0);
-}
-
 TEST_F(OutcomeScenario, KxlinstanceIsRestoredBeforeTheFinalMessage) {
   RunSetup started;
   started.kxlinstance = "INST2";
@@ -189,17 +183,13 @@ TEST_F(OutcomeScenario, KxlinstanceIsRestoredBeforeTheFinalMessage) {
   EXPECT_TRUE(has(eventsOf(r, "fake_exit")[0], "kxlinstance", "INST2"));
 
   RunResult quiet = run({"-q", "INST1"}, started);
+  EXPECT_EQ(quiet.out, "");
+  EXPECT_EQ(quiet.result, 0);
   EXPECT_TRUE(has(eventsOf(quiet, "fake_exit")[0], "kxlinstance", "INST1")) << "quiet runs do not restore it";
 }
 
+// The audit events of a success are in the end-to-end upgrade's exact changes.
 TEST_F(OutcomeScenario, AuditRecordsTheOutcome) {
-  RunResult ok = run({"INST1"});
-  std::vector<std::string> audit = eventsOf(ok, "audit");
-  ASSERT_EQ(audit.size(), 2u);
-  EXPECT_TRUE(has(audit[0], "category", "0x80000000") && has(audit[0], "audit_event", "53")) << audit[0];
-  EXPECT_TRUE(has(audit[1], "category", "0x20000000") && has(audit[1], "data", "INST1")) << audit[1];
-  EXPECT_TRUE(has(audit[0], "sqlcode", "0") && has(audit[0], "instance", "INST1")) << audit[0];
-
   // Only failures are audited: a failed upgrade counts as one even without a status block.
   world.writeText(std::string(kOldCopy) + "\\INST1\\security\\kxlaudit.cfg",
                   "active = yes\nadmin = failure\n");

@@ -82,19 +82,6 @@ TEST_F(ServicesTest, ProfileValuesReachTheProductLibraries) {
   EXPECT_STREQ(kProfilePath, value);
 }
 
-TEST_F(ServicesTest, UnreadableServiceGives1925AndCreatesNothing) {
-  addTemplate(1);
-  addOldInstance(1, 3, false);
-  bind(1);
-  std::vector<unsigned char> before = newConfig();
-  startTrace();
-  EXPECT_EQ(UPGRADE_RC_NO_SERVICE_CONFIG, run());
-  EXPECT_NE(std::string::npos, traceText().find("error 0x18780500 probe=30 rc=-1925"));
-  EXPECT_EQ(kOldCopy, getString(instanceKey(kInstance), "Copy"));
-  EXPECT_EQ(before, newConfig());
-  EXPECT_FALSE(keyExists(serviceKey(kInstance)));
-}
-
 TEST_F(ServicesTest, FailedReCreationLeavesTheOlderInstance) {
   addTemplate(1);
   addOldInstance(1, 3);

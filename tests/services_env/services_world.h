@@ -6,15 +6,12 @@
 #include "../install/install_world.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
-#include "sim/product/diag.h"
 #include "upgrade/records.h"
 
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
-#include <fstream>
 #include <memory>
-#include <sstream>
 #include <string>
 #include <vector>
 
@@ -46,12 +43,6 @@ protected:
     makeDirectories(kProfilePath);
     writeFile("C:\\windows\\system32\\drivers\\etc\\services", std::vector<unsigned char>{'#', '\n'});
     ASSERT_EQ(0, sqloSwitchToInstallationName(kCurrentCopy));
-  }
-
-  void TearDown() override {
-    setProcessVariable("KXLTRACE", nullptr);
-    kxlprod::resetTrace();
-    InstallWorld::TearDown();
   }
 
   static std::string copyKey(const char *copy) {
@@ -138,25 +129,6 @@ protected:
     setDword(key, "State", 1);
   }
 
-  // Trace lines written from now on, for the cases that look at trace points.
-  std::string startTrace() {
-#ifndef _WIN32
-    tracePath_ = worldRoot() + "/trace.txt";
-#else
-    tracePath_ = "kxl_services_trace.txt";
-#endif
-    std::remove(tracePath_.c_str());
-    setProcessVariable("KXLTRACE", tracePath_.c_str());
-    kxlprod::resetTrace();
-    return tracePath_;
-  }
-  std::string traceText() const {
-    std::ifstream in(tracePath_, std::ios::binary);
-    std::stringstream text;
-    text << in.rdbuf();
-    return text.str();
-  }
-
   // The options record the run hands the engine for INST1.
   static std::unique_ptr<UpgradeOptions> makeOptions() {
     auto options = std::make_unique<UpgradeOptions>();
@@ -168,9 +140,6 @@ protected:
     sqloinca(&options->status);
     return options;
   }
-
-private:
-  std::string tracePath_;
 };
 
 } // namespace kxltest
