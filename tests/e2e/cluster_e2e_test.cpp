@@ -1,12 +1,9 @@
-// Clustered instances upgraded in the cluster world of kxlsim, seen through
-// the programs a user has: kxlsim to build, show and compare the world, and
-// the installed command. The failures of the cluster step are driven the same
-// way, each followed by a plain run that then succeeds.
-#include "sim/kxlsim/scenario_parts.h"
-#include "tests/support/command_run.h"
-#include "tests/support/temp_world.h"
-
-#include <gtest/gtest.h>
+// Clustered instances upgraded by the installed command in the cluster world
+// of kxlsim, seen as kxlsim shows and compares the world. The failures of the
+// cluster step are driven the same way, each followed by a plain run that then
+// succeeds.
+#include "sim/kxlsim/show.h"
+#include "tests/support/command_world.h"
 
 #include <filesystem>
 #include <functional>
@@ -17,10 +14,6 @@
 namespace {
 
 namespace fs = std::filesystem;
-using kxltestsupport::CommandRun;
-using kxltestsupport::readHostFile;
-
-constexpr const char *kCommand = "Program Files\\ZAV\\KXL101\\bin\\kxliupgrade.exe";
 constexpr const char *kResources = "SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Resources\\";
 constexpr const char *kGroups = "SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\";
 constexpr const char *kServerType = "  type  KXL Server       kxlserver.dll";
@@ -86,66 +79,30 @@ std::vector<std::string> stepErrors(const std::string &trace) {
   return out;
 }
 
-class ClusterE2eTest : public ::testing::Test {
+class ClusterE2eTest : public kxltest::CommandWorld {
 protected:
   void SetUp() override {
-    temp_ = kxltestsupport::newTempDir("kxlcluster");
-    ASSERT_FALSE(temp_.empty());
-    world_ = temp_ + "/world";
-    ASSERT_EQ(runKxlsim({"create", world_, "--scenario", "cluster", "--command", KXL_COMMAND}), "");
-    std::string error;
-    ASSERT_TRUE(kxlsim::selectWorld(world_, error)) << error;
-  }
-
-  void TearDown() override {
-    std::error_code ignored;
-    if (!HasFailure())
-      fs::remove_all(temp_, ignored);
-    else
-      std::cerr << "world kept in " << temp_ << '\n';
-  }
-
-  // kxlsim's standard output and error.
-  std::string runKxlsim(const std::vector<std::string> &args) {
-    CommandRun run{KXL_KXLSIM, args, {}, "", temp_ + "/kxlsim.out", temp_ + "/kxlsim.out"};
-    kxltestsupport::runCommand(run);
-    return readHostFile(run.outFile);
-  }
-
-  std::string snapshot() {
-    std::string copy = temp_ + "/snapshot" + std::to_string(++snapshots_);
-    EXPECT_EQ(runKxlsim({"snapshot", world_, copy}), "");
-    return copy;
+    CommandWorld::SetUp();
+    resetWorld("cluster");
   }
 
   Outcome upgrade(const std::vector<std::string> &args, const std::string &faults = "") {
-    std::string trace = temp_ + "/trace" + std::to_string(++runs_);
-    std::vector<std::string> settings = {"KXLSIM_ROOT=" + world_, "KXLTRACE=" + trace};
+    std::vector<std::string> settings;
     if (!faults.empty())
       settings.push_back("KXLSIM_FAIL=" + faults);
-    CommandRun run{kxltestsupport::drivePath(world_, std::string("C:\\") + kCommand),
-                   args,
-                   settings,
-                   world_,
-                   temp_ + "/out",
-                   temp_ + "/err"};
-    Outcome result;
-    result.exitCode = kxltestsupport::runCommand(run);
-    result.out = readHostFile(run.outFile) + readHostFile(run.errFile);
-    result.trace = readHostFile(trace);
-    return result;
+    kxltest::CommandOutcome run = runInWorld(args, settings);
+    return {run.exitCode, run.out + run.err, run.trace};
   }
 
-  std::string show() { return runKxlsim({"show", world_}); }
+  std::string show() {
+    std::ostringstream out;
+    kxlsim::showWorld(out);
+    return out.str();
+  }
 
 public: // for the cases' set-up
-  kxlsim::WorldWriter world;
-  std::string world_;
-
-private:
-  std::string temp_;
-  int snapshots_ = 0;
-  int runs_ = 0;
+  using CommandWorld::hostPath;
+  using CommandWorld::world;
 };
 
 // Everything the upgrade of CINST1 changes in the registry: its profile key
@@ -172,7 +129,7 @@ TEST_F(ClusterE2eTest, ClusteredInstanceUpgradesAndASecondRunConvertsNothing) {
   Outcome first = upgrade(kSingle.args);
   EXPECT_EQ(first.exitCode, 0) << first.out;
   EXPECT_EQ(first.out.rfind("KXL1000I", 0), 0u) << first.out;
-  std::string diff = runKxlsim({"diff", before, world_});
+  std::string diff = changesSince(before);
   EXPECT_EQ(registryChanges(diff), kSingleChanges);
   EXPECT_TRUE(hasLine(diff,
                       "file ~ E:\\KXLPROF\\CINST1\\kxlsystm (16384 bytes, fnv 635b0f9ae34d87ac -> 16384 "
@@ -185,7 +142,7 @@ TEST_F(ClusterE2eTest, ClusteredInstanceUpgradesAndASecondRunConvertsNothing) {
   EXPECT_EQ(second.exitCode, 0) << second.out;
   EXPECT_NE(second.trace.find("exit 0x18780509 rc=0"), std::string::npos)
       << "the step ran and converted nothing";
-  EXPECT_EQ(runKxlsim({"diff", converted, world_}).find("Cluster"), std::string::npos);
+  EXPECT_EQ(changesSince(converted).find("Cluster"), std::string::npos);
 }
 
 // CINST2's partitions run on both nodes, which are also its cluster's
@@ -230,7 +187,7 @@ TEST_F(ClusterE2eTest, ClusteredPartitionedInstanceUpgradesOnEveryNode) {
   std::string before = snapshot();
   Outcome run = upgrade(kPartitioned.args);
   EXPECT_EQ(run.exitCode, 0) << run.out;
-  EXPECT_EQ(registryChanges(runKxlsim({"diff", before, world_})), kPartitionedChanges);
+  EXPECT_EQ(registryChanges(changesSince(before)), kPartitionedChanges);
   std::string cluster = show();
   for (const char *line : {"    CINST2-0       KXL Server       offline  depends on Disk F:",
                            "    CINST2-1       KXL Server       offline  depends on Disk G:, CINST2 IP",
@@ -261,11 +218,11 @@ TEST_F(ClusterE2eTest, ClusterStateThatCannotBeReadFailsTheRunUnchanged) {
     Outcome run = upgrade(kSingle.args, c.faults);
     EXPECT_NE(run.exitCode, 0) << run.out;
     EXPECT_EQ(run.out.rfind(c.message, 0), 0u) << run.out;
-    EXPECT_EQ(registryChanges(runKxlsim({"diff", before, world_})), "");
+    EXPECT_EQ(registryChanges(changesSince(before)), "");
   }
   std::string before = snapshot();
   EXPECT_EQ(upgrade(kSingle.args).exitCode, 0);
-  EXPECT_EQ(registryChanges(runKxlsim({"diff", before, world_})), kSingleChanges);
+  EXPECT_EQ(registryChanges(changesSince(before)), kSingleChanges);
 }
 
 // The step tells the instance's resources by a comparison that cannot fail:
@@ -279,9 +236,8 @@ TEST_F(ClusterE2eTest, FailedLibraryCompareStillFindsTheInstanceResource) {
     if (run.exitCode == 0)
       EXPECT_TRUE(hasLine(show(), kCinst1Converted)) << "a completed run converted the resource";
     else
-      EXPECT_EQ(registryChanges(runKxlsim({"diff", before, world_})), "") << run.out;
-    fs::remove_all(world_);
-    ASSERT_EQ(runKxlsim({"snapshot", before, world_}), "");
+      EXPECT_EQ(registryChanges(changesSince(before)), "") << run.out;
+    resetWorld("cluster");
   }
 }
 
@@ -349,9 +305,7 @@ const std::vector<std::string> kStillOwned = {"probe=47 rc=-1", "probe=50 rc=-12
 const StepCase kStepCases[] = {
     singleFails(
         "ClusterLibraryMissing", "", -1251, {"probe=10 rc=-1251"},
-        [](ClusterE2eTest &t) {
-          fs::remove(kxltestsupport::drivePath(t.world_, "C:\\windows\\system32\\clusapi.dll"));
-        },
+        [](ClusterE2eTest &t) { fs::remove(t.hostPath("C:\\windows\\system32\\clusapi.dll")); },
         [](ClusterE2eTest &t) {
           t.world.writeText("C:\\windows\\system32\\clusapi.dll",
                             "MZ simulated run-time module clusapi.dll\r\n");
@@ -427,7 +381,7 @@ TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
   if (c.result != 0) {
     EXPECT_NE(run.trace.find("error 0x18780502 probe=200 rc=" + std::to_string(c.result)), std::string::npos);
     EXPECT_EQ(run.out.rfind("KXL" + std::to_string(-c.result) + "E", 0), 0u) << run.out;
-    EXPECT_EQ(serviceChanges(runKxlsim({"diff", before, world_})), "") << "every node's services are back";
+    EXPECT_EQ(serviceChanges(changesSince(before)), "") << "every node's services are back";
   } else {
     EXPECT_EQ(run.exitCode, 0) << run.out;
   }
