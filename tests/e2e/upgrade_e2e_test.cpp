@@ -1,15 +1,8 @@
 // The single-partition instance of the 9.5 copy upgraded in a fresh demo
-// world, seen only through the programs a user has: kxlsim to build, snapshot
-// and compare the world, and the installed command itself.
-#include "tests/support/temp_world.h"
-#include <gtest/gtest.h>
+// world by the installed command, and everything it changed as kxlsim diff
+// shows it.
+#include "tests/support/command_world.h"
 
-#include <sys/wait.h>
-#include <unistd.h>
-
-#include <cstdio>
-#include <cstdlib>
-#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <sstream>
@@ -17,32 +10,6 @@
 #include <vector>
 
 namespace {
-
-namespace fs = std::filesystem;
-
-struct Command {
-  int exitCode = -1;
-  std::string out;
-};
-
-// Runs a shell command line, standard output captured (bounded reads).
-Command runShell(const std::string &line) {
-  Command result;
-  FILE *pipe = popen(line.c_str(), "r");
-  if (pipe == nullptr)
-    return result;
-  char chunk[4096];
-  std::size_t n = 0;
-  while ((n = std::fread(chunk, 1, sizeof chunk, pipe)) > 0)
-    result.out.append(chunk, n);
-  int status = pclose(pipe);
-  result.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  return result;
-}
-
-std::string shellWord(const std::string &text) {
-  return "'" + text + "'";
-}
 
 // Everything the upgrade changes, and nothing else: the profile key moved,
 // the instance registered under the current copy, its service re-pointed (its
@@ -100,30 +67,7 @@ file + events.jsonl (805 bytes, fnv d398b08fdd4bb417)
        + {"audit_event":"1","category":"0x20000000","data":"INST1","errortype":"0","event":"audit","instance":"INST1","sqlcode":"0"}
 )";
 
-class UpgradeE2eTest : public ::testing::Test {
-protected:
-  void SetUp() override {
-    temp = kxltestsupport::newTempDir("kxle2e");
-    ASSERT_FALSE(temp.empty());
-    world = temp + "/world";
-    Command created = runShell(std::string(KXL_KXLSIM) + " create " + shellWord(world) + " --command " +
-                               shellWord(KXL_COMMAND) + " 2>&1");
-    ASSERT_EQ(created.exitCode, 0) << created.out;
-  }
-
-  void TearDown() override {
-    std::error_code ignored;
-    if (!HasFailure())
-      fs::remove_all(temp, ignored);
-    else
-      std::cerr << "world kept in " << temp << '\n';
-  }
-
-  fs::path drivePath(const std::string &relative) const { return fs::path(world) / "drive_c" / relative; }
-
-  std::string temp;
-  std::string world;
-};
+using UpgradeE2eTest = kxltest::CommandWorld;
 
 // A diff without the entry of the diagnostic log and its lines.
 std::string withoutDiagnosticLog(const std::string &diff) {
@@ -141,7 +85,7 @@ std::string withoutDiagnosticLog(const std::string &diff) {
 
 // The converted file has the current release's layout: release word 0x0D00
 // at byte 16, level 10100 at byte 20, and 16384 bytes.
-void expectCurrentLayout(const fs::path &path) {
+void expectCurrentLayout(const std::string &path) {
   std::ifstream in(path, std::ios::binary);
   std::vector<unsigned char> image((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
   ASSERT_EQ(image.size(), 16384u);
@@ -150,25 +94,16 @@ void expectCurrentLayout(const fs::path &path) {
 }
 
 TEST_F(UpgradeE2eTest, SinglePartitionInstanceMovesToTheCurrentCopy) {
-  std::string before = temp + "/before";
-  ASSERT_EQ(
-      runShell(std::string(KXL_KXLSIM) + " snapshot " + shellWord(world) + " " + shellWord(before)).exitCode,
-      0);
-
-  std::string command = drivePath("Program Files/ZAV/KXL101/bin/kxliupgrade.exe").string();
-  Command upgrade =
-      runShell("cd " + shellWord(world) + " && env -u KXLINSTANCE -u KXLSIM_FAIL -u TMP -u TEMP " +
-               "KXLSIM_ROOT=" + shellWord(world) + " " + shellWord(command) + " INST1 2>&1");
-  EXPECT_EQ(upgrade.exitCode, 0) << upgrade.out;
+  std::string before = snapshot();
+  kxltest::CommandOutcome upgrade = runInWorld({"INST1"}, {}, "kxliupgrade.exe", "C:\\");
+  EXPECT_EQ(upgrade.exitCode, 0) << upgrade.out << upgrade.err;
   EXPECT_NE(upgrade.out.find("KXLIUPGRADE"), std::string::npos) << upgrade.out;
 
-  Command diff = runShell(std::string(KXL_KXLSIM) + " diff " + shellWord(before) + " " + shellWord(world));
-  EXPECT_EQ(diff.exitCode, 1);
+  std::string diff = changesSince(before);
   // The diagnostic log names the backup folder, whose name differs per run.
-  std::string changes = withoutDiagnosticLog(diff.out);
-  EXPECT_EQ(changes, kExpectedChanges);
-  EXPECT_NE(diff.out.find("\\INST1 is backed up in C:\\windows\\temp\\KXL"), std::string::npos) << diff.out;
-  expectCurrentLayout(drivePath("Program Files/ZAV/KXL101/INST1/kxlsystm"));
+  EXPECT_EQ(withoutDiagnosticLog(diff), kExpectedChanges);
+  EXPECT_NE(diff.find("\\INST1 is backed up in C:\\windows\\temp\\KXL"), std::string::npos) << diff;
+  expectCurrentLayout(hostPath(std::string(kCurrentCopy) + "\\INST1\\kxlsystm"));
 }
 
 } // namespace
