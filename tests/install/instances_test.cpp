@@ -202,10 +202,12 @@ TEST_F(Instances, ReloadTheirConfigurationFromAnyDirectory) {
   writeFile("C:\\Home\\INST1\\kxlsystm", configImage(0x0105));
   IKXLINSTANCE holder;
   EXPECT_EQ(0, holder.GetNodeType());
+  ASSERT_EQ(0u, holder.ReloadDbmCfg("C:\\Home\\INST1"));
+  EXPECT_EQ(0x5A, holder.dbmCfgImage[16383]);
   ASSERT_EQ(0u, holder.ReloadDbmCfg("C:\\Saved"));
   EXPECT_EQ(3, holder.GetNodeType());
   EXPECT_EQ(0x5A, holder.dbmCfgImage[4095]);
-  EXPECT_EQ(0, holder.dbmCfgImage[16383]);
+  EXPECT_EQ(0, holder.dbmCfgImage[16383]) << "nothing of a longer file is left";
   // A missing file leaves the snapshot as it was.
   EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, holder.ReloadDbmCfg("C:\\Nowhere"));
   EXPECT_EQ(3, holder.GetNodeType());

@@ -141,6 +141,7 @@ TEST_F(Products, OfACurrentCopyAreListedInTableOrder) {
   EXPECT_EQ(1u, all[0]->GetRankNumber());
   EXPECT_EQ(4, all[0]->GetSupportedNodeType());
   EXPECT_STREQ(kServerCodeNext, all[0]->registeredCode);
+  EXPECT_STREQ("PROD_HALDOR_PRIME", all[0]->GetInfo()->key);
   EXPECT_EQ(Names({"Engine"}), strings(all[0]->GetComponents()));
   EXPECT_EQ(3, all[1]->GetSupportedNodeType());
   EXPECT_EQ(-1, all[2]->GetSupportedNodeType());
@@ -148,6 +149,12 @@ TEST_F(Products, OfACurrentCopyAreListedInTableOrder) {
   ASSERT_EQ(0u, copy.GetInstalledProdList(&again));
   EXPECT_EQ(list, again);
   EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, copy.GetInstalledProdList(nullptr));
+  // A copy installed for one user keeps its products' components there.
+  createKey(HKEY_LOCAL_MACHINE, std::string(kCopies) + "KXL101\\Users");
+  setValue(HKEY_CURRENT_USER, productKey, "Own Engine", "");
+  InstallCopy perUser("KXL101", false, false);
+  ASSERT_EQ(0u, perUser.GetInstalledProdList(&list));
+  EXPECT_EQ(Names({"Own Engine"}), strings(elements(*list)[0]->GetComponents()));
 }
 
 TEST_F(Products, OfTheVersion8InstallationListOneVariantPerProduct) {

@@ -38,6 +38,7 @@ int fakeDriver(UpgradeContext &context, UpgradeOptions &options) {
                                       {"node_type", std::to_string(context.nodeType)},
                                       {"partitioned", std::to_string(options.partitionedInstance)},
                                       {"copy_path", context.copyPath},
+                                      {"ports", std::string(context.var159Head) + ":" + context.var159Tail},
                                       {"kxlinstance", environmentInstance()}});
   options.partitionRecord.textSearchReasonCode = static_cast<int32_t>(driverSetting("reason"));
   options.partitionRecord.extraMessage = static_cast<int32_t>(driverSetting("extra"));

@@ -107,6 +107,11 @@ TEST_F(OutcomeScenario, PartitionedInstanceWithAccountReachesTheDriver) {
   EXPECT_EQ(r.out, kxltest::kSuccessText);
   EXPECT_TRUE(has(handedOver(r), "partitioned", "1")) << handedOver(r);
   EXPECT_TRUE(has(handedOver(r), "node_type", "4")) << handedOver(r);
+  EXPECT_TRUE(has(handedOver(r), "ports", "60000:60003")) << handedOver(r);
+  // A port range of one port: the last lies four above it.
+  world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1",
+                  "KXLPORTRANGE", "50000");
+  EXPECT_TRUE(has(handedOver(run({"INST1"})), "ports", "50000:50004"));
 }
 
 TEST_F(OutcomeScenario, CheckToolExitCodesThatLetTheUpgradeGoOn) {
