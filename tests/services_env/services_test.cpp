@@ -52,18 +52,6 @@ TEST_F(ServicesTest, SingleServiceRunsTheCurrentCopyWithItsFormerStartType) {
   EXPECT_TRUE(checksumValid(image));
 }
 
-TEST_F(ServicesTest, GivenAccountReplacesTheServiceAccount) {
-  addTemplate(1);
-  addOldInstance(1, 2);
-  bind(1);
-  std::snprintf(options->userName, sizeof options->userName, "NEWACCT");
-  std::snprintf(options->password, sizeof options->password, "secret");
-  ASSERT_EQ(0, run());
-  EXPECT_EQ(2, context.serviceStartType);
-  EXPECT_EQ("NEWACCT", getString(serviceKey(kInstance), "ObjectName"));
-  EXPECT_EQ(2u, getDword(serviceKey(kInstance), "Start"));
-}
-
 TEST_F(ServicesTest, ProfileValuesReachTheProductLibraries) {
   addTemplate(1);
   addOldInstance(1);
