@@ -1,54 +1,15 @@
 #include "tests/support/command_world.h"
 
 #include "sim/kxlsim/diff.h"
-#include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/snapshot.h"
 #include "tests/support/command_run.h"
-#include "tests/support/temp_world.h"
+#include "tests/support/scenario_world.h"
 
-#include <filesystem>
-#include <map>
 #include <sstream>
 
 namespace kxltest {
 
-namespace fs = std::filesystem;
 using kxltestsupport::readHostFile;
-
-namespace {
-
-// The worlds built for the program, by scenario ("" when building failed),
-// removed when it ends.
-class Templates {
-public:
-  ~Templates() {
-    std::error_code ignored;
-    for (const std::string &dir : dirs_)
-      fs::remove_all(dir, ignored);
-  }
-  const std::string &of(const std::string &scenario) {
-    auto found = worlds_.find(scenario);
-    if (found != worlds_.end())
-      return found->second;
-    std::string dir = kxltestsupport::newTempDir("kxlcmd-" + scenario);
-    std::string world = dir + "/world";
-    kxlsim::InstallSources sources{KXL_TOOLS, KXL_COMMAND, KXL_MESSAGES};
-    std::vector<std::string> errors;
-    if (!dir.empty())
-      dirs_.push_back(dir);
-    if (dir.empty() || !kxlsim::createWorld(world, scenario, sources, errors))
-      world.clear();
-    return worlds_[scenario] = world;
-  }
-
-private:
-  std::map<std::string, std::string> worlds_;
-  std::vector<std::string> dirs_;
-};
-
-Templates templates;
-
-} // namespace
 
 std::string field(const std::string &name, const std::string &value) {
   return "\"" + name + "\":\"" + value + "\"";
@@ -62,39 +23,24 @@ std::vector<std::string> eventsOf(const CommandOutcome &run, const std::string &
   return found;
 }
 
-void CommandWorld::SetUp() {
-  temp_ = kxltestsupport::newTempDir("kxlcmd");
-  ASSERT_FALSE(temp_.empty());
-  root_ = temp_ + "/world";
-  resetWorld();
-}
-
-void CommandWorld::TearDown() {
-  std::error_code ignored;
-  if (!HasFailure())
-    fs::remove_all(temp_, ignored);
-  else
-    std::cerr << "the world of this case stays in " << temp_ << '\n';
-}
-
 void CommandWorld::resetWorld(const std::string &scenario) {
-  const std::string &built = templates.of(scenario);
-  ASSERT_FALSE(built.empty()) << "the " << scenario << " world could not be built";
-  std::error_code failure;
-  fs::remove_all(root_, failure);
-  fs::copy(built, root_, fs::copy_options::recursive, failure);
-  ASSERT_FALSE(failure) << failure.message();
-  std::string reason;
-  ASSERT_TRUE(kxlsim::selectWorld(root_, reason)) << reason;
+  if (machine_)
+    machine_->leave();
+  machine_ = std::make_unique<kxltestsupport::TempWorld>(
+      "kxlcmd", kxltestsupport::CopyOf{kxltestsupport::scenarioWorld(scenario)});
+  ASSERT_FALSE(root().empty()) << "no copy of the " << scenario << " world";
+  machine_->enter();
+  world.installHostFile(KXL_COMMAND, std::string(kCurrentCopy) + "\\bin\\kxliupgrade.exe", true);
+  ASSERT_TRUE(world.ok());
 }
 
 CommandOutcome CommandWorld::runInWorld(const std::vector<std::string> &args,
                                         std::vector<std::string> settings, const std::string &program,
                                         const std::string &cwd) {
-  std::string tag = temp_ + "/run" + std::to_string(++runs_);
-  std::string eventLog = root_ + "/events.jsonl", diagLog = root_ + "/kxldiag.log";
+  std::string tag = machine_->scratch("run" + std::to_string(++runs_));
+  std::string eventLog = machine_->host("events.jsonl"), diagLog = machine_->host("kxldiag.log");
   std::size_t eventsBefore = readHostFile(eventLog).size(), diagBefore = readHostFile(diagLog).size();
-  settings.insert(settings.begin(), {"KXLSIM_ROOT=" + root_, "KXLTRACE=" + tag + ".trace"});
+  settings.insert(settings.begin(), {"KXLSIM_ROOT=" + root(), "KXLTRACE=" + tag + ".trace"});
   kxltestsupport::CommandRun command{hostPath(std::string(kCurrentCopy) + "\\bin\\" + program),
                                      args,
                                      settings,
@@ -114,19 +60,19 @@ CommandOutcome CommandWorld::runInWorld(const std::vector<std::string> &args,
 }
 
 std::string CommandWorld::snapshot() {
-  std::string copy = temp_ + "/snapshot" + std::to_string(++snapshots_), error;
-  EXPECT_TRUE(kxlsim::snapshotWorld(root_, copy, error)) << error;
+  std::string copy = machine_->scratch("snapshot" + std::to_string(++snapshots_)), error;
+  EXPECT_TRUE(kxlsim::snapshotWorld(root(), copy, error)) << error;
   return copy;
 }
 
 std::string CommandWorld::changesSince(const std::string &snapshot) const {
   std::ostringstream out;
-  kxlsim::diffWorlds(snapshot, root_, out);
+  kxlsim::diffWorlds(snapshot, root(), out);
   return out.str();
 }
 
 std::string CommandWorld::hostPath(const std::string &windowsPath) const {
-  return kxltestsupport::drivePath(root_, windowsPath);
+  return kxltestsupport::drivePath(root(), windowsPath);
 }
 
 } // namespace kxltest

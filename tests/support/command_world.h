@@ -1,14 +1,16 @@
-// A world built once per test program by kxlsim with the command installed
-// (the demo world, or another scenario's), copied afresh for every case, and
-// the installed command run in it: its exit code, output, trace, and the
-// events and diagnostic lines it added. Compiled into each program that uses
-// it, with the program's KXL_TOOLS, KXL_COMMAND and KXL_MESSAGES.
+// A copy of a scenario world (the demo world, or another scenario's) for every
+// case, with the built command installed in the current copy, and the command
+// run in it: its exit code, output, trace, and the events and diagnostic lines
+// it added. Compiled into each program that uses it, with the program's
+// KXL_COMMAND.
 #pragma once
 
 #include "sim/kxlsim/scenario_parts.h"
+#include "tests/support/temp_world.h"
 
 #include <gtest/gtest.h>
 
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -26,8 +28,8 @@ protected:
   static constexpr const char *kCurrentCopy = "C:\\Program Files\\ZAV\\KXL101";
   static constexpr const char *kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
 
-  void SetUp() override;    // a fresh demo world
-  void TearDown() override; // kept for a look when the case failed
+  void SetUp() override { resetWorld(); }
+  void TearDown() override { machine_->leave(); }
 
   // The demo world afresh, or the world of another scenario ("cluster").
   void resetWorld(const std::string &scenario = "demo");
@@ -40,12 +42,12 @@ protected:
   std::string snapshot();
   std::string changesSince(const std::string &snapshot) const;
   std::string hostPath(const std::string &windowsPath) const;
-  const std::string &root() const { return root_; }
+  const std::string &root() const { return machine_->root(); }
 
   kxlsim::WorldWriter world;
 
 private:
-  std::string temp_, root_;
+  std::unique_ptr<kxltestsupport::TempWorld> machine_;
   int runs_ = 0, snapshots_ = 0;
 };
 
