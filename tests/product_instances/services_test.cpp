@@ -10,6 +10,13 @@ namespace {
 
 using Services = DemoWorld;
 
+// Changes the start type (and the program) of a service, nothing else.
+int32_t changeStart(const char *name, const char *machine, uint32_t start, const char *program = nullptr) {
+  SQLO_SVC_OUT out{};
+  return sqloChangeNTServiceConfig(name, machine, SQLO_SVC_NO_CHANGE, start, SQLO_SVC_NO_CHANGE, program,
+                                   nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out);
+}
+
 TEST_F(Services, QueryGivesTheStoredConfiguration) {
   SQLO_SVC_CONFIG config{};
   SQLO_SVC_OUT out{};
@@ -26,19 +33,13 @@ TEST_F(Services, QueryGivesTheStoredConfiguration) {
 
 TEST_F(Services, ChangeTouchesOnlyWhatIsGiven) {
   snapshot();
-  SQLO_SVC_OUT out{};
-  ASSERT_EQ(0, sqloChangeNTServiceConfig("INST1", nullptr, SQLO_SVC_NO_CHANGE, 3, SQLO_SVC_NO_CHANGE, nullptr,
-                                         nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out));
+  ASSERT_EQ(0, changeStart("INST1", nullptr, 3));
   EXPECT_EQ(diff(),
             "registry ~ HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1 \"Start\": dword:2 -> dword:3\n");
   snapshot();
-  ASSERT_EQ(0, sqloChangeNTServiceConfig("INST1", "WINSRV1", SQLO_SVC_NO_CHANGE, SQLO_SVC_NO_CHANGE,
-                                         SQLO_SVC_NO_CHANGE, nullptr, nullptr, nullptr, nullptr, nullptr,
-                                         nullptr, nullptr, &out));
+  ASSERT_EQ(0, changeStart("INST1", "WINSRV1", SQLO_SVC_NO_CHANGE));
   EXPECT_EQ(diff(), "") << "no change at all, the local computer by name";
-  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT,
-            sqloChangeNTServiceConfig("INST1", nullptr, SQLO_SVC_NO_CHANGE, 9, SQLO_SVC_NO_CHANGE, nullptr,
-                                      nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out));
+  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, changeStart("INST1", nullptr, 9));
 }
 
 TEST_F(Services, ChangeOnAnotherMachineGoesToItsSubtree) {
@@ -54,19 +55,14 @@ TEST_F(Services, ChangeOnAnotherMachineGoesToItsSubtree) {
   EXPECT_EQ(regString(key, "DisplayName"), "KXL - KXL101 - INST2-1");
   EXPECT_EQ(getDword(key, "State"), 1u);
   EXPECT_FALSE(keyExists(std::string(kServices) + "INST2-1")) << "nothing on this machine";
-  EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE,
-            sqloChangeNTServiceConfig("INST2-1", "WINSRV9", SQLO_SVC_NO_CHANGE, 4, SQLO_SVC_NO_CHANGE,
-                                      program, nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out));
+  EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE, changeStart("INST2-1", "WINSRV9", 4, program));
   failCalls("sqloChangeNTServiceConfig:1");
-  EXPECT_NE(0, sqloChangeNTServiceConfig("INST1", nullptr, SQLO_SVC_NO_CHANGE, 4, SQLO_SVC_NO_CHANGE, nullptr,
-                                         nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out));
+  EXPECT_NE(0, changeStart("INST1", nullptr, 4));
   EXPECT_EQ(getDword(std::string(kServices) + "INST1", "Start"), 2u);
   // A service key that cannot be read is a failure, never a service that is
   // not there (which callers may pass over).
   failCalls("RegOpenKeyExA:1");
-  EXPECT_EQ(SQLO_RC_SYSTEM_ERROR,
-            sqloChangeNTServiceConfig("INST1", nullptr, SQLO_SVC_NO_CHANGE, 4, SQLO_SVC_NO_CHANGE, nullptr,
-                                      nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out));
+  EXPECT_EQ(SQLO_RC_SYSTEM_ERROR, changeStart("INST1", nullptr, 4));
   EXPECT_EQ(getDword(std::string(kServices) + "INST1", "Start"), 2u);
 }
 

@@ -1,11 +1,9 @@
 // The library's current instance, its audit settings file and audit events.
-#include "tests/support/product_world.h"
 #include "sim/common/events.h"
+#include "tests/support/product_world.h"
 
 #include <algorithm>
 #include <cstring>
-#include <fstream>
-#include <sstream>
 
 namespace {
 
@@ -24,12 +22,7 @@ protected:
     writeFile("C:\\KXL\\INST1\\security\\kxlaudit.cfg", text);
   }
 
-  static std::string events() {
-    std::ifstream in(kxlsim::eventsPath());
-    std::stringstream text;
-    text << in.rdbuf();
-    return text.str();
-  }
+  static std::string events() { return kxltestsupport::readHostFile(kxlsim::eventsPath()); }
 };
 
 TEST_F(AuditTest, CurrentInstanceMustBeRegistered) {

@@ -10,14 +10,6 @@ namespace {
 
 class InstallationsTest : public kxltest::ProductWorld {
 protected:
-  // Windows folder of the running test program.
-  static std::string ownFolder() {
-    char module[1024] = {};
-    DWORD length = GetModuleFileNameA(nullptr, module, sizeof module);
-    std::string path(module, length);
-    return path.substr(0, path.find_last_of('\\'));
-  }
-
   // Reads every instance through the iteration: name -> directory|copy.
   static std::map<std::string, std::string> allInstances(uint32_t &endCode) {
     std::map<std::string, std::string> found;
@@ -132,7 +124,7 @@ TEST_F(InstallationsTest, VersionEightInstallationIsKnownByItsFixedName) {
 }
 
 TEST_F(InstallationsTest, SwitchingChangesTheCurrentInstallationUntilSwitchedBack) {
-  registerCopy("V101", ownFolder());
+  registerOwnCopy("V101");
   registerCopy("V95", "C:\\KXL\\V95");
   char name[SQLO_COPY_NAME_SZ];
   ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));

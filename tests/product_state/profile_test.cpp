@@ -11,12 +11,9 @@ class ProfileTest : public kxltest::ProductWorld {
 protected:
   void SetUp() override {
     ProductWorld::SetUp();
-    if (IsSkipped() || HasFatalFailure())
+    if (HasFatalFailure())
       return;
-    char module[1024] = {};
-    DWORD length = GetModuleFileNameA(nullptr, module, sizeof module);
-    std::string path(module, length);
-    registerCopy("V101", path.substr(0, path.find_last_of('\\')));
+    registerOwnCopy("V101");
     registerCopy("V95", "C:\\KXL\\V95");
     registerV8("C:\\KXL8");
   }

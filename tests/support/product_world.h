@@ -44,6 +44,14 @@ protected:
     setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\" + copy, "KXL Path Name", path);
   }
 
+  // A copy registered at the running test program's folder, which makes it
+  // the library's current installation.
+  static void registerOwnCopy(const std::string &copy) {
+    char module[MAX_PATH] = {};
+    std::string path(module, GetModuleFileNameA(nullptr, module, sizeof module));
+    registerCopy(copy, path.substr(0, path.find_last_of('\\')));
+  }
+
   // A registered copy whose folder exists, made the library's current installation.
   static void useCopy(const std::string &copy, const std::string &path) {
     registerCopy(copy, path);
