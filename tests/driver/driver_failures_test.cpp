@@ -383,20 +383,6 @@ TEST_F(DriverFailureTest, MissingFunctionDirectoryFailsTheCopy) {
   expectRerunUpgrades({"INST1"});
 }
 
-// A clustered instance on a machine without the cluster modules: the cluster
-// step's failure is the run's, named by its message, and the undo runs.
-TEST_F(DriverFailureTest, ClusteredInstanceWithoutTheClusterApi) {
-  world.setString(kxlsim::localMachine(), profileKey("KXL95", "INST1"), "KXLCLUSTER", "KXLCL1");
-  Outcome outcome = run({"INST1"});
-  ASSERT_TRUE(outcome.driverRan) << outcome.out << outcome.err;
-  ASSERT_FALSE(outcome.failures.empty()) << outcome.trace;
-  EXPECT_EQ(outcome.failures.back().probe, 200);
-  EXPECT_EQ(outcome.driverResult, -1251);
-  EXPECT_EQ(outcome.out.rfind("KXL1251E", 0), 0u) << outcome.out;
-  EXPECT_EQ(treeDifferences(before, tree(kOldInstanceDir)), "");
-  EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
-}
-
 // A run killed at some point leaves its record; the next plain run puts the
 // instance back or finishes the upgrade, and leaves nothing of the killed run.
 // A record that cannot be used is set aside and the run judged as usual.
