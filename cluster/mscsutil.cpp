@@ -218,35 +218,45 @@ bool MSCSUtil::IsNodeRunning() {
   return getNodeClusterState(nullptr, &state) == ERROR_SUCCESS && state == kNodeRunning;
 }
 
+template <typename R, typename Body> R MSCSUtil::WithCluster(R failed, Body body) {
+  Opened cluster(openCluster(nullptr), closeCluster);
+  return cluster ? body(cluster.get()) : failed;
+}
+
+template <typename Body> int32_t MSCSUtil::WithNamedInRunningCluster(const char *name, Body body) {
+  WCHAR wideName[kClusterNameChars];
+  if (!toWide(name, wideName, kClusterNameChars) || !IsNodeRunning())
+    return -1;
+  return WithCluster(-1,
+                     [&](HCLUSTER cluster) { return body(cluster, static_cast<const WCHAR *>(wideName)); });
+}
+
 int32_t MSCSUtil::CreateResourceType(LPCWSTR typeName, LPCWSTR displayName, LPCWSTR dllName,
                                      DWORD looksAlivePollMs, DWORD isAlivePollMs) {
   if (!IsNodeRunning())
     return -1;
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return -1;
-  DWORD rc = createClusterResourceType(cluster.get(), typeName, displayName, dllName, looksAlivePollMs,
-                                       isAlivePollMs);
-  return rc == ERROR_SUCCESS || rc == kAlreadyExists ? 0 : -1;
+  return WithCluster(-1, [&](HCLUSTER cluster) {
+    DWORD rc =
+        createClusterResourceType(cluster, typeName, displayName, dllName, looksAlivePollMs, isAlivePollMs);
+    return rc == ERROR_SUCCESS || rc == kAlreadyExists ? 0 : -1;
+  });
 }
 
 int32_t MSCSUtil::ResourceTypeExists(LPCWSTR typeName) {
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return -1;
-  Opened listing(clusterResourceTypeOpenEnum(cluster.get(), typeName, CLUSTER_RESOURCE_TYPE_ENUM_NODES),
-                 clusterResourceTypeCloseEnum);
-  if (listing)
-    return 1;
-  return GetLastError() == ERROR_RESOURCE_TYPE_NOT_FOUND ? 0 : -1;
+  return WithCluster(-1, [&](HCLUSTER cluster) {
+    Opened listing(clusterResourceTypeOpenEnum(cluster, typeName, CLUSTER_RESOURCE_TYPE_ENUM_NODES),
+                   clusterResourceTypeCloseEnum);
+    if (listing)
+      return 1;
+    return GetLastError() == ERROR_RESOURCE_TYPE_NOT_FOUND ? 0 : -1;
+  });
 }
 
 int32_t MSCSUtil::DeleteResourceType(LPCWSTR typeName) {
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return -1;
-  DWORD rc = deleteClusterResourceType(cluster.get(), typeName);
-  return rc == ERROR_SUCCESS || rc == ERROR_RESOURCE_TYPE_NOT_FOUND ? 0 : -1;
+  return WithCluster(-1, [&](HCLUSTER cluster) {
+    DWORD rc = deleteClusterResourceType(cluster, typeName);
+    return rc == ERROR_SUCCESS || rc == ERROR_RESOURCE_TYPE_NOT_FOUND ? 0 : -1;
+  });
 }
 
 template <typename Visit> bool MSCSUtil::ForEachResource(HCLUSTER cluster, Visit visit) {
@@ -271,18 +281,14 @@ template <typename Visit> bool MSCSUtil::ForEachResource(HCLUSTER cluster, Visit
 
 int32_t MSCSUtil::GetResourcesOfType(const char *typeName, ClusterResourceList &found) {
   found.clear();
-  WCHAR wideType[kClusterNameChars];
-  if (!toWide(typeName, wideType, kClusterNameChars) || !IsNodeRunning())
-    return -1;
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return -1;
-  bool read = true;
-  bool listed = ForEachResource(cluster.get(), [&](const WCHAR *name) {
-    read = AppendIfOfType(cluster.get(), name, wideType, found);
-    return read;
+  return WithNamedInRunningCluster(typeName, [&](HCLUSTER cluster, const WCHAR *wideType) {
+    bool read = true;
+    bool listed = ForEachResource(cluster, [&](const WCHAR *name) {
+      read = AppendIfOfType(cluster, name, wideType, found);
+      return read;
+    });
+    return listed && read ? 0 : -1;
   });
-  return listed && read ? 0 : -1;
 }
 
 bool MSCSUtil::ReadType(HRESOURCE resource, WCHAR (&type)[kClusterNameChars]) {
@@ -354,17 +360,13 @@ int32_t MSCSUtil::IsListed(HCLUSTER cluster, const WCHAR *name) {
 
 int32_t MSCSUtil::ReadResource(const char *name, ClusterResourceFacts &facts) {
   facts = ClusterResourceFacts{};
-  WCHAR wideName[kClusterNameChars];
-  if (!toWide(name, wideName, kClusterNameChars) || !IsNodeRunning())
-    return -1;
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return -1;
-  int32_t listed = IsListed(cluster.get(), wideName);
-  if (listed < 0)
-    return -1;
-  facts.exists = listed == 1;
-  return !facts.exists || ReadListedResource(cluster.get(), wideName, facts) ? 0 : -1;
+  return WithNamedInRunningCluster(name, [&](HCLUSTER cluster, const WCHAR *wideName) {
+    int32_t listed = IsListed(cluster, wideName);
+    if (listed < 0)
+      return -1;
+    facts.exists = listed == 1;
+    return !facts.exists || ReadListedResource(cluster, wideName, facts) ? 0 : -1;
+  });
 }
 
 bool MSCSUtil::ReadListedResource(HCLUSTER cluster, const WCHAR *name, ClusterResourceFacts &facts) {
@@ -384,13 +386,12 @@ int32_t MSCSUtil::IsResourceOfType(const char *name, const char *typeName) {
   if (!toWide(name, wideName, kClusterNameChars) || !toWide(typeName, wideType, kLongNameChars) ||
       !IsNodeRunning())
     return 0;
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return 0;
-  Opened resource(openClusterResource(cluster.get(), wideName), closeClusterResource);
-  if (!resource)
-    return 0;
-  return resUtilResourceTypesEqual(wideType, resource.get()) ? 1 : 0;
+  return WithCluster(0, [&](HCLUSTER cluster) {
+    Opened resource(openClusterResource(cluster, wideName), closeClusterResource);
+    if (!resource)
+      return 0;
+    return resUtilResourceTypesEqual(wideType, resource.get()) ? 1 : 0;
+  });
 }
 
 int32_t MSCSUtil::GetResourceDependencies(const char *name, ClusterResourceList &dependencies) {
@@ -398,10 +399,12 @@ int32_t MSCSUtil::GetResourceDependencies(const char *name, ClusterResourceList 
   WCHAR wideName[kClusterNameChars];
   if (!toWide(name, wideName, kClusterNameChars))
     return -1;
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return -1;
-  Opened resource(openClusterResource(cluster.get(), wideName), closeClusterResource);
+  return WithCluster(-1, [&](HCLUSTER cluster) { return ReadDependencies(cluster, wideName, dependencies); });
+}
+
+int32_t MSCSUtil::ReadDependencies(HCLUSTER cluster, const WCHAR *wideName,
+                                   ClusterResourceList &dependencies) {
+  Opened resource(openClusterResource(cluster, wideName), closeClusterResource);
   if (!resource)
     return -1;
   Opened listing(clusterResourceOpenEnum(resource.get(), CLUSTER_RESOURCE_ENUM_DEPENDS),
@@ -433,15 +436,14 @@ int32_t MSCSUtil::DeleteResource(const char *name) {
   bool fits = toWide(name, wideName, kClusterNameChars);
   if (!IsNodeRunning())
     return -1;
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return -1;
-  if (!fits)
-    return 0; // no resource has such a name
-  Opened resource(openClusterResource(cluster.get(), wideName), closeClusterResource);
-  if (!resource)
-    return 0;
-  return deleteClusterResource(resource.get()) == ERROR_SUCCESS ? 0 : -1;
+  return WithCluster(-1, [&](HCLUSTER cluster) {
+    if (!fits)
+      return 0; // no resource has such a name
+    Opened resource(openClusterResource(cluster, wideName), closeClusterResource);
+    if (!resource)
+      return 0;
+    return deleteClusterResource(resource.get()) == ERROR_SUCCESS ? 0 : -1;
+  });
 }
 
 HRESOURCE MSCSUtil::CreateResource(const char *groupName, const char *name, const char *typeName,
@@ -452,13 +454,12 @@ HRESOURCE MSCSUtil::CreateResource(const char *groupName, const char *name, cons
   if (!toWide(groupName, wideGroup, kClusterNameChars) || !toWide(name, wideName, kClusterNameChars) ||
       !toWide(typeName, wideType, kClusterNameChars) || !IsNodeRunning())
     return nullptr;
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return nullptr;
-  Opened group(openClusterGroup(cluster.get(), wideGroup), closeClusterGroup);
-  if (!group)
-    return nullptr;
-  return createClusterResource(group.get(), wideName, wideType, flags);
+  return WithCluster(HRESOURCE(nullptr), [&](HCLUSTER cluster) {
+    Opened group(openClusterGroup(cluster, wideGroup), closeClusterGroup);
+    if (!group)
+      return HRESOURCE(nullptr);
+    return createClusterResource(group.get(), wideName, wideType, flags);
+  });
 }
 
 void MSCSUtil::CloseResource(HRESOURCE resource) {
@@ -469,10 +470,12 @@ void MSCSUtil::CloseResource(HRESOURCE resource) {
 int32_t MSCSUtil::AddResourceDependencies(const char *name, const ClusterResourceList &dependencies) {
   WCHAR wideName[kClusterNameChars];
   toWide(name, wideName, kClusterNameChars);
-  Opened cluster(openCluster(nullptr), closeCluster);
-  if (!cluster)
-    return -1;
-  Opened resource(openClusterResource(cluster.get(), wideName), closeClusterResource);
+  return WithCluster(-1, [&](HCLUSTER cluster) { return AddDependencies(cluster, wideName, dependencies); });
+}
+
+int32_t MSCSUtil::AddDependencies(HCLUSTER cluster, const WCHAR *wideName,
+                                  const ClusterResourceList &dependencies) {
+  Opened resource(openClusterResource(cluster, wideName), closeClusterResource);
   if (!resource)
     return -1;
   int32_t result = 0;
@@ -483,10 +486,10 @@ int32_t MSCSUtil::AddResourceDependencies(const char *name, const ClusterResourc
       result = -1;
       continue;
     }
-    Opened dependency(openClusterResource(cluster.get(), dependencyName), closeClusterResource);
+    Opened dependency(openClusterResource(cluster, dependencyName), closeClusterResource);
     // A dependency that is gone is passed over; one the cluster still lists is not.
     if (!dependency) {
-      if (IsListed(cluster.get(), dependencyName) != 0)
+      if (IsListed(cluster, dependencyName) != 0)
         result = -1;
       continue;
     }

@@ -125,6 +125,15 @@ private:
   bool BindClusapi();
   bool BindResutils();
   bool IsNodeRunning();
+  // Runs `body` with the cluster opened for it (closed afterwards); `failed`
+  // when the cluster does not open.
+  template <typename R, typename Body> R WithCluster(R failed, Body body);
+  // Runs `body` with the cluster and the wide form of `name`; -1 when the name
+  // does not convert, the node's cluster service is not running or the
+  // cluster does not open.
+  template <typename Body> int32_t WithNamedInRunningCluster(const char *name, Body body);
+  int32_t ReadDependencies(HCLUSTER cluster, const WCHAR *wideName, ClusterResourceList &dependencies);
+  int32_t AddDependencies(HCLUSTER cluster, const WCHAR *wideName, const ClusterResourceList &dependencies);
   // Appends resource `name` to `found` when its type name is exactly
   // `wideType`; false when its type or group cannot be read.
   bool AppendIfOfType(HCLUSTER cluster, const WCHAR *name, const WCHAR *wideType, ClusterResourceList &found);
