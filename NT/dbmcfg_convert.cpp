@@ -1,6 +1,7 @@
 // The converters: the general one every conversion starts with, and the server
 // rules that the same-type merge and the type-1, type-3 and type-5 converters
 // add to it. A is the target image, B the source image.
+#include "NT/dbmcfg_fields.h"
 #include "NT/dbmcfg_internal.h"
 
 #include <algorithm>
@@ -11,26 +12,6 @@ namespace kxldbm {
 
 namespace {
 
-// Field: always copied. Block: copied when its first source byte is not zero.
-// String: a NUL-terminated text copied with its terminator, never past `size`.
-enum class Copy : uint8_t { Field, Block, String };
-
-struct CopyStep {
-  Copy kind;
-  uint16_t offset;
-  uint16_t size;
-};
-
-constexpr CopyStep field(uint16_t offset, uint16_t size) {
-  return {Copy::Field, offset, size};
-}
-constexpr CopyStep block(uint16_t offset, uint16_t size) {
-  return {Copy::Block, offset, size};
-}
-constexpr CopyStep text(uint16_t offset, uint16_t size) {
-  return {Copy::String, offset, size};
-}
-
 void copyString(unsigned char *a, const unsigned char *b, uint32_t offset, uint32_t size) {
   const void *end = std::memchr(b + offset, '\0', size - 1);
   size_t length = end != nullptr ? static_cast<const unsigned char *>(end) - (b + offset) : size - 1;
@@ -38,12 +19,14 @@ void copyString(unsigned char *a, const unsigned char *b, uint32_t offset, uint3
   a[offset + length] = '\0';
 }
 
-void applyCopies(unsigned char *a, const unsigned char *b, std::span<const CopyStep> steps) {
-  for (const CopyStep &step : steps) {
-    if (step.kind == Copy::String)
-      copyString(a, b, step.offset, step.size);
-    else if (step.kind == Copy::Field || b[step.offset] != 0)
-      std::memcpy(a + step.offset, b + step.offset, step.size);
+// Each field as its form says: a scalar always, a block when its first byte is
+// set, a string bounded by its field.
+void applyCopies(unsigned char *a, const unsigned char *b, std::span<const Field> fields) {
+  for (const Field &field : fields) {
+    if (field.form == Form::Text)
+      copyString(a, b, field.offset, field.size);
+    else if (field.form != Form::Block || b[field.offset] != 0)
+      std::memcpy(a + field.offset, b + field.offset, field.size);
   }
 }
 
@@ -51,53 +34,39 @@ void applyCopies(unsigned char *a, const unsigned char *b, std::span<const CopyS
 
 constexpr uint16_t kLevelNames = 8200;   // long names, extra strings
 constexpr uint16_t kLevelPlugins = 8102; // value at 3436 and the short name at 3440
-constexpr uint16_t kLongName = 128;      // long name field, followed by its terminator
-constexpr uint16_t kShortName = 8;       // name field of the older levels
-constexpr uint16_t kNames[] = {458, 2625, 2754};
-constexpr uint16_t kShortNames[] = {679, 1040, 1057}; // older home of each of kNames
-constexpr uint16_t kLongNameExtra = 2883;
-constexpr uint16_t kShortNameExtra = 3440;
-constexpr uint16_t kCodeBlock = 1076; // 20 bytes; "0" in its first byte means unset
-constexpr uint16_t kCodeBlockSize = 20;
-constexpr uint16_t kNodeBlock = 52; // 9 bytes, not carried into a type-5 target
-constexpr uint16_t kNodeBlockSize = 9;
-constexpr uint16_t kMode = 1930;
-constexpr uint16_t kModeFlagA = 3434;
-constexpr uint16_t kModeFlagB = 3432;
-constexpr uint16_t kSwitch86 = 86;
+constexpr Field kNames[] = {kName458, kName2625, kName2754};
+constexpr Field kOldNames[] = {kOldName679, kOldName1040, kOldName1057}; // older home of each of kNames
 
-constexpr CopyStep kLeadCopies[] = {field(36, 2), field(794, 2), field(796, 2), field(1034, 2),
-                                    block(3392, 24)};
-constexpr CopyStep kDescriptionCopies[] = {block(396, 26)};
-constexpr CopyStep kBlockCopies[] = {block(1096, 9), block(818, 216), block(9370, 216)};
-constexpr CopyStep kValueCopies[] = {field(22, 2), block(422, 36), field(46, 2),  field(86, 2),
-                                     field(50, 2), field(84, 2),   field(3124, 4)};
-constexpr CopyStep kTailCopies[] = {field(3416, 2), field(3424, 8)};
-constexpr CopyStep kLevelCopies[] = {field(3436, 4)};
-constexpr CopyStep kNamedLevelCopies[] = {text(2204, 33),  text(2237, 33), text(2270, 33), text(2303, 33),
-                                          text(2336, 256), text(2592, 33), field(3388, 2), field(3390, 2)};
-constexpr CopyStep kRelease11Copies[] = {field(3464, 4)};
-constexpr CopyStep kRelease12Copies[] = {text(1128, 802)};
-constexpr CopyStep kRelease13Copies[] = {
-    text(3468, 1024), text(4492, 1024), text(5516, 1024), text(6540, 15), text(6555, 256),
-    text(6811, 256),  text(7067, 1024), text(8091, 1029), field(9120, 8), field(1942, 2)};
+constexpr Field kLeadCopies[] = {kU16_36, kU16_794, kU16_796, kU16_1034, kBlock3392};
+constexpr Field kDescriptionCopies[] = {kBlock396};
+constexpr Field kBlockCopies[] = {kBlock1096, kBlock818, kBlock9370};
+constexpr Field kValueCopies[] = {kU16_22, kBlock422, kU16_46, kSwitch86, kI16_50, kU16_84, kI32_3124};
+constexpr Field kTailCopies[] = {kU16_3416, kU64_3424};
+constexpr Field kLevelCopies[] = {kU32_3436};
+constexpr Field kNamedLevelCopies[] = {kText2204, kText2237, kText2270, kText2303,
+                                       kText2336, kText2592, kU16_3388, kU16_3390};
+constexpr Field kRelease11Copies[] = {kI32_3464};
+constexpr Field kRelease12Copies[] = {kText1128};
+constexpr Field kRelease13Copies[] = {kText3468, kText4492, kText5516, kText6540, kText6555,
+                                      kText6811, kText7067, kText8091, kU64_9120, kU16_1942};
 
-void copyLongName(unsigned char *a, const unsigned char *b, uint16_t offset) {
-  if (b[offset] == 0)
+void copyLongName(unsigned char *a, const unsigned char *b, const Field &name) {
+  if (b[name.offset] == 0)
     return;
-  std::memcpy(a + offset, b + offset, kLongName);
-  a[offset + kLongName] = '\0';
+  std::memcpy(a + name.offset, b + name.offset, name.size);
+  a[name.offset + name.size] = '\0';
 }
 
-// An 8-byte name of an older level, put into its new field and, when asked,
-// kept in its old one too.
-void copyShortName(unsigned char *a, const unsigned char *b, uint16_t from, uint16_t to, bool keepOld) {
-  if (b[from] == 0)
+// A name of an older level, put into its new field and, when asked, kept in
+// its old one too.
+void copyShortName(unsigned char *a, const unsigned char *b, const Field &from, const Field &to,
+                   bool keepOld) {
+  if (b[from.offset] == 0)
     return;
-  std::memcpy(a + to, b + from, kShortName);
+  std::memcpy(a + to.offset, b + from.offset, from.size);
   if (keepOld)
-    std::memcpy(a + from, b + from, kShortName);
-  a[to + kShortName] = '\0';
+    std::memcpy(a + from.offset, b + from.offset, from.size);
+  a[to.offset + from.size] = '\0';
 }
 
 void copyNames(unsigned char *a, const unsigned char *b) {
@@ -106,31 +75,32 @@ void copyNames(unsigned char *a, const unsigned char *b) {
     if (longNames)
       copyLongName(a, b, kNames[i]);
     else
-      copyShortName(a, b, kShortNames[i], kNames[i], true);
+      copyShortName(a, b, kOldNames[i], kNames[i], true);
   }
 }
 
 // Trailing blanks of a name become NULs; its first character stays.
-void trimName(unsigned char *a, uint16_t offset) {
-  const void *end = std::memchr(a + offset, '\0', kLongName + 1);
-  size_t length = end != nullptr ? static_cast<const unsigned char *>(end) - (a + offset) : kLongName + 1;
-  for (size_t at = length; at > 1 && a[offset + at - 1] == ' '; --at)
-    a[offset + at - 1] = '\0';
+void trimName(unsigned char *a, const Field &name) {
+  const uint32_t bound = name.size + 1u; // the name and its terminator
+  const void *end = std::memchr(a + name.offset, '\0', bound);
+  size_t length = end != nullptr ? static_cast<const unsigned char *>(end) - (a + name.offset) : bound;
+  for (size_t at = length; at > 1 && a[name.offset + at - 1] == ' '; --at)
+    a[name.offset + at - 1] = '\0';
 }
 
 // The mode at 1930 keeps only its newer values; the two flags beside it take
 // over what the dropped values meant.
 void convertMode(unsigned char *a, const unsigned char *b) {
-  uint16_t mode = get16(b, kMode);
+  uint16_t mode = get16(b, kMode.offset);
   uint16_t mapped = mode;
   if (mode == 2)
     mapped = 0;
   else if (mode == 3 || mode == 5 || mode == 6)
     mapped = 4;
-  put16(a, kMode, mapped);
-  bool switched = static_cast<int16_t>(get16(b, kSwitch86)) == 1 && (mode == 5 || mode == 2);
-  put16(a, kModeFlagA, switched ? 1 : get16(b, kModeFlagA));
-  put16(a, kModeFlagB, mode == 2 ? 1 : get16(b, kModeFlagB));
+  put16(a, kMode.offset, mapped);
+  bool switched = static_cast<int16_t>(get16(b, kSwitch86.offset)) == 1 && (mode == 5 || mode == 2);
+  put16(a, kModeFlagA.offset, switched ? 1 : get16(b, kModeFlagA.offset));
+  put16(a, kModeFlagB.offset, mode == 2 ? 1 : get16(b, kModeFlagB.offset));
 }
 
 void copyLevelFields(unsigned char *a, const unsigned char *b) {
@@ -139,10 +109,10 @@ void copyLevelFields(unsigned char *a, const unsigned char *b) {
     return;
   applyCopies(a, b, kLevelCopies);
   if (level >= kLevelNames) {
-    copyLongName(a, b, kLongNameExtra);
+    copyLongName(a, b, kName2883);
     applyCopies(a, b, kNamedLevelCopies);
   } else {
-    copyShortName(a, b, kShortNameExtra, kLongNameExtra, false);
+    copyShortName(a, b, kOldName3440, kName2883, false);
   }
 }
 
@@ -173,41 +143,23 @@ constexpr ServerVariant kType1Variant{true, true, true, Tuning::Only3118};
 constexpr ServerVariant kType3Variant{true, true, true, Tuning::None};
 constexpr ServerVariant kType5Variant{true, true, false, Tuning::None};
 
-constexpr uint16_t kAgents = 1074;
 constexpr uint16_t kAgentFloor = 66;
 constexpr uint16_t kAgentFloorType3 = 46;
-constexpr uint16_t kHeap = 88;
-constexpr uint16_t kHeapCopy = 1948;
-constexpr uint16_t kPool = 3092;
 constexpr uint32_t kPoolFloor = 895;
-constexpr uint16_t kPoolBest = 3460;
-constexpr uint16_t kPoolSizes[] = {3096, 3100, 3104};
-constexpr uint16_t kReset1126 = 1126;
-constexpr uint16_t kMemory = 76;
-constexpr uint16_t kMemoryB = 80;
-constexpr uint16_t kShare = 3088;
-constexpr uint16_t kFree = 3084;
-constexpr uint16_t kReserved = 3080;
-constexpr uint16_t kSwitch38 = 38;
-constexpr uint16_t kLimit = 10908;
-constexpr uint16_t kLimitOld = 3456;
+constexpr Field kPoolSizes[] = {kPoolSize3096, kPoolSize3100, kPoolSize3104};
 constexpr uint32_t kUnset = 0xFFFFFFFFu;
 
 // Plain copies of the server rules; none of them touches a field that a later
 // rule reads or changes, except 3084 and 3088, which rule 11 then rewrites.
-constexpr CopyStep kServerCopies[] = {
-    field(44, 2),   field(62, 2),   field(98, 2),   block(180, 216), field(68, 4),     field(72, 4),
-    field(808, 4),  field(812, 4),  field(798, 2),  field(1106, 2),  field(1038, 2),   field(816, 2),
-    field(800, 4),  field(804, 4),  field(1968, 8), field(1976, 1),  field(1932, 4),   field(1936, 4),
-    field(64, 4),   field(3088, 4), field(92, 4),   field(3456, 4),  field(96, 2),     block(100, 15),
-    field(3084, 4), field(24, 4),   field(3080, 4), field(38, 2),    block(1977, 227), field(32, 4),
-    field(1944, 4), field(3108, 4), field(1940, 2), field(84, 2)};
-constexpr CopyStep kPoolCopies[] = {field(kPoolBest, 4), field(kPool, 4)};
-constexpr CopyStep kRemoteCopies[] = {field(48, 2), block(696, 49), block(1108, 5), block(745, 49),
-                                      block(115, 65)};
-constexpr CopyStep kTuningCopies[] = {field(3112, 2), field(3114, 2), field(3116, 2), field(3118, 2),
-                                      field(3120, 4)};
-constexpr CopyStep kTuning3118[] = {field(3118, 2)};
+constexpr Field kServerCopies[] = {
+    kU16_44,   kU16_62,    kI16_98,  kBlock180, kU32_68,   kU32_72,   kF32_808,  kI32_812,  kU16_798,
+    kU16_1106, kU16_1038,  kU16_816, kU32_800,  kI32_804,  kU64_1968, kByte1976, kI32_1932, kI32_1936,
+    kU32_64,   kShare,     kI32_92,  kLimitOld, kU16_96,   kBlock100, kFree,     kI32_24,   kReserved,
+    kSwitch38, kBlock1977, kI32_32,  kI32_1944, kU32_3108, kU16_1940, kU16_84};
+constexpr Field kPoolCopies[] = {kPoolBest, kPool};
+constexpr Field kRemoteCopies[] = {kU16_48, kBlock696, kBlock1108, kBlock745, kBlock115};
+constexpr Field kTuningCopies[] = {kU16_3112, kU16_3114, kU16_3116, kU16_3118, kF32_3120};
+constexpr Field kTuning3118[] = {kU16_3118};
 
 const ServerVariant &variantOf(Converter converter) {
   switch (converter) {
@@ -224,7 +176,7 @@ const ServerVariant &variantOf(Converter converter) {
 
 void copyAgents(unsigned char *a, const unsigned char *b, const ServerVariant &variant) {
   uint16_t floor = variant.lowerAgentFloorFromType3 && nodeType(b) == 3 ? kAgentFloorType3 : kAgentFloor;
-  put16(a, kAgents, std::max(get16(b, kAgents), floor));
+  put16(a, kAgents.offset, std::max(get16(b, kAgents.offset), floor));
 }
 
 // Older sources had three pool sizes; the largest becomes the one pool, and the
@@ -234,14 +186,14 @@ void convertPools(unsigned char *a, const unsigned char *b, const ServerInputs &
     applyCopies(a, b, kPoolCopies);
     return;
   }
-  int32_t largest = static_cast<int32_t>(get32(b, kPoolSizes[0]));
-  for (uint16_t offset : kPoolSizes) {
-    largest = std::max(largest, static_cast<int32_t>(get32(b, offset)));
-    put32(a, offset, 0);
+  int32_t largest = static_cast<int32_t>(get32(b, kPoolSizes[0].offset));
+  for (const Field &size : kPoolSizes) {
+    largest = std::max(largest, static_cast<int32_t>(get32(b, size.offset)));
+    put32(a, size.offset, 0);
   }
-  put32(a, kPoolBest, static_cast<uint32_t>(largest));
-  uint32_t pool = get32(b, kPool);
-  put32(a, kPool, inputs.partitionDivisor != 0 ? pool / inputs.partitionDivisor : pool);
+  put32(a, kPoolBest.offset, static_cast<uint32_t>(largest));
+  uint32_t pool = get32(b, kPool.offset);
+  put32(a, kPool.offset, inputs.partitionDivisor != 0 ? pool / inputs.partitionDivisor : pool);
 }
 
 void setFlag(unsigned char *a, int32_t index) {
@@ -257,15 +209,15 @@ void convertMemory(unsigned char *a, const unsigned char *b, const ServerVariant
     std::memcpy(a + kFlagArea, b + kFlagArea, kFlagAreaSize);
     return;
   }
-  put32(a, kMemory, 0);
-  put32(a, kMemoryB, 0);
-  if (get32(a, kShare) == kUnset)
-    put32(a, kShare, get32(b, kMemory) >> 1);
+  put32(a, kMemory.offset, 0);
+  put32(a, kMemoryB.offset, 0);
+  if (get32(a, kShare.offset) == kUnset)
+    put32(a, kShare.offset, get32(b, kMemory.offset) >> 1);
   setFlag(a, inputs.flagIndex803);
   setFlag(a, inputs.flagIndex79);
-  if (get32(b, kFree) == kUnset) {
-    bool subtract = !variant.subtract3080Only38 || static_cast<int16_t>(get16(b, kSwitch38)) == 1;
-    put32(a, kFree, get32(b, kMemory) - (subtract ? get32(b, kReserved) : 0));
+  if (get32(b, kFree.offset) == kUnset) {
+    bool subtract = !variant.subtract3080Only38 || static_cast<int16_t>(get16(b, kSwitch38.offset)) == 1;
+    put32(a, kFree.offset, get32(b, kMemory.offset) - (subtract ? get32(b, kReserved.offset) : 0));
   }
 }
 
@@ -281,14 +233,14 @@ void copyTuning(unsigned char *a, const unsigned char *b, Tuning tuning) {
 void convertGeneral(unsigned char *a, const unsigned char *b) {
   applyCopies(a, b, kLeadCopies);
   copyNames(a, b);
-  for (uint16_t offset : kNames)
-    trimName(a, offset);
+  for (const Field &name : kNames)
+    trimName(a, name);
   applyCopies(a, b, kDescriptionCopies);
-  if (b[kCodeBlock] != '0')
-    std::memcpy(a + kCodeBlock, b + kCodeBlock, kCodeBlockSize);
+  if (b[kCodeBlock.offset] != '0')
+    std::memcpy(a + kCodeBlock.offset, b + kCodeBlock.offset, kCodeBlock.size);
   applyCopies(a, b, kBlockCopies);
-  if (b[kNodeBlock] != 0 && nodeType(a) != 5)
-    std::memcpy(a + kNodeBlock, b + kNodeBlock, kNodeBlockSize);
+  if (b[kNodeBlock.offset] != 0 && nodeType(a) != 5)
+    std::memcpy(a + kNodeBlock.offset, b + kNodeBlock.offset, kNodeBlock.size);
   applyCopies(a, b, kValueCopies);
   convertMode(a, b);
   applyCopies(a, b, kTailCopies);
@@ -300,14 +252,14 @@ void applyServerRules(unsigned char *a, const unsigned char *b, Converter conver
                       const ServerInputs &inputs) {
   const ServerVariant &variant = variantOf(converter);
   applyCopies(a, b, kServerCopies);
-  put32(a, kHeap, get32(b, kHeap));
-  put32(a, kHeapCopy, get32(b, kHeap));
+  put32(a, kHeap.offset, get32(b, kHeap.offset));
+  put32(a, kHeapCopy.offset, get32(b, kHeap.offset));
   copyAgents(a, b, variant);
   convertPools(a, b, inputs);
-  put32(a, kPool, std::max(get32(a, kPool), kPoolFloor));
-  put16(a, kReset1126, 0);
+  put32(a, kPool.offset, std::max(get32(a, kPool.offset), kPoolFloor));
+  put16(a, kI16_1126.offset, 0);
   convertMemory(a, b, variant, inputs);
-  put32(a, kLimit, get32(b, releaseCode(b) < kRelease13 ? kLimitOld : kLimit));
+  put32(a, kLimit.offset, get32(b, releaseCode(b) < kRelease13 ? kLimitOld.offset : kLimit.offset));
   if (variant.carryRemote)
     applyCopies(a, b, kRemoteCopies);
   copyTuning(a, b, variant.tuning);

@@ -1,6 +1,7 @@
 // upgradeDbmConfig: loads both files, picks the converter from the two node
 // types, finishes the image and rewrites the target.
 #include "NT/dbmcfg.h"
+#include "NT/dbmcfg_fields.h"
 #include "NT/dbmcfg_internal.h"
 #include "upgrade/errortrace.h"
 
@@ -13,8 +14,6 @@ namespace kxldbm {
 namespace {
 
 constexpr uint16_t kMaxNodeType = 5;
-constexpr uint16_t kCarriedBlock = 3128; // 256 bytes, carried between files of one release
-constexpr uint32_t kCarriedBlockSize = 256;
 
 constexpr uint32_t kProbeSource = 10;
 constexpr uint32_t kProbeTarget = 20;
@@ -65,8 +64,8 @@ int32_t convertImages(unsigned char *target, const unsigned char *source, const 
   convertGeneral(target, source);
   if (needsServerInputs(converter))
     applyServerRules(target, source, converter, inputs);
-  if (source[kCarriedBlock] != 0 && releaseCode(source) == releaseCode(target))
-    std::memcpy(target + kCarriedBlock, source + kCarriedBlock, kCarriedBlockSize);
+  if (source[kCarriedBlock.offset] != 0 && releaseCode(source) == releaseCode(target))
+    std::memcpy(target + kCarriedBlock.offset, source + kCarriedBlock.offset, kCarriedBlock.size);
   rangeCheck(target);
   sealImage(target);
   return 0;
