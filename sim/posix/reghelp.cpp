@@ -11,12 +11,14 @@ LONG Key::open(HKEY root, const std::string &path, REGSAM access) {
   return RegOpenKeyExA(root, path.c_str(), 0, access, &key_);
 }
 
-LONG Key::create(HKEY root, const std::string &path) {
-  return RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_ALL_ACCESS, nullptr,
-                         &key_, nullptr);
+LONG Key::create(HKEY root, const std::string &path, REGSAM access) {
+  return RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, access, nullptr, &key_,
+                         nullptr);
 }
 
 namespace {
+
+constexpr DWORD kMaxQueriedBytes = 4096;
 
 // The raw data of a value and its type; false when it is missing.
 bool readRaw(HKEY root, const std::string &path, const char *value, DWORD &type, std::string &data) {
@@ -38,7 +40,7 @@ bool readRaw(HKEY root, const std::string &path, const char *value, DWORD &type,
 
 LONG writeRaw(HKEY root, const std::string &path, const char *value, DWORD type, const std::string &data) {
   Key key;
-  LONG rc = key.create(root, path);
+  LONG rc = key.create(root, path, KEY_SET_VALUE);
   if (rc != ERROR_SUCCESS)
     return rc;
   return RegSetValueExA(key.get(), value, 0, type, reinterpret_cast<const BYTE *>(data.data()),
@@ -51,9 +53,13 @@ std::string untilNul(const std::string &data) {
 
 } // namespace
 
-bool keyExists(HKEY root, const std::string &path) {
+LONG keyOpens(HKEY root, const std::string &path) {
   Key key;
-  return key.open(root, path) == ERROR_SUCCESS;
+  return key.open(root, path, KEY_QUERY_VALUE);
+}
+
+bool keyExists(HKEY root, const std::string &path) {
+  return keyOpens(root, path) == ERROR_SUCCESS;
 }
 
 bool readString(HKEY root, const std::string &path, const char *value, std::string &out) {
@@ -63,6 +69,24 @@ bool readString(HKEY root, const std::string &path, const char *value, std::stri
     return false;
   out = untilNul(data);
   return true;
+}
+
+LONG queryString(HKEY root, const std::string &path, const char *value, std::string &out) {
+  Key key;
+  LONG rc = key.open(root, path, KEY_QUERY_VALUE);
+  if (rc != ERROR_SUCCESS)
+    return rc;
+  std::vector<char> data(kMaxQueriedBytes + 1, '\0');
+  DWORD size = kMaxQueriedBytes;
+  DWORD type = REG_NONE;
+  rc = RegQueryValueExA(key.get(), value, nullptr, &type, reinterpret_cast<BYTE *>(data.data()), &size);
+  if (rc != ERROR_SUCCESS)
+    return rc;
+  if (type != REG_SZ && type != REG_EXPAND_SZ)
+    return ERROR_BAD_FORMAT;
+  data[size < kMaxQueriedBytes ? size : kMaxQueriedBytes] = '\0';
+  out.assign(data.data());
+  return ERROR_SUCCESS;
 }
 
 bool readDword(HKEY root, const std::string &path, const char *value, DWORD &out) {
@@ -130,6 +154,14 @@ LONG writeMultiString(HKEY root, const std::string &path, const char *value,
   return writeRaw(root, path, value, v.type, v.data);
 }
 
+LONG deleteValue(HKEY root, const std::string &path, const char *value) {
+  Key key;
+  LONG rc = key.open(root, path, KEY_SET_VALUE);
+  if (rc != ERROR_SUCCESS)
+    return rc;
+  return RegDeleteValueA(key.get(), value);
+}
+
 #ifdef _WIN32
 LONG writeKey(HKEY root, const std::string &path, const std::vector<KeyValue> &values) {
   for (const KeyValue &value : values)
@@ -139,18 +171,29 @@ LONG writeKey(HKEY root, const std::string &path, const std::vector<KeyValue> &v
 }
 #endif
 
+LONG listSubkeys(HKEY root, const std::string &path, std::vector<std::string> &names) {
+  names.clear();
+  Key key;
+  LONG rc = key.open(root, path, KEY_ENUMERATE_SUB_KEYS | KEY_QUERY_VALUE);
+  if (rc == ERROR_FILE_NOT_FOUND)
+    return ERROR_SUCCESS;
+  if (rc != ERROR_SUCCESS)
+    return rc;
+  for (DWORD index = 0;; ++index) {
+    char name[256];
+    DWORD size = sizeof name;
+    rc = RegEnumKeyExA(key.get(), index, name, &size, nullptr, nullptr, nullptr, nullptr);
+    if (rc == ERROR_NO_MORE_ITEMS)
+      return ERROR_SUCCESS;
+    if (rc != ERROR_SUCCESS)
+      return rc;
+    names.emplace_back(name, size < sizeof name ? size : sizeof name - 1);
+  }
+}
+
 std::vector<std::string> subkeys(HKEY root, const std::string &path) {
   std::vector<std::string> names;
-  Key key;
-  if (key.open(root, path) != ERROR_SUCCESS)
-    return names;
-  char name[256];
-  for (DWORD index = 0;; ++index) {
-    DWORD length = sizeof name;
-    if (RegEnumKeyExA(key.get(), index, name, &length, nullptr, nullptr, nullptr, nullptr) != ERROR_SUCCESS)
-      break;
-    names.emplace_back(name, length);
-  }
+  listSubkeys(root, path, names);
   return names;
 }
 

@@ -6,8 +6,8 @@
 #include "sim/common/simfail.h"
 #include "sim/product/instances.h"
 #include "sim/product/nodes.h"
-#include "sim/product/regutil.h"
 #include "sim/product/simstore.h"
+#include "sim/product/text.h"
 #include "sim/product/winpath.h"
 
 #include <cstdlib>

@@ -17,12 +17,15 @@
 #include "platform/kxlsys.h"
 #include "sim/common/events.h"
 #include "sim/common/simfail.h"
-#include "sim/product/regutil.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/simstate.h"
+#include "sim/product/text.h"
 
 #include <cctype>
 #include <cstdio>
 #include <string>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace {
 
@@ -117,8 +120,8 @@ void clearSettings(SQLEX_AUDIT_SETTINGS &settings) {
 // The settings file of the current instance ("" when it has none).
 std::string instanceSettingsPath() {
   std::string directory;
-  if (currentInstance.empty() || kxlprod::readRegString(HKEY_LOCAL_MACHINE, kInstancesKey + currentInstance,
-                                                        "Directory", directory) != ERROR_SUCCESS)
+  if (currentInstance.empty() || reg::queryString(HKEY_LOCAL_MACHINE, kInstancesKey + currentInstance,
+                                                  "Directory", directory) != ERROR_SUCCESS)
     return std::string();
   return directory + "\\security\\kxlaudit.cfg";
 }
@@ -140,8 +143,7 @@ int32_t sqlosins(const char *instanceName) {
   if (instanceName == nullptr || instanceName[0] == '\0')
     return SQLO_RC_NOT_FOUND; // no instance to act on
   std::string name = instanceName;
-  if (name.size() >= SQLO_INSTANCE_NAME_SZ ||
-      !kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, kInstancesKey + name))
+  if (name.size() >= SQLO_INSTANCE_NAME_SZ || !reg::keyExists(HKEY_LOCAL_MACHINE, kInstancesKey + name))
     return SQLO_RC_NOT_FOUND;
   currentInstance = name;
   return 0;

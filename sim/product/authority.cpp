@@ -3,10 +3,13 @@
 // an administrator and which extras are installed.
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
-#include "sim/product/regutil.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/simstate.h"
+#include "sim/product/text.h"
 
 #include <string>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace {
 
@@ -42,7 +45,7 @@ int32_t sqleget_authid(char *buffer) {
     return SQLO_RC_INVALID_ARGUMENT;
   buffer[0] = '\0';
   std::string id;
-  if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, kxlprod::kIdentityKey, "AuthId", id) == ERROR_SUCCESS &&
+  if (reg::queryString(HKEY_LOCAL_MACHINE, kxlprod::kIdentityKey, "AuthId", id) == ERROR_SUCCESS &&
       !id.empty()) {
     kxlprod::copyBounded(id, buffer, SQLE_AUTHID_SZ);
     return 0;

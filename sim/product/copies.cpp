@@ -1,7 +1,10 @@
+#include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/regutil.h"
+#include "sim/product/text.h"
 
 #include <cstdlib>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace kxlprod {
 
@@ -25,12 +28,12 @@ bool isBelow(const std::string &file, const std::string &dir) {
 
 bool readV8Copy(CopyInfo &copy) {
   std::string version;
-  if (readRegString(HKEY_LOCAL_MACHINE, std::string(kProductRoot) + "\\CurrentVersion", "Version", version) !=
-          ERROR_SUCCESS ||
+  if (reg::queryString(HKEY_LOCAL_MACHINE, std::string(kProductRoot) + "\\CurrentVersion", "Version",
+                       version) != ERROR_SUCCESS ||
       std::atoi(version.c_str()) != 8)
     return false;
   std::string path;
-  if (readRegString(HKEY_LOCAL_MACHINE, kProductRoot, "KXL Path Name", path) != ERROR_SUCCESS)
+  if (reg::queryString(HKEY_LOCAL_MACHINE, kProductRoot, "KXL Path Name", path) != ERROR_SUCCESS)
     return false;
   copy = CopyInfo{kV8CopyName, withoutTrailingSeparator(path), true};
   return true;
@@ -45,10 +48,10 @@ LONG listCopies(std::vector<CopyInfo> &copies) {
     copies.push_back(v8);
   std::vector<std::string> names;
   std::string installed = std::string(kProductRoot) + "\\InstalledCopies";
-  LONG rc = listSubkeys(HKEY_LOCAL_MACHINE, installed, names);
+  LONG rc = reg::listSubkeys(HKEY_LOCAL_MACHINE, installed, names);
   for (const std::string &name : names) {
     std::string path;
-    if (readRegString(HKEY_LOCAL_MACHINE, installed + "\\" + name, "KXL Path Name", path) == ERROR_SUCCESS)
+    if (reg::queryString(HKEY_LOCAL_MACHINE, installed + "\\" + name, "KXL Path Name", path) == ERROR_SUCCESS)
       copies.push_back(CopyInfo{name, withoutTrailingSeparator(path), false});
   }
   return rc;

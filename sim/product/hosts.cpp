@@ -4,15 +4,18 @@
 // key does not resolve).
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/regutil.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
+#include "sim/product/text.h"
 
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
 #include <string>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace {
 
@@ -85,11 +88,10 @@ int32_t sqloPdbTcpIpResolveHostName(const char *hostName, char *resolvedName, ui
       std::strchr(hostName, '\\') != nullptr)
     return SQLO_RC_INVALID_ARGUMENT;
   std::string key = std::string(kxlprod::kSimRoot) + "\\Hosts\\" + hostName;
-  if (!kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, key))
+  if (!reg::keyExists(HKEY_LOCAL_MACHINE, key))
     return SQLO_RC_NOT_FOUND;
   std::string fullName;
-  if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "FullName", fullName) != ERROR_SUCCESS ||
-      fullName.empty())
+  if (reg::queryString(HKEY_LOCAL_MACHINE, key, "FullName", fullName) != ERROR_SUCCESS || fullName.empty())
     fullName = hostName;
   if (resolvedName != nullptr)
     kxlprod::copyBounded(fullName, resolvedName, SQLO_HOSTNAME_SZ);

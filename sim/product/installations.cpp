@@ -2,13 +2,16 @@
 // registry (SOFTWARE\ZAV\KXLSIM\Instances\<NAME>: "Directory", "Copy").
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/regutil.h"
+#include "sim/product/text.h"
 
 #include <cstring>
 #include <new>
 #include <string>
 #include <vector>
+
+namespace reg = kxlsim::posix::reg;
 
 struct OSSInstanceList {
   std::vector<std::string> names;
@@ -34,11 +37,11 @@ EntryRead readInstance(const std::string &name, const std::vector<CopyInfo> &cop
                        OSSInstanceInfo_t &info) {
   std::string key = instancesKey() + "\\" + name;
   std::string directory;
-  LONG rc = kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Directory", directory);
+  LONG rc = reg::queryString(HKEY_LOCAL_MACHINE, key, "Directory", directory);
   if (rc != ERROR_SUCCESS)
     return rc == ERROR_FILE_NOT_FOUND ? EntryRead::absent : EntryRead::failed;
   std::string copyName;
-  rc = kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "Copy", copyName);
+  rc = reg::queryString(HKEY_LOCAL_MACHINE, key, "Copy", copyName);
   if (rc != ERROR_SUCCESS && rc != ERROR_FILE_NOT_FOUND)
     return EntryRead::failed;
   std::memset(&info, 0, sizeof info);
@@ -67,7 +70,7 @@ EntryRead readInstance(const std::string &name, OSSInstanceInfo_t &info) {
 // The instance's registry name as stored (case preserved), found ignoring case.
 bool findInstanceName(const std::string &wanted, std::string &stored) {
   std::vector<std::string> names;
-  if (kxlprod::listSubkeys(HKEY_LOCAL_MACHINE, instancesKey(), names) != ERROR_SUCCESS)
+  if (reg::listSubkeys(HKEY_LOCAL_MACHINE, instancesKey(), names) != ERROR_SUCCESS)
     return false;
   for (const std::string &name : names) {
     if (kxlprod::sameName(name, wanted)) {
@@ -80,8 +83,8 @@ bool findInstanceName(const std::string &wanted, std::string &stored) {
 
 uint32_t adminServerInfo(OSSInstanceInfo_t &info) {
   std::string name;
-  if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, std::string(kxlprod::kSimRoot) + "\\AdminServer", "Name",
-                             name) != ERROR_SUCCESS ||
+  if (reg::queryString(HKEY_LOCAL_MACHINE, std::string(kxlprod::kSimRoot) + "\\AdminServer", "Name", name) !=
+          ERROR_SUCCESS ||
       name.empty())
     return OSS_RC_NOT_FOUND;
   std::string stored;
@@ -139,7 +142,7 @@ uint32_t ossOpenInstanceList(const char *product, OSSInstanceListHandle *handle,
   auto *list = new (std::nothrow) OSSInstanceList;
   if (list == nullptr)
     return OSS_RC_NO_MEMORY;
-  if (kxlprod::listSubkeys(HKEY_LOCAL_MACHINE, instancesKey(), list->names) != ERROR_SUCCESS) {
+  if (reg::listSubkeys(HKEY_LOCAL_MACHINE, instancesKey(), list->names) != ERROR_SUCCESS) {
     delete list;
     return OSS_RC_FAILED;
   }

@@ -12,17 +12,20 @@
 #include "platform/dbmcfgfile.h"
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/regutil.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
 #include "sim/product/svcfile.h"
+#include "sim/product/text.h"
 #include "sim/product/winpath.h"
 
 #include <cstdio>
 #include <cstring>
 #include <string>
 #include <vector>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace {
 
@@ -104,21 +107,21 @@ LONG writeService(const std::string &key, const CopyInfo &copy, const std::strin
     objectName = account;
   } else {
     std::string stored;
-    read = kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, "ObjectName", stored);
+    read = reg::queryString(HKEY_LOCAL_MACHINE, key, "ObjectName", stored);
     if (read == ERROR_SUCCESS)
       objectName = stored;
     else if (!absent(read))
       return read;
   }
-  LONG rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, key, "ImagePath", serverProgram(copy));
+  LONG rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "ImagePath", serverProgram(copy));
   if (rc == ERROR_SUCCESS)
-    rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, key, "DisplayName", displayName(copy, service));
+    rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "DisplayName", displayName(copy, service));
   if (rc == ERROR_SUCCESS)
-    rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, key, "ObjectName", objectName);
+    rc = reg::writeString(HKEY_LOCAL_MACHINE, key, "ObjectName", objectName);
   if (rc == ERROR_SUCCESS)
-    rc = kxlprod::writeRegDword(HKEY_LOCAL_MACHINE, key, "Start", start);
+    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "Start", start);
   if (rc == ERROR_SUCCESS)
-    rc = kxlprod::writeRegDword(HKEY_LOCAL_MACHINE, key, "State", kStoppedState);
+    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "State", kStoppedState);
   return rc;
 }
 
@@ -193,9 +196,9 @@ int32_t writeConfiguration(const CopyInfo &copy, const CreateRequest &request, c
 }
 
 int32_t registerInstance(const CopyInfo &copy, const CreateRequest &request, const Creation &c) {
-  LONG rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, c.entryKey, "Directory", c.directory);
+  LONG rc = reg::writeString(HKEY_LOCAL_MACHINE, c.entryKey, "Directory", c.directory);
   if (rc == ERROR_SUCCESS)
-    rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, c.entryKey, "Copy", copy.v8 ? "" : copy.name);
+    rc = reg::writeString(HKEY_LOCAL_MACHINE, c.entryKey, "Copy", copy.v8 ? "" : copy.name);
   HKEY profile = nullptr;
   if (rc == ERROR_SUCCESS)
     rc = RegCreateKeyExA(HKEY_LOCAL_MACHINE, c.profileKey.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE,
@@ -203,7 +206,7 @@ int32_t registerInstance(const CopyInfo &copy, const CreateRequest &request, con
   if (rc == ERROR_SUCCESS)
     RegCloseKey(profile);
   if (rc == ERROR_SUCCESS && request.clusterName != nullptr && request.clusterName[0] != '\0')
-    rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, c.profileKey, "KXLCLUSTER", request.clusterName);
+    rc = reg::writeString(HKEY_LOCAL_MACHINE, c.profileKey, "KXLCLUSTER", request.clusterName);
   // Client instances run no server; a partitioned instance gets one service per
   // partition entry instead.
   if (rc == ERROR_SUCCESS && request.nodeType != 2 && request.nodeType != 4)
@@ -273,7 +276,7 @@ int32_t createInstance(const CreateRequest &request, int32_t *textSearchReasonCo
 // Removes "<NAME>-<digits>" services of this machine.
 void removePartitionServices(const std::string &instance) {
   std::vector<std::string> names;
-  kxlprod::listSubkeys(HKEY_LOCAL_MACHINE, std::string(kxlprod::kSimRoot) + "\\Services", names);
+  reg::listSubkeys(HKEY_LOCAL_MACHINE, std::string(kxlprod::kSimRoot) + "\\Services", names);
   std::string prefix = instance + "-";
   for (const std::string &name : names) {
     bool digits = name.size() > prefix.size() &&
@@ -290,7 +293,7 @@ int32_t removeInstance(const std::string &instance, const char *instanceDir) {
   if (instanceDir != nullptr && instanceDir[0] != '\0')
     directory = kxlprod::unquotedPath(instanceDir);
   std::string serviceKey = kxlprod::serviceKeyPath("", instance);
-  bool hasService = kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, serviceKey);
+  bool hasService = reg::keyExists(HKEY_LOCAL_MACHINE, serviceKey);
   bool hasDirectory = !directory.empty() && kxlprod::isDirectoryPath(directory);
   if (!registered && !hasService && !hasDirectory)
     return SQLO_RC_NOT_FOUND;
@@ -326,8 +329,8 @@ bool partitionMachine(const char *hostName, std::string &prefix) {
   if (hostName == nullptr || hostName[0] == '\0')
     return kxlprod::machineKeyPrefix(nullptr, prefix);
   std::string computer;
-  if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, std::string(kxlprod::kSimRoot) + "\\Hosts\\" + hostName,
-                             "Computer", computer) != ERROR_SUCCESS)
+  if (reg::queryString(HKEY_LOCAL_MACHINE, std::string(kxlprod::kSimRoot) + "\\Hosts\\" + hostName,
+                       "Computer", computer) != ERROR_SUCCESS)
     return false;
   return kxlprod::machineKeyPrefix(computer.c_str(), prefix);
 }
@@ -453,7 +456,7 @@ int32_t sqlo_instance_delnode(const char *instanceName, int32_t node, const char
   if (!partitionMachine(hostName, prefix))
     return reportNode(out1, out2, SQLO_RC_MACHINE_UNREACHABLE);
   std::string key = kxlprod::serviceKeyPath(prefix, partitionService(instanceName, node));
-  if (!kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, key))
+  if (!reg::keyExists(HKEY_LOCAL_MACHINE, key))
     return reportNode(out1, out2, SQLO_RC_SVC_NOT_FOUND);
   SHDeleteKeyA(HKEY_LOCAL_MACHINE, key.c_str());
   return reportNode(out1, out2, 0);

@@ -6,10 +6,11 @@
 // (global level) of the current installation.
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/regutil.h"
 #include "sim/product/simstore.h"
 #include "sim/product/state.h"
+#include "sim/product/text.h"
 
 #include <cctype>
 #include <cstring>
@@ -17,6 +18,8 @@
 #include <new>
 #include <string>
 #include <vector>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace {
 
@@ -93,12 +96,12 @@ std::string writeKey(const CopyInfo &copy, const char *profile) {
   if (instance.empty())
     return kxlprod::globalProfileKey(copy);
   std::string key = kxlprod::profileKey(copy, instance);
-  return kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, key) ? key : std::string();
+  return reg::keyExists(HKEY_LOCAL_MACHINE, key) ? key : std::string();
 }
 
 bool readProfileValue(const CopyInfo &copy, const char *profile, const char *name, std::string &value) {
   for (const std::string &key : readKeys(copy, profile))
-    if (kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, name, value) == ERROR_SUCCESS)
+    if (reg::queryString(HKEY_LOCAL_MACHINE, key, name, value) == ERROR_SUCCESS)
       return true;
   return false;
 }
@@ -119,7 +122,7 @@ int32_t setValue(const CopyInfo &copy, const Variable &variable, const char *val
   std::string key = writeKey(copy, profile);
   if (key.empty())
     return SQLO_RC_PREG_NO_PROFILE;
-  LONG rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, key, variable.name, value != nullptr ? value : "");
+  LONG rc = reg::writeString(HKEY_LOCAL_MACHINE, key, variable.name, value != nullptr ? value : "");
   return rc == ERROR_SUCCESS ? 0 : SQLO_RC_IO_ERROR;
 }
 
@@ -127,7 +130,7 @@ int32_t unsetValue(const CopyInfo &copy, const Variable &variable, const char *p
   std::string key = writeKey(copy, profile);
   if (key.empty())
     return SQLO_RC_PREG_NO_PROFILE;
-  LONG rc = kxlprod::deleteRegValue(HKEY_LOCAL_MACHINE, key, variable.name);
+  LONG rc = reg::deleteValue(HKEY_LOCAL_MACHINE, key, variable.name);
   return rc == ERROR_SUCCESS || rc == ERROR_FILE_NOT_FOUND ? 0 : SQLO_RC_IO_ERROR;
 }
 
@@ -169,7 +172,7 @@ int32_t profileAction(uint32_t action, char *profileName) {
     return 0;
   case SQLO_PREG_FIRST:
     nextProfile = 0;
-    if (kxlprod::listSubkeys(HKEY_LOCAL_MACHINE, kxlprod::copyKey(copy) + "\\PROFILES", profileNames) !=
+    if (reg::listSubkeys(HKEY_LOCAL_MACHINE, kxlprod::copyKey(copy) + "\\PROFILES", profileNames) !=
         ERROR_SUCCESS)
       return SQLO_RC_IO_ERROR;
     return nextProfileName(profileName);

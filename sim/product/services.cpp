@@ -5,12 +5,14 @@
 // Its "State" dword holds the Windows service state.
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
-#include "sim/product/regutil.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
 
 #include <cstring>
 #include <string>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace {
 
@@ -70,7 +72,7 @@ int32_t sqloQueryKXLService(const char *serviceName, SQLO_SVC_OUT *out, const ch
     return SQLO_RC_MACHINE_UNREACHABLE;
   }
   std::string key = prefix + kServicesKey + serviceName;
-  if (!kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, key)) {
+  if (!reg::keyExists(HKEY_LOCAL_MACHINE, key)) {
     report(out, ERROR_SERVICE_DOES_NOT_EXIST, 0);
     return SQLO_RC_SVC_NOT_FOUND;
   }

@@ -1,10 +1,13 @@
 #include "sim/product/simstore.h"
 
+#include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/regutil.h"
 #include "sim/product/simstate.h"
+#include "sim/product/text.h"
 
 #include <cstring>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace kxlprod {
 
@@ -45,7 +48,7 @@ bool machineKeyPrefix(const char *machine, std::string &prefix) {
   if (std::strlen(machine) >= 16)
     return false;
   std::string key = std::string(kSimRoot) + "\\Machines\\" + machine;
-  if (!regKeyExists(HKEY_LOCAL_MACHINE, key))
+  if (!reg::keyExists(HKEY_LOCAL_MACHINE, key))
     return false;
   prefix = key + "\\";
   return true;
@@ -63,12 +66,12 @@ bool readInstanceEntry(const std::string &instance, std::string &directory, std:
   if (instance.empty())
     return false;
   std::string key = instanceRegistryKey(instance);
-  if (readRegString(HKEY_LOCAL_MACHINE, key, "Directory", directory) != ERROR_SUCCESS)
+  if (reg::queryString(HKEY_LOCAL_MACHINE, key, "Directory", directory) != ERROR_SUCCESS)
     return false;
   copy.clear();
   // No copy: the version-8 installation's. A copy that cannot be read is
   // never taken for that.
-  LONG rc = readRegString(HKEY_LOCAL_MACHINE, key, "Copy", copy);
+  LONG rc = reg::queryString(HKEY_LOCAL_MACHINE, key, "Copy", copy);
   return rc == ERROR_SUCCESS || rc == ERROR_FILE_NOT_FOUND;
 }
 
@@ -81,7 +84,7 @@ std::string processInstance() {
 }
 
 bool identityString(const char *name, std::string &value) {
-  return readRegString(HKEY_LOCAL_MACHINE, kIdentityKey, name, value) == ERROR_SUCCESS;
+  return reg::queryString(HKEY_LOCAL_MACHINE, kIdentityKey, name, value) == ERROR_SUCCESS;
 }
 
 std::string localComputerName() {
@@ -119,8 +122,8 @@ LONG writeWholeFile(const std::string &windowsPath, const std::vector<uint8_t> &
 
 KeySnapshot takeKeySnapshot(HKEY root, const std::string &path) {
   KeySnapshot snapshot;
-  RegKey key;
-  if (RegOpenKeyExA(root, path.c_str(), 0, KEY_QUERY_VALUE, key.out()) != ERROR_SUCCESS)
+  reg::Key key;
+  if (key.open(root, path, KEY_QUERY_VALUE) != ERROR_SUCCESS)
     return snapshot;
   snapshot.existed = true;
   KeySnapshot::Value value;
@@ -137,9 +140,8 @@ void restoreKeySnapshot(HKEY root, const std::string &path, const KeySnapshot &s
     return;
   }
   KeySnapshot now = takeKeySnapshot(root, path);
-  RegKey key;
-  if (RegCreateKeyExA(root, path.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE, KEY_ALL_ACCESS, nullptr,
-                      key.out(), nullptr) != ERROR_SUCCESS)
+  reg::Key key;
+  if (key.create(root, path) != ERROR_SUCCESS)
     return;
   // Values added since are removed only when the snapshot holds every value
   // the key had: an incomplete one must never cost a value.

@@ -5,12 +5,15 @@
 // presence only and never stored.
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
-#include "sim/product/regutil.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
+#include "sim/product/text.h"
 
 #include <cstring>
 #include <string>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace {
 
@@ -50,7 +53,7 @@ int32_t existingServiceKey(const char *serviceName, const char *machine, std::st
   }
   key = kxlprod::serviceKeyPath(prefix, serviceName);
   // A key that cannot be read is never taken for a service that is not there.
-  LONG rc = kxlprod::regKeyOpens(HKEY_LOCAL_MACHINE, key);
+  LONG rc = reg::keyOpens(HKEY_LOCAL_MACHINE, key);
   if (rc == ERROR_FILE_NOT_FOUND) {
     report(out, ERROR_SERVICE_DOES_NOT_EXIST);
     return SQLO_RC_SVC_NOT_FOUND;
@@ -66,7 +69,7 @@ bool readable(LONG rc) {
 
 LONG readText(const std::string &key, const char *name, char *buffer, size_t size) {
   std::string value;
-  LONG rc = kxlprod::readRegString(HKEY_LOCAL_MACHINE, key, name, value);
+  LONG rc = reg::queryString(HKEY_LOCAL_MACHINE, key, name, value);
   kxlprod::copyBounded(value, buffer, size);
   return rc;
 }
@@ -93,12 +96,12 @@ LONG applySettings(const std::string &key, uint32_t startType, const char *progr
                    const char *displayName) {
   LONG rc = ERROR_SUCCESS;
   if (startType != SQLO_SVC_NO_CHANGE)
-    rc = kxlprod::writeRegDword(HKEY_LOCAL_MACHINE, key, "Start", startType);
+    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "Start", startType);
   const std::pair<const char *, const char *> texts[] = {
       {"ImagePath", programPath}, {"ObjectName", account}, {"DisplayName", displayName}};
   for (const auto &[name, value] : texts)
     if (rc == ERROR_SUCCESS && given(value))
-      rc = kxlprod::writeRegString(HKEY_LOCAL_MACHINE, key, name, value);
+      rc = reg::writeString(HKEY_LOCAL_MACHINE, key, name, value);
   return rc;
 }
 
@@ -164,7 +167,7 @@ int32_t sqloRegisterNTService(const char *machine, const char *serviceName, cons
     return SQLO_RC_MACHINE_UNREACHABLE;
   }
   std::string key = kxlprod::serviceKeyPath(prefix, serviceName);
-  LONG opens = kxlprod::regKeyOpens(HKEY_LOCAL_MACHINE, key);
+  LONG opens = reg::keyOpens(HKEY_LOCAL_MACHINE, key);
   if (opens == ERROR_SUCCESS) {
     report(out, SQLO_RC_SVC_EXISTS);
     return SQLO_RC_SVC_EXISTS;
@@ -178,7 +181,7 @@ int32_t sqloRegisterNTService(const char *machine, const char *serviceName, cons
   LONG rc = applySettings(key, start, programPath, given(account) ? account : kDefaultAccount,
                           given(displayName) ? displayName : serviceName);
   if (rc == ERROR_SUCCESS)
-    rc = kxlprod::writeRegDword(HKEY_LOCAL_MACHINE, key, "State", kStoppedState);
+    rc = reg::writeDword(HKEY_LOCAL_MACHINE, key, "State", kStoppedState);
   report(out, 0);
   return codeForRegistry(rc, out);
 }

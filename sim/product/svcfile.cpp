@@ -5,9 +5,9 @@
 
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
-#include "sim/product/regutil.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
+#include "sim/product/text.h"
 
 #include <cstdio>
 #include <cstdlib>

@@ -4,11 +4,13 @@
 
 #include "platform/kxlsys.h"
 #include "sim/common/simfail.h"
+#include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/regutil.h"
 
 #include <cstdio>
 #include <cstring>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace kxlprod {
 namespace {
@@ -57,7 +59,7 @@ bool isWord(std::string_view text, std::size_t minLength, std::size_t maxLength,
 // The "Language" value of the machine identity, "" when absent.
 std::string identityLanguage() {
   std::string value;
-  readRegString(HKEY_LOCAL_MACHINE, std::string(kSimRoot) + "\\Identity", "Language", value);
+  reg::queryString(HKEY_LOCAL_MACHINE, std::string(kSimRoot) + "\\Identity", "Language", value);
   return value;
 }
 
@@ -90,6 +92,24 @@ bool readLine(HANDLE input, char *password, uint32_t size) {
 }
 
 } // namespace
+
+bool sameName(const std::string &a, const std::string &b) {
+  if (a.size() != b.size())
+    return false;
+  for (size_t i = 0; i < a.size(); ++i)
+    if (lower(a[i]) != lower(b[i]))
+      return false;
+  return true;
+}
+
+bool copyBounded(const std::string &text, char *buffer, size_t size) {
+  if (buffer == nullptr || size == 0)
+    return false;
+  size_t n = text.size() < size ? text.size() : size - 1;
+  std::memcpy(buffer, text.data(), n);
+  buffer[n] = '\0';
+  return n == text.size();
+}
 
 std::string normalizeLanguage(std::string_view locale) {
   std::string_view base = locale.substr(0, locale.find_first_of(".@"));

@@ -2,10 +2,18 @@
 // them directly.
 #pragma once
 
+#include <cstddef>
 #include <string>
 #include <string_view>
 
 namespace kxlprod {
+
+// Byte-wise equality ignoring ASCII case.
+bool sameName(const std::string &a, const std::string &b);
+
+// Copies `text` into `buffer` of `size` bytes, cut to fit and terminated.
+// Returns false when it had to be cut (or there is no room at all).
+bool copyBounded(const std::string &text, char *buffer, size_t size);
 
 // A locale text ("de_DE.UTF-8@euro", "de-de", "C") as a message directory
 // name: language in lower case, territory in upper case, codeset and

@@ -1,13 +1,16 @@
 #include "sim/product/tool_actions.h"
 
+#include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/regutil.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
+#include "sim/product/text.h"
 #include "sim/product/winpath.h"
 
 #include <cstdio>
 #include <sstream>
+
+namespace reg = kxlsim::posix::reg;
 
 namespace kxlsim {
 
@@ -72,9 +75,9 @@ void cleanProfiles(const std::string &copyName, const std::vector<std::string> &
     return;
   std::vector<std::string> profiles;
   std::string profilesKey = kxlprod::copyKey(copy) + "\\PROFILES";
-  kxlprod::listSubkeys(HKEY_LOCAL_MACHINE, profilesKey, profiles);
+  reg::listSubkeys(HKEY_LOCAL_MACHINE, profilesKey, profiles);
   for (const std::string &name : profiles)
-    if (!kxlprod::regKeyExists(HKEY_LOCAL_MACHINE, kxlprod::instanceRegistryKey(name)))
+    if (!reg::keyExists(HKEY_LOCAL_MACHINE, kxlprod::instanceRegistryKey(name)))
       SHDeleteKeyA(HKEY_LOCAL_MACHINE, (profilesKey + "\\" + name).c_str());
 }
 
