@@ -1,5 +1,7 @@
 #include "cluster/mscsutil.h"
 
+#include "install/ilist.h"
+
 #include <algorithm>
 #include <cstring>
 #include <iterator>
@@ -87,17 +89,6 @@ bool makeEntry(const WCHAR *name, const WCHAR *group, ClusterResourceEntry &entr
 
 bool sameText(const WCHAR *left, const WCHAR *right) {
   return std::basic_string_view<WCHAR>(left) == std::basic_string_view<WCHAR>(right);
-}
-
-WCHAR foldAscii(WCHAR c) {
-  return c >= 'A' && c <= 'Z' ? static_cast<WCHAR>(c - 'A' + 'a') : c;
-}
-
-// Cluster object names compare ignoring case.
-bool sameName(const WCHAR *left, const WCHAR *right) {
-  for (; *left != 0 && foldAscii(*left) == foldAscii(*right); ++left, ++right) {
-  }
-  return foldAscii(*left) == foldAscii(*right);
 }
 
 // Reads one DWORD of a property list at `at`, moving past it; false past the end.
@@ -348,10 +339,11 @@ bool MSCSUtil::AppendIfOfType(HCLUSTER cluster, const WCHAR *name, const WCHAR *
   return true;
 }
 
+// Cluster object names compare ignoring case.
 int32_t MSCSUtil::IsListed(HCLUSTER cluster, const WCHAR *name) {
   bool listed = false;
   if (!ForEachResource(cluster, [&](const WCHAR *listedAs) {
-        listed = sameName(listedAs, name);
+        listed = kxliSameText(listedAs, name, SIZE_MAX);
         return !listed;
       }))
     return -1;

@@ -22,15 +22,16 @@ inline constexpr uint32_t KXLI_COPY_NAME_SZ = 65;
 // Name of the version-8 installation in the list of copies.
 inline constexpr const char KXLI_V8_COPY_NAME[] = "KXLV8";
 
-inline char kxliUpper(char c) {
-  return c >= 'a' && c <= 'z' ? static_cast<char>(c - 'a' + 'A') : c;
+template <typename C> C kxliUpper(C c) {
+  return c >= 'a' && c <= 'z' ? static_cast<C>(c - 'a' + 'A') : c;
 }
 
 // The command's one comparison ignoring case: equal over at most `limit`
-// characters (or up to the end of both). Made here, not with the library's
-// compare: a compare that failed would read as "different", and this machine
-// would be taken for another one.
-inline bool kxliSameText(const char *a, const char *b, size_t limit) {
+// characters (or up to the end of both), of single-byte text or of the wide
+// names the cluster hands out. Made here, not with the library's compare: a
+// compare that failed would read as "different", and this machine would be
+// taken for another one.
+template <typename C> bool kxliSameText(const C *a, const C *b, size_t limit) {
   for (size_t i = 0; i < limit; ++i) {
     if (kxliUpper(a[i]) != kxliUpper(b[i]))
       return false;
