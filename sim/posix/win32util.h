@@ -2,11 +2,14 @@
 #pragma once
 
 #include "platform/win32.h"
+#include "sim/common/names.h"
 
 #include <string>
 #include <string_view>
 
 namespace kxlsim::posix {
+
+using kxlsim::equalsIgnoringCase;
 
 // Error codes the surface reports that the public header does not list.
 constexpr DWORD kErrorDirectory = 267;
@@ -27,23 +30,6 @@ DWORD copyStringOut(std::string_view text, LPSTR buffer, DWORD capacity);
 // The Windows error for a failed host call on `host` (errno in `err`): a
 // missing file whose directory exists is 2, a missing directory is 3.
 DWORD win32ErrorFromErrno(int err, const std::string &host);
-
-// ASCII case-insensitive equality, as Windows compares names.
-inline bool equalsIgnoringCase(std::string_view a, std::string_view b) {
-  if (a.size() != b.size())
-    return false;
-  for (size_t i = 0; i < a.size(); ++i) {
-    unsigned char x = static_cast<unsigned char>(a[i]);
-    unsigned char y = static_cast<unsigned char>(b[i]);
-    if (x >= 'A' && x <= 'Z')
-      x = static_cast<unsigned char>(x - 'A' + 'a');
-    if (y >= 'A' && y <= 'Z')
-      y = static_cast<unsigned char>(y - 'A' + 'a');
-    if (x != y)
-      return false;
-  }
-  return true;
-}
 
 // Maps a Windows path into the world; sets ERROR_PATH_NOT_FOUND when it
 // cannot lie there.

@@ -3,11 +3,11 @@
 // "kxlnodes.cfg" of its directory; any other instance has partition 0 on this
 // machine. The table has the node list layout (platform/kxlsys.h).
 #include "platform/kxlsys.h"
+#include "sim/common/names.h"
 #include "sim/common/simfail.h"
 #include "sim/product/instances.h"
 #include "sim/product/nodes.h"
 #include "sim/product/simstore.h"
-#include "sim/product/text.h"
 #include "sim/product/winpath.h"
 
 #include <cstdlib>
@@ -38,7 +38,8 @@ std::vector<kxlprod::NodeLine> localPartition() {
 }
 
 bool isLocal(const kxlprod::NodeLine &node, const std::string &computer, const std::string &fullHost) {
-  return kxlprod::sameName(node.machine, computer) || kxlprod::sameName(node.host, fullHost);
+  return kxlsim::equalsIgnoringCase(node.machine, computer) ||
+         kxlsim::equalsIgnoringCase(node.host, fullHost);
 }
 
 // The partition this process works for: the lowest-numbered one of this

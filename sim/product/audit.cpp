@@ -16,10 +16,10 @@
 // Events go to the world's event log as {"event":"audit", ...}.
 #include "platform/kxlsys.h"
 #include "sim/common/events.h"
+#include "sim/common/names.h"
 #include "sim/common/simfail.h"
 #include "sim/posix/reghelp.h"
 #include "sim/product/simstate.h"
-#include "sim/product/text.h"
 
 #include <cctype>
 #include <cstdio>
@@ -51,13 +51,13 @@ bool parseOutcomes(const std::string &value, uint64_t &mask) {
     size_t comma = value.find(',', start);
     std::string word =
         trimmed(value.substr(start, comma == std::string::npos ? std::string::npos : comma - start));
-    if (kxlprod::sameName(word, "success"))
+    if (kxlsim::equalsIgnoringCase(word, "success"))
       mask |= 0x1;
-    else if (kxlprod::sameName(word, "failure"))
+    else if (kxlsim::equalsIgnoringCase(word, "failure"))
       mask |= 0x2;
-    else if (kxlprod::sameName(word, "both"))
+    else if (kxlsim::equalsIgnoringCase(word, "both"))
       mask |= 0x3;
-    else if (!kxlprod::sameName(word, "none"))
+    else if (!kxlsim::equalsIgnoringCase(word, "none"))
       return false;
     if (comma == std::string::npos)
       return true;
@@ -66,9 +66,9 @@ bool parseOutcomes(const std::string &value, uint64_t &mask) {
 }
 
 bool parseFlag(const std::string &value, const char *on, const char *off, unsigned char &out) {
-  if (kxlprod::sameName(value, on))
+  if (kxlsim::equalsIgnoringCase(value, on))
     out = 1;
-  else if (kxlprod::sameName(value, off))
+  else if (kxlsim::equalsIgnoringCase(value, off))
     out = 0;
   else
     return false;
@@ -76,9 +76,9 @@ bool parseFlag(const std::string &value, const char *on, const char *off, unsign
 }
 
 bool applySetting(const std::string &key, const std::string &value, SQLEX_AUDIT_SETTINGS &settings) {
-  if (kxlprod::sameName(key, "active"))
+  if (kxlsim::equalsIgnoringCase(key, "active"))
     return parseFlag(value, "yes", "no", settings.active);
-  if (kxlprod::sameName(key, "errortype"))
+  if (kxlsim::equalsIgnoringCase(key, "errortype"))
     return parseFlag(value, "audit", "normal", settings.errorType);
   struct ClassKey {
     const char *name;
@@ -89,7 +89,7 @@ bool applySetting(const std::string &key, const std::string &value, SQLEX_AUDIT_
                               {"objmaint", &settings.classMask3},
                               {"instance", &settings.classMask4}};
   for (const ClassKey &entry : classes)
-    if (kxlprod::sameName(key, entry.name))
+    if (kxlsim::equalsIgnoringCase(key, entry.name))
       return parseOutcomes(value, *entry.mask);
   return false;
 }

@@ -1,6 +1,6 @@
+#include "sim/common/names.h"
 #include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
-#include "sim/product/text.h"
 
 #include <cstdlib>
 
@@ -23,7 +23,7 @@ bool isBelow(const std::string &file, const std::string &dir) {
   if (dir.empty() || file.size() <= dir.size())
     return false;
   char next = file[dir.size()];
-  return (next == '\\' || next == '/') && sameName(file.substr(0, dir.size()), dir);
+  return (next == '\\' || next == '/') && kxlsim::equalsIgnoringCase(file.substr(0, dir.size()), dir);
 }
 
 bool readV8Copy(CopyInfo &copy) {
@@ -61,7 +61,7 @@ bool findCopy(const std::string &name, CopyInfo &copy) {
   std::vector<CopyInfo> copies;
   listCopies(copies);
   for (const CopyInfo &candidate : copies) {
-    if (sameName(candidate.name, name)) {
+    if (kxlsim::equalsIgnoringCase(candidate.name, name)) {
       copy = candidate;
       return true;
     }

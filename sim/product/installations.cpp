@@ -1,6 +1,7 @@
 // Installations: the current copy, switching between copies, and the instance
 // registry (SOFTWARE\ZAV\KXLSIM\Instances\<NAME>: "Directory", "Copy").
 #include "platform/kxlsys.h"
+#include "sim/common/names.h"
 #include "sim/common/simfail.h"
 #include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
@@ -53,7 +54,7 @@ EntryRead readInstance(const std::string &name, const std::vector<CopyInfo> &cop
   kxlprod::copyBounded(copyName, info.copyName, sizeof info.copyName);
   const std::string owner = copyName.empty() ? kxlprod::kV8CopyName : copyName;
   for (const CopyInfo &copy : copies) {
-    if (kxlprod::sameName(copy.name, owner)) {
+    if (kxlsim::equalsIgnoringCase(copy.name, owner)) {
       kxlprod::copyBounded(copy.path, info.installPath, sizeof info.installPath);
       break;
     }
@@ -73,7 +74,7 @@ bool findInstanceName(const std::string &wanted, std::string &stored) {
   if (reg::listSubkeys(HKEY_LOCAL_MACHINE, instancesKey(), names) != ERROR_SUCCESS)
     return false;
   for (const std::string &name : names) {
-    if (kxlprod::sameName(name, wanted)) {
+    if (kxlsim::equalsIgnoringCase(name, wanted)) {
       stored = name;
       return true;
     }
@@ -128,7 +129,7 @@ int32_t sqloSwitchToInstallationName(const char *copyName) {
   if (!kxlprod::findCopy(copyName, target))
     return SQLO_RC_NO_INSTALLATION;
   CopyInfo own;
-  bool isOwn = kxlprod::ownCopy(own) && kxlprod::sameName(own.name, target.name);
+  bool isOwn = kxlprod::ownCopy(own) && kxlsim::equalsIgnoringCase(own.name, target.name);
   kxlprod::setSwitchedCopy(isOwn ? std::string() : target.name);
   return 0;
 }

@@ -11,13 +11,13 @@
 #include "sim/product/instances.h"
 #include "platform/dbmcfgfile.h"
 #include "platform/kxlsys.h"
+#include "sim/common/names.h"
 #include "sim/common/simfail.h"
 #include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
 #include "sim/product/svcfile.h"
-#include "sim/product/text.h"
 #include "sim/product/winpath.h"
 
 #include <cstdio>
@@ -128,7 +128,7 @@ LONG writeService(const std::string &key, const CopyInfo &copy, const std::strin
 template <typename Record>
 typename std::vector<Record>::iterator findRecord(std::vector<Record> &records, const std::string &instance) {
   for (auto it = records.begin(); it != records.end(); ++it)
-    if (kxlprod::sameName(it->instance, instance))
+    if (kxlsim::equalsIgnoringCase(it->instance, instance))
       return it;
   return records.end();
 }
@@ -343,7 +343,7 @@ std::string partitionService(const std::string &instance, int32_t node) {
 
 auto findNode(const std::string &instance, int32_t node) {
   for (auto it = addedNodes.begin(); it != addedNodes.end(); ++it)
-    if (it->node == node && kxlprod::sameName(it->instance, instance))
+    if (it->node == node && kxlsim::equalsIgnoringCase(it->instance, instance))
       return it;
   return addedNodes.end();
 }

@@ -5,6 +5,7 @@
 // instance's profile key (instance level) or the copy's GLOBAL_PROFILE key
 // (global level) of the current installation.
 #include "platform/kxlsys.h"
+#include "sim/common/names.h"
 #include "sim/common/simfail.h"
 #include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
@@ -71,7 +72,7 @@ std::string currentInstance() {
 }
 
 bool isGlobalProfile(const char *profile) {
-  return profile != nullptr && kxlprod::sameName(profile, KXL_GLOBAL_PROFILE_NAME);
+  return profile != nullptr && kxlsim::equalsIgnoringCase(profile, KXL_GLOBAL_PROFILE_NAME);
 }
 
 // Keys a read looks in, in order.
@@ -277,7 +278,7 @@ int32_t sqloStr2Flag(const char *value) {
     return 0;
   static const char *const kTrue[] = {"1", "Y", "YES", "ON", "TRUE"};
   for (const char *word : kTrue)
-    if (kxlprod::sameName(value, word))
+    if (kxlsim::equalsIgnoringCase(value, word))
       return 1;
   return 0;
 }
@@ -296,7 +297,7 @@ int32_t sqloPRegMachineOpen(const char *machineName, SQLO_PREG_MACHINE **handle)
   if (machine == nullptr)
     return SQLO_RC_NO_MEMORY;
   kxlprod::copyBounded(name, machine->machineName, sizeof machine->machineName);
-  if (name.empty() || kxlprod::sameName(name, kxlprod::localComputerName())) {
+  if (name.empty() || kxlsim::equalsIgnoringCase(name, kxlprod::localComputerName())) {
     machine->hklm = HKEY_LOCAL_MACHINE;
   } else {
     std::string key = std::string(kxlprod::kSimRoot) + "\\Machines\\" + name;

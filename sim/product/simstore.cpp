@@ -1,9 +1,9 @@
 #include "sim/product/simstore.h"
 
+#include "sim/common/names.h"
 #include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
 #include "sim/product/simstate.h"
-#include "sim/product/text.h"
 
 #include <cstring>
 
@@ -34,7 +34,7 @@ LONG enumValue(HKEY key, DWORD index, KeySnapshot::Value &value) {
 
 bool inSnapshot(const KeySnapshot &snapshot, const std::string &name) {
   for (const KeySnapshot::Value &value : snapshot.values)
-    if (sameName(value.name, name))
+    if (kxlsim::equalsIgnoringCase(value.name, name))
       return true;
   return false;
 }
@@ -43,7 +43,7 @@ bool inSnapshot(const KeySnapshot &snapshot, const std::string &name) {
 
 bool machineKeyPrefix(const char *machine, std::string &prefix) {
   prefix.clear();
-  if (machine == nullptr || machine[0] == '\0' || sameName(machine, localComputerName()))
+  if (machine == nullptr || machine[0] == '\0' || kxlsim::equalsIgnoringCase(machine, localComputerName()))
     return true;
   if (std::strlen(machine) >= 16)
     return false;

@@ -4,10 +4,10 @@
 #include "sim/product/svcfile.h"
 
 #include "platform/kxlsys.h"
+#include "sim/common/names.h"
 #include "sim/common/simfail.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
-#include "sim/product/text.h"
 
 #include <cstdio>
 #include <cstdlib>
@@ -116,7 +116,7 @@ int32_t saveServicesFile(const ServicesFile &file) {
 
 bool findServiceEntry(const ServicesFile &file, const std::string &name, uint32_t &port) {
   for (const Entry &entry : entries(file)) {
-    if (sameName(entry.name, name)) {
+    if (kxlsim::equalsIgnoringCase(entry.name, name)) {
       port = entry.port;
       return true;
     }
@@ -146,7 +146,7 @@ bool removeServiceEntry(ServicesFile &file, const std::string &name) {
   bool removed = false;
   Entry entry;
   for (size_t i = file.lines.size(); i-- > 0;) {
-    if (parseEntry(file.lines[i], entry) && sameName(entry.name, name)) {
+    if (parseEntry(file.lines[i], entry) && kxlsim::equalsIgnoringCase(entry.name, name)) {
       file.lines.erase(file.lines.begin() + static_cast<std::ptrdiff_t>(i));
       removed = true;
     }

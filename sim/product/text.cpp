@@ -93,15 +93,6 @@ bool readLine(HANDLE input, char *password, uint32_t size) {
 
 } // namespace
 
-bool sameName(const std::string &a, const std::string &b) {
-  if (a.size() != b.size())
-    return false;
-  for (size_t i = 0; i < a.size(); ++i)
-    if (lower(a[i]) != lower(b[i]))
-      return false;
-  return true;
-}
-
 bool copyBounded(const std::string &text, char *buffer, size_t size) {
   if (buffer == nullptr || size == 0)
     return false;

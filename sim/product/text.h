@@ -8,9 +8,6 @@
 
 namespace kxlprod {
 
-// Byte-wise equality ignoring ASCII case.
-bool sameName(const std::string &a, const std::string &b);
-
 // Copies `text` into `buffer` of `size` bytes, cut to fit and terminated.
 // Returns false when it had to be cut (or there is no room at all).
 bool copyBounded(const std::string &text, char *buffer, size_t size);

@@ -1,10 +1,10 @@
 #include "sim/product/tool_actions.h"
 
+#include "sim/common/names.h"
 #include "sim/posix/reghelp.h"
 #include "sim/product/installation.h"
 #include "sim/product/simstate.h"
 #include "sim/product/simstore.h"
-#include "sim/product/text.h"
 #include "sim/product/winpath.h"
 
 #include <cstdio>
@@ -71,7 +71,7 @@ int upgradeSslConfig(const std::string &copyName, const std::vector<std::string>
 
 void cleanProfiles(const std::string &copyName, const std::vector<std::string> &args) {
   kxlprod::CopyInfo copy;
-  if (args.empty() || !kxlprod::sameName(args[0], "-cleanup") || !findCopyName(copyName, copy))
+  if (args.empty() || !kxlsim::equalsIgnoringCase(args[0], "-cleanup") || !findCopyName(copyName, copy))
     return;
   std::vector<std::string> profiles;
   std::string profilesKey = kxlprod::copyKey(copy) + "\\PROFILES";
