@@ -40,7 +40,8 @@ constexpr Field kOldNames[] = {kOldName679, kOldName1040, kOldName1057}; // olde
 constexpr Field kLeadCopies[] = {kU16_36, kU16_794, kU16_796, kU16_1034, kBlock3392};
 constexpr Field kDescriptionCopies[] = {kBlock396};
 constexpr Field kBlockCopies[] = {kBlock1096, kBlock818, kBlock9370};
-constexpr Field kValueCopies[] = {kU16_22, kBlock422, kU16_46, kSwitch86, kI16_50, kU16_84, kI32_3124};
+constexpr Field kValueCopies[] = {kU16_22, kBlock422, kWorkstationFlag, kSwitch86,
+                                  kI16_50, kU16_84,   kClientComponent};
 constexpr Field kTailCopies[] = {kU16_3416, kU64_3424};
 constexpr Field kLevelCopies[] = {kU32_3436};
 constexpr Field kNamedLevelCopies[] = {kText2204, kText2237, kText2270, kText2303,
@@ -152,13 +153,13 @@ constexpr uint32_t kUnset = 0xFFFFFFFFu;
 // Plain copies of the server rules; none of them touches a field that a later
 // rule reads or changes, except 3084 and 3088, which rule 11 then rewrites.
 constexpr Field kServerCopies[] = {
-    kU16_44,   kU16_62,    kI16_98,  kBlock180, kU32_68,   kU32_72,   kF32_808,  kI32_812,  kU16_798,
-    kU16_1106, kU16_1038,  kU16_816, kU32_800,  kI32_804,  kU64_1968, kByte1976, kI32_1932, kI32_1936,
-    kU32_64,   kShare,     kI32_92,  kLimitOld, kU16_96,   kBlock100, kFree,     kI32_24,   kReserved,
-    kSwitch38, kBlock1977, kI32_32,  kI32_1944, kU32_3108, kU16_1940, kU16_84};
+    kU16_44,    kU16_62,   kI16_98,   kBlock180, kU32_68,   kU32_72,      kCpuMeasure, kI32_812,  kU16_798,
+    kU16_1106,  kU16_1038, kU16_816,  kU32_800,  kI32_804,  kWorkstation, kI32_1932,   kI32_1936, kU32_64,
+    kShare,     kI32_92,   kLimitOld, kU16_96,   kBlock100, kFree,        kI32_24,     kReserved, kSwitch38,
+    kBlock1977, kI32_32,   kI32_1944, kU32_3108, kU16_1940, kU16_84};
 constexpr Field kPoolCopies[] = {kPoolBest, kPool};
 constexpr Field kRemoteCopies[] = {kU16_48, kBlock696, kBlock1108, kBlock745, kBlock115};
-constexpr Field kTuningCopies[] = {kU16_3112, kU16_3114, kU16_3116, kU16_3118, kF32_3120};
+constexpr Field kTuningCopies[] = {kU16_3112, kU16_3114, kU16_3116, kU16_3118, kBandwidth};
 constexpr Field kTuning3118[] = {kU16_3118};
 
 const ServerVariant &variantOf(Converter converter) {

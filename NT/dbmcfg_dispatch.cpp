@@ -64,8 +64,8 @@ int32_t convertImages(unsigned char *target, const unsigned char *source, const 
   convertGeneral(target, source);
   if (needsServerInputs(converter))
     applyServerRules(target, source, converter, inputs);
-  if (source[kCarriedBlock.offset] != 0 && releaseCode(source) == releaseCode(target))
-    std::memcpy(target + kCarriedBlock.offset, source + kCarriedBlock.offset, kCarriedBlock.size);
+  if (source[kJavaPath.offset] != 0 && releaseCode(source) == releaseCode(target))
+    std::memcpy(target + kJavaPath.offset, source + kJavaPath.offset, kJavaPath.size);
   rangeCheck(target);
   sealImage(target);
   return 0;

@@ -1,18 +1,18 @@
-// The one table of the kxlsystm fields that the conversion and the range check
-// work on: each field's offset, size and form, named once. The converters copy
-// a field as its form says and the range check reads and writes it in the same
-// form, so the two can never disagree on where a value lies or how wide it is.
-// Fields whose use the conversion knows carry that name; the others are named
-// by their form and offset.
+// The one table of the kxlsystm fields that the engine works on: each field's
+// offset, size and form, named once. The converters copy a field as its form
+// says, the range check reads and writes it in the same form and the instance
+// environment writes this machine's values into it, so none of them can
+// disagree on where a value lies or how wide it is. Fields whose use the
+// engine knows carry that name; the others are named by their form and offset.
 #pragma once
 
 #include <cstdint>
 
 namespace kxldbm {
 
-// Scalars are copied whole; a Block is copied only when its first byte is set;
-// a Text is a NUL-terminated string that never runs past its field.
-enum class Form : uint8_t { Byte, U16, I16, U32, I32, F32, U64, Block, Text };
+// Scalars and Bytes are copied whole; a Block is copied only when its first
+// byte is set; a Text is a NUL-terminated string that never runs past its field.
+enum class Form : uint8_t { U16, I16, U32, I32, F32, U64, Bytes, Block, Text };
 
 struct Field {
   uint16_t offset;
@@ -21,9 +21,6 @@ struct Field {
 };
 
 namespace fieldform {
-constexpr Field byte(uint16_t offset) {
-  return {offset, 1, Form::Byte};
-}
 constexpr Field u16(uint16_t offset) {
   return {offset, 2, Form::U16};
 }
@@ -42,6 +39,9 @@ constexpr Field f32(uint16_t offset) {
 constexpr Field u64(uint16_t offset) {
   return {offset, 8, Form::U64};
 }
+constexpr Field bytes(uint16_t offset, uint16_t size) {
+  return {offset, size, Form::Bytes};
+}
 constexpr Field block(uint16_t offset, uint16_t size) {
   return {offset, size, Form::Block};
 }
@@ -58,7 +58,7 @@ inline constexpr Field kI32_32 = fieldform::i32(32);
 inline constexpr Field kU16_36 = fieldform::u16(36);
 inline constexpr Field kSwitch38 = fieldform::i16(38); // decides what rule 3084 subtracts
 inline constexpr Field kU16_44 = fieldform::u16(44);
-inline constexpr Field kU16_46 = fieldform::u16(46);
+inline constexpr Field kWorkstationFlag = fieldform::u16(46);
 inline constexpr Field kU16_48 = fieldform::u16(48);
 inline constexpr Field kI16_50 = fieldform::i16(50);
 inline constexpr Field kNodeBlock = fieldform::block(52, 9); // not carried into a type-5 target
@@ -88,7 +88,7 @@ inline constexpr Field kU16_796 = fieldform::u16(796);
 inline constexpr Field kU16_798 = fieldform::u16(798);
 inline constexpr Field kU32_800 = fieldform::u32(800);
 inline constexpr Field kI32_804 = fieldform::i32(804);
-inline constexpr Field kF32_808 = fieldform::f32(808);
+inline constexpr Field kCpuMeasure = fieldform::f32(808);
 inline constexpr Field kI32_812 = fieldform::i32(812);
 inline constexpr Field kU16_816 = fieldform::u16(816);
 inline constexpr Field kBlock818 = fieldform::block(818, 216);
@@ -109,9 +109,8 @@ inline constexpr Field kI32_1936 = fieldform::i32(1936);
 inline constexpr Field kU16_1940 = fieldform::u16(1940);
 inline constexpr Field kU16_1942 = fieldform::u16(1942);
 inline constexpr Field kI32_1944 = fieldform::i32(1944);
-inline constexpr Field kHeapCopy = fieldform::u32(1948); // the server's second copy of the heap
-inline constexpr Field kU64_1968 = fieldform::u64(1968);
-inline constexpr Field kByte1976 = fieldform::byte(1976);
+inline constexpr Field kHeapCopy = fieldform::u32(1948);         // the server's second copy of the heap
+inline constexpr Field kWorkstation = fieldform::bytes(1968, 9); // the machine's name, terminated
 inline constexpr Field kBlock1977 = fieldform::block(1977, 227);
 inline constexpr Field kText2204 = fieldform::text(2204, 33);
 inline constexpr Field kText2237 = fieldform::text(2237, 33);
@@ -134,9 +133,9 @@ inline constexpr Field kU16_3112 = fieldform::u16(3112);
 inline constexpr Field kU16_3114 = fieldform::u16(3114);
 inline constexpr Field kU16_3116 = fieldform::u16(3116);
 inline constexpr Field kU16_3118 = fieldform::u16(3118);
-inline constexpr Field kF32_3120 = fieldform::f32(3120);
-inline constexpr Field kI32_3124 = fieldform::i32(3124);
-inline constexpr Field kCarriedBlock = fieldform::block(3128, 256); // carried between files of one release
+inline constexpr Field kBandwidth = fieldform::f32(3120);
+inline constexpr Field kClientComponent = fieldform::i32(3124);
+inline constexpr Field kJavaPath = fieldform::block(3128, 256); // carried between files of one release
 inline constexpr Field kU16_3388 = fieldform::u16(3388);
 inline constexpr Field kU16_3390 = fieldform::u16(3390);
 inline constexpr Field kBlock3392 = fieldform::block(3392, 24);

@@ -32,7 +32,7 @@ struct Rule {
   Field other;
 };
 
-constexpr Field kNoField{0, 0, Form::Byte};
+constexpr Field kNoField{0, 0, Form::Bytes};
 
 constexpr Rule outside(double low, double high, double value) {
   return {Check::Outside, low, high, value, kNoField};
@@ -94,7 +94,7 @@ constexpr RangeRow kRows[] = {
     row(kU16_798, outside(0, 127, 64), always(64)),
     row(kU16_794, outside(0, 1, 1), kSame),
     row(kU16_1034, outside(0, 4, 3), kSame),
-    row(kF32_808, outside(1e-10, 1.0, 4e-5), kClear),
+    row(kCpuMeasure, outside(1e-10, 1.0, 4e-5), kClear),
     row(kU32_800, outside(32, 112000, 32), kClear),
     row(kI32_804, outsideKeepUnset(32, 112000, 20000), kClear),
     row(kU16_1038, outside(8, 1000, 16), kClear),
@@ -120,10 +120,10 @@ constexpr RangeRow kRows[] = {
     row4(kU16_3114, outside(0, 100, 5), kClear, kClear),
     row4(kU16_3116, outside(1, 1440, 60), kClear, kClear),
     row(kU16_3118, outside(1, 1440, 10), kClear),
-    row4(kF32_3120, outside(0.1, 100000, 1.25), kClear, kClear),
-    row(kI32_3124, outside(0, 524288, 2048), kSame),
+    row4(kBandwidth, outside(0.1, 100000, 1.25), kClear, kClear),
+    row(kClientComponent, outside(0, 524288, 2048), kSame),
     row(kI32_32, outside(0, 65000, 0), kClear),
-    row(kU16_46, outside(0, 1, 1), kSame),
+    row(kWorkstationFlag, outside(0, 1, 1), kSame),
     row(kI32_1944, outside(0, 64000, 0), kClear),
     row(kI16_50, outside(0, 1, 0), kClear),
     row(kI16_1126, outside(0, 1, 0), kClear),

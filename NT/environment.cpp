@@ -1,6 +1,7 @@
 #include "NT/environment.h"
 
 #include "NT/cfgfile.h"
+#include "NT/dbmcfg_fields.h"
 #include "NT/localhost.h"
 #include "NT/pathjoin.h"
 #include "platform/kxlsys.h"
@@ -18,7 +19,7 @@ constexpr uint32_t kReservePorts = 3;
 constexpr uint32_t kNodesFileFlags = 842;     // create, write only, shared, binary
 constexpr uint32_t kProfileScriptFlags = 843; // the same, written through
 constexpr uint32_t kCharsetClassPrefix = 13;  // the name characters follow the class prefix
-constexpr size_t kWorkstationChars = ENV_CFG_WORKSTATION_SZ - 1;
+constexpr size_t kWorkstationChars = kxldbm::kWorkstation.size - 1;
 constexpr const char kClientComponent[] = "KXL Zelquor Client";
 
 // Trace points, one per step that can fail.
@@ -66,20 +67,20 @@ void undoCreation(const CreatedInstance &created) {
 
 // ---- the configuration image ----------------------------------------------
 
-void putF32(unsigned char *image, uint32_t offset, float value) {
+void putF32(unsigned char *image, const kxldbm::Field &field, float value) {
   uint32_t bits = 0;
   static_assert(sizeof bits == sizeof value);
   std::memcpy(&bits, &value, sizeof bits);
-  kxlcfg::put32(image, offset, bits);
+  kxlcfg::put32(image, field.offset, bits);
 }
 
-// Writes `text` into a field of `size` bytes, zero-padded; false when it does not fit.
-bool putText(unsigned char *image, uint32_t offset, uint32_t size, const char *text) {
+// Writes `text` into its field, zero-padded; false when it does not fit.
+bool putText(unsigned char *image, const kxldbm::Field &field, const char *text) {
   size_t length = std::strlen(text);
-  if (length >= size)
+  if (length >= field.size)
     return false;
-  std::memset(image + offset, 0, size);
-  std::memcpy(image + offset, text, length);
+  std::memset(image + field.offset, 0, field.size);
+  std::memcpy(image + field.offset, text, length);
   return true;
 }
 
@@ -95,7 +96,7 @@ bool tuneComponents(unsigned char *image, const char *installPath) {
     return false;
   bool changed = false;
   if (RegQueryValueExA(key, kClientComponent, nullptr, nullptr, nullptr, nullptr) == ERROR_SUCCESS) {
-    kxlcfg::put32(image, ENV_CFG_CLIENT_COMPONENT, ENV_CLIENT_COMPONENT_VALUE);
+    kxlcfg::put32(image, kxldbm::kClientComponent.offset, ENV_CLIENT_COMPONENT_VALUE);
     changed = true;
   }
   if (installPath != nullptr) {
@@ -103,7 +104,7 @@ bool tuneComponents(unsigned char *image, const char *installPath) {
     joinPath(javaPath, installPath, "java\\jdk");
     OSSPathParam test{OSS_PATH_PARAM_VERSION, javaPath, 1, 0};
     // A path too long for its field is left out rather than written cut.
-    if (ossPathTest(&test) == 0 && putText(image, ENV_CFG_JAVA_PATH, ENV_CFG_JAVA_PATH_SZ, javaPath))
+    if (ossPathTest(&test) == 0 && putText(image, kxldbm::kJavaPath, javaPath))
       changed = true;
   }
   RegCloseKey(key);
@@ -163,7 +164,7 @@ bool workstationName(char *name) {
   workstationSuffix(suffix, sizeof suffix);
   size_t suffixLength = std::strlen(suffix);
   size_t keep = suffixLength < kWorkstationChars ? kWorkstationChars - suffixLength : 0;
-  ossSnprintf(name, ENV_CFG_WORKSTATION_SZ, "%.*s%s", static_cast<int>(keep), machine, suffix);
+  ossSnprintf(name, kxldbm::kWorkstation.size, "%.*s%s", static_cast<int>(keep), machine, suffix);
   for (char *c = name + 1; *c != '\0'; ++c)
     if (!isNameCharacter(*c))
       *c = '_';
@@ -180,24 +181,22 @@ int32_t tuneMeasures(unsigned char *image, uint32_t workstationFlag, bool &chang
   int32_t rc = sqlocpum(&cpu);
   if (rc != 0)
     return traced(kProbeCpu, rc);
-  putF32(image, ENV_CFG_CPU_MEASURE, cpu);
+  putF32(image, kxldbm::kCpuMeasure, cpu);
   changed = true;
   if (nodeType == KXL_NODE_TYPE_PARTITIONED) {
     float bandwidth = 0;
     rc = sqloGetCommBandwidth(&bandwidth, nodeType);
     if (rc != 0)
       return traced(kProbeBandwidth, rc);
-    putF32(image, ENV_CFG_BANDWIDTH, bandwidth);
+    putF32(image, kxldbm::kBandwidth, bandwidth);
   }
-  char name[ENV_CFG_WORKSTATION_SZ] = {};
+  char name[kxldbm::kWorkstation.size] = {};
   if (workstationName(name))
-    putText(image, ENV_CFG_WORKSTATION, ENV_CFG_WORKSTATION_SZ, name);
+    putText(image, kxldbm::kWorkstation, name);
   if (workstationFlag != 0)
-    kxlcfg::put16(image, ENV_CFG_WORKSTATION_FLAG, 1);
+    kxlcfg::put16(image, kxldbm::kWorkstationFlag.offset, 1);
   return 0;
 }
-
-static_assert(ENV_CFG_IMAGE_SZ == kxlcfg::kImageSize);
 
 // Reads the whole image; the file is closed again before the tuning writes.
 int32_t readImage(const char *path, unsigned char *image) {
@@ -205,7 +204,7 @@ int32_t readImage(const char *path, unsigned char *image) {
   if (!file.isOpen())
     return traced(kProbeOpen, UPGRADE_RC_CONFIG_FILE);
   uint32_t got = 0;
-  if (file.readUpTo(image, ENV_CFG_IMAGE_SZ, &got) != 0 || got != ENV_CFG_IMAGE_SZ)
+  if (file.readUpTo(image, kxlcfg::kImageSize, &got) != 0 || got != kxlcfg::kImageSize)
     return traced(kProbeRead, UPGRADE_RC_CONFIG_FILE);
   return 0;
 }
@@ -214,7 +213,7 @@ int32_t readImage(const char *path, unsigned char *image) {
 // be opened again counts as the failed rewind, a short write as the failed write.
 int32_t rewriteImage(const char *path, unsigned char *image) {
   kxlcfg::sealImage(image);
-  switch (kxlcfg::writeWhole(path, kxlcfg::Access::Rewrite, image, ENV_CFG_IMAGE_SZ)) {
+  switch (kxlcfg::writeWhole(path, kxlcfg::Access::Rewrite, image, kxlcfg::kImageSize)) {
   case kxlcfg::WriteResult::Written:
     return 0;
   case kxlcfg::WriteResult::NotOpened:
@@ -228,7 +227,7 @@ int32_t rewriteImage(const char *path, unsigned char *image) {
 int32_t tuneConfigFile(const char *instanceDir, const char *installPath, uint32_t workstationFlag) {
   char path[KXL_JOINED_PATH_SZ];
   joinPath(path, instanceDir, "kxlsystm");
-  unsigned char image[ENV_CFG_IMAGE_SZ];
+  unsigned char image[kxlcfg::kImageSize];
   int32_t rc = readImage(path, image);
   if (rc != 0)
     return rc;

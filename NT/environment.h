@@ -10,16 +10,8 @@
 
 inline constexpr uint32_t KXL_FN_UPGRADE_INSTANCE_ENVIRONMENT = 0x18780540u;
 
-// Layout of the fields this step writes into the 16384-byte kxlsystm image.
-inline constexpr uint32_t ENV_CFG_IMAGE_SZ = 16384;
-inline constexpr uint32_t ENV_CFG_WORKSTATION_FLAG = 46; // u16
-inline constexpr uint32_t ENV_CFG_CPU_MEASURE = 808;     // f32
-inline constexpr uint32_t ENV_CFG_WORKSTATION = 1968;    // 9 bytes
-inline constexpr uint32_t ENV_CFG_WORKSTATION_SZ = 9;
-inline constexpr uint32_t ENV_CFG_BANDWIDTH = 3120;        // f32
-inline constexpr uint32_t ENV_CFG_CLIENT_COMPONENT = 3124; // u32
-inline constexpr uint32_t ENV_CFG_JAVA_PATH = 3128;        // 256 bytes
-inline constexpr uint32_t ENV_CFG_JAVA_PATH_SZ = 256;
+// What this step writes into the client component field of kxlsystm when the
+// copy has the client component.
 inline constexpr uint32_t ENV_CLIENT_COMPONENT_VALUE = 2048;
 
 // Creates instanceName under instanceProfilePath with the copy at installPath
