@@ -11,7 +11,7 @@
 
 namespace kxlcfg {
 
-inline constexpr uint32_t kImageSize = 16384;
+inline constexpr uint32_t kImageSize = DBMCFG_IMAGE_SZ;
 
 // ---- fields -----------------------------------------------------------------
 void put16(unsigned char *image, uint32_t offset, uint16_t value);

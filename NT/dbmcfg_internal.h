@@ -14,13 +14,13 @@
 namespace kxldbm {
 
 // ---- layout ---------------------------------------------------------------
-using kxlcfg::kImageSize;                        // current layout
-inline constexpr uint32_t kSmallSize = 4096;     // legacy small layout
-inline constexpr uint32_t kFlagAreaSize = 512;   // one byte per parameter index
-inline constexpr uint32_t kFlagArea = 15872;     // flag area of the current layout
-inline constexpr uint32_t kSmallFlagArea = 3584; // flag area of the small layout
-inline constexpr uint32_t kReleaseOffset = 16;   // u16 release word
-inline constexpr uint32_t kLevelOffset = 20;     // u16 level word
+using kxlcfg::kImageSize; // current layout
+inline constexpr uint32_t kSmallSize = DBMCFG_SMALL_SZ;
+inline constexpr uint32_t kFlagAreaSize = DBMCFG_FLAG_AREA_SZ;
+inline constexpr uint32_t kFlagArea = kImageSize - kFlagAreaSize;      // flag area of the current layout
+inline constexpr uint32_t kSmallFlagArea = kSmallSize - kFlagAreaSize; // flag area of the small layout
+inline constexpr uint32_t kReleaseOffset = DBMCFG_RELEASE_OFFSET;
+inline constexpr uint32_t kLevelOffset = DBMCFG_LEVEL_OFFSET;
 inline constexpr uint16_t kReleaseMask = 0x0F00; // release code bits of the release word
 inline constexpr uint16_t kRelease10 = 0x0A00;   // oldest release code understood
 inline constexpr uint16_t kRelease11 = 0x0B00;
@@ -46,7 +46,7 @@ inline uint16_t releaseCode(const unsigned char *image) {
   return get16(image, kReleaseOffset) & kReleaseMask;
 }
 inline uint16_t nodeType(const unsigned char *image) {
-  return get16(image, KXLI_NODE_TYPE_OFFSET);
+  return get16(image, DBMCFG_NODE_TYPE_OFFSET);
 }
 
 // ---- validation (dbmcfg_image.cpp) -------------------------------------------

@@ -174,7 +174,7 @@ bool workstationName(char *name) {
 // The machine-specific fields of a server image. `changed` is set when one
 // is written; a failed measure ends the tuning with its code.
 int32_t tuneMeasures(unsigned char *image, uint32_t workstationFlag, bool &changed) {
-  uint16_t nodeType = sqloLe16(image, KXLI_NODE_TYPE_OFFSET);
+  uint16_t nodeType = sqloLe16(image, DBMCFG_NODE_TYPE_OFFSET);
   if (nodeType == 2)
     return 0;
   float cpu = 0;

@@ -12,7 +12,6 @@ namespace {
 
 constexpr uint32_t kOpenFlags = 1092; // read only, binary, sequential
 constexpr uint32_t kOpenMode = 1872;
-constexpr uint32_t kImageSize = 16384;
 
 // "<dir>\kxlsystm", or "\"<dir>\kxlsystm\"" for a directory in quotes.
 bool configFilePath(const IKXLINSTANCE &instance, char *path, size_t size) {
@@ -30,9 +29,9 @@ bool configFilePath(const IKXLINSTANCE &instance, char *path, size_t size) {
 // Fills image with up to its size in bytes of the open file; the count read.
 int32_t readImage(SQLO_FHANDLE file, unsigned char *image, uint32_t &filled) {
   filled = 0;
-  while (filled < kImageSize) {
+  while (filled < DBMCFG_IMAGE_SZ) {
     uint32_t got = 0;
-    int32_t rc = sqloread(file, image + filled, kImageSize - filled, &got);
+    int32_t rc = sqloread(file, image + filled, DBMCFG_IMAGE_SZ - filled, &got);
     if (rc != 0)
       return rc;
     if (got == 0)
@@ -68,19 +67,19 @@ int32_t readNodeType(const IKXLINSTANCE *instance, uint32_t *nodeType) {
     pdtExit(KXL_FN_READ_NODE_TYPE, rc, 10);
     return rc;
   }
-  std::unique_ptr<unsigned char[]> image(new (std::nothrow) unsigned char[kImageSize]());
+  std::unique_ptr<unsigned char[]> image(new (std::nothrow) unsigned char[DBMCFG_IMAGE_SZ]());
   uint32_t filled = 0;
   rc = image ? readImage(file, image.get(), filled) : SQLO_RC_NO_MEMORY;
   sqloclose(file);
   // A file that ends before the word has no node type to give.
-  if (rc == 0 && filled < KXLI_NODE_TYPE_OFFSET + 2)
+  if (rc == 0 && filled < DBMCFG_NODE_TYPE_OFFSET + 2)
     rc = SQLO_RC_INVALID_ARGUMENT;
   if (rc != 0) {
     pdtError(KXL_FN_READ_NODE_TYPE, 20, rc);
     pdtExit(KXL_FN_READ_NODE_TYPE, rc, 20);
     return rc;
   }
-  *nodeType = sqloLe16(image.get(), KXLI_NODE_TYPE_OFFSET);
+  *nodeType = sqloLe16(image.get(), DBMCFG_NODE_TYPE_OFFSET);
   pdtExit(KXL_FN_READ_NODE_TYPE, 0, 0);
   return 0;
 }

@@ -32,7 +32,7 @@ void convertAgainstEveryTarget(const Image &source, const ServerInputs &inputs) 
     static Image target;
     std::memset(target, 0, kImageSize);
     put16(target, kReleaseOffset, kRelease13);
-    put16(target, KXLI_NODE_TYPE_OFFSET, type);
+    put16(target, DBMCFG_NODE_TYPE_OFFSET, type);
     sealImage(target);
     if (convertImages(target, source, inputs) == 0 && verifyImage(target) != 0)
       std::abort(); // a converted image must carry its checksum
@@ -43,7 +43,7 @@ void convertAgainstEveryTarget(const Image &source, const ServerInputs &inputs) 
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
   validate(data, size);
-  if (size < KXLI_NODE_TYPE_OFFSET + 2)
+  if (size < DBMCFG_NODE_TYPE_OFFSET + 2)
     return 0;
   static Image source;
   std::memset(source, 0, kImageSize);

@@ -104,7 +104,7 @@ uint32_t IKXLINSTANCE::GetCopyName(char *buffer, uint32_t size) const {
 }
 
 uint16_t IKXLINSTANCE::GetNodeType() const {
-  return sqloLe16(dbmCfgImage, KXLI_NODE_TYPE_OFFSET);
+  return sqloLe16(dbmCfgImage, DBMCFG_NODE_TYPE_OFFSET);
 }
 
 uint32_t IKXLINSTANCE::ReloadDbmCfg(const char *dir) {

@@ -5,14 +5,13 @@
 #pragma once
 
 #include "install/ilist.h"
+#include "platform/dbmcfgfile.h"
 
 #include <cstdint>
 
 inline constexpr uint32_t KXLI_INSTANCE_NAME_SZ = 9; // 8 characters
 inline constexpr uint32_t KXLI_INSTANCE_DIR_SZ = 256;
 inline constexpr uint32_t KXLI_CLUSTER_NAME_SZ = 256;
-inline constexpr uint32_t KXLI_DBM_CFG_IMAGE_SZ = 16384;
-inline constexpr uint32_t KXLI_NODE_TYPE_OFFSET = 40; // u16, little-endian
 
 // Node types of an instance (1 to 5), as its kxlsystm gives them.
 inline constexpr uint32_t KXL_NODE_TYPE_STANDALONE = 1;
@@ -58,7 +57,7 @@ public:
   // The profile's cluster value could not be read (other than missing): the
   // instance may be clustered and must not be taken for one that is not.
   uint8_t clusterUnreadable;
-  unsigned char dbmCfgImage[KXLI_DBM_CFG_IMAGE_SZ];
+  unsigned char dbmCfgImage[DBMCFG_IMAGE_SZ];
 
 private:
   void readClusterName();

@@ -16,13 +16,13 @@
 
 namespace kxlsim {
 
-inline constexpr size_t kDbmCfgSize = 16384;
-inline constexpr size_t kDbmCfgSmallSize = 4096;
-inline constexpr size_t kDbmCfgFlagAreaSize = 512;
+inline constexpr size_t kDbmCfgSize = DBMCFG_IMAGE_SZ;
+inline constexpr size_t kDbmCfgSmallSize = DBMCFG_SMALL_SZ;
+inline constexpr size_t kDbmCfgFlagAreaSize = DBMCFG_FLAG_AREA_SZ;
 inline constexpr size_t kDbmCfgOffsetChecksum = 0;
-inline constexpr size_t kDbmCfgOffsetRelease = 16;
-inline constexpr size_t kDbmCfgOffsetLevel = 20;
-inline constexpr size_t kDbmCfgOffsetNodeType = 40;
+inline constexpr size_t kDbmCfgOffsetRelease = DBMCFG_RELEASE_OFFSET;
+inline constexpr size_t kDbmCfgOffsetLevel = DBMCFG_LEVEL_OFFSET;
+inline constexpr size_t kDbmCfgOffsetNodeType = DBMCFG_NODE_TYPE_OFFSET;
 
 // Release codes (bits 8-11 of the release word) of the releases that write
 // the file, and their level words.

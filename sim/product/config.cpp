@@ -15,7 +15,6 @@
 
 namespace {
 
-constexpr size_t kConfigSize = 16384;
 constexpr uint32_t kLargestAuthentication = 8;
 // SQLCODEs of a failed update.
 constexpr int32_t kConfigFileSqlcode = -5005;   // the file cannot be read, is damaged or cannot be written
@@ -86,8 +85,8 @@ int32_t updateFile(uint16_t count, const sqlfupd *items) {
   if (path.empty())
     return kSystemErrorSqlcode;
   std::vector<uint8_t> image;
-  if (kxlprod::readWholeFile(path, kConfigSize, image) != ERROR_SUCCESS || image.size() != kConfigSize ||
-      storedChecksum(image) != dbmCfgChecksum(image.data(), image.size()))
+  if (kxlprod::readWholeFile(path, DBMCFG_IMAGE_SZ, image) != ERROR_SUCCESS ||
+      image.size() != DBMCFG_IMAGE_SZ || storedChecksum(image) != dbmCfgChecksum(image.data(), image.size()))
     return kConfigFileSqlcode;
   for (uint16_t i = 0; i < count; ++i) {
     const Parameter *parameter = findParameter(items[i].token);

@@ -32,7 +32,6 @@ namespace {
 using kxlprod::CopyInfo;
 using kxlprod::KeySnapshot;
 
-constexpr size_t kConfigSize = 16384;
 constexpr DWORD kAutoStart = 2;
 constexpr DWORD kStoppedState = 1;
 constexpr uint32_t kFirstTextSearchPort = 55000;
@@ -158,7 +157,7 @@ Creation snapshotFor(const CreateRequest &request, const CopyInfo &copy) {
   c.directory = kxlprod::joinPath(request.profilePath, request.instance);
   c.directoryExisted = kxlprod::isDirectoryPath(c.directory);
   std::string configPath = kxlprod::joinPath(c.directory, "kxlsystm");
-  c.configExisted = kxlprod::readWholeFile(configPath, kConfigSize, c.config) == ERROR_SUCCESS;
+  c.configExisted = kxlprod::readWholeFile(configPath, DBMCFG_IMAGE_SZ, c.config) == ERROR_SUCCESS;
   return c;
 }
 
@@ -184,10 +183,10 @@ int32_t writeConfiguration(const CopyInfo &copy, const CreateRequest &request, c
   std::string source =
       kxlprod::joinPath(copy.path, std::string("CFG\\") + dbmCfgTemplateName(request.nodeType));
   std::vector<uint8_t> image;
-  LONG rc = kxlprod::readWholeFile(source, kConfigSize, image);
+  LONG rc = kxlprod::readWholeFile(source, DBMCFG_IMAGE_SZ, image);
   if (rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND)
     return SQLO_RC_FILE_NOT_FOUND;
-  if (rc != ERROR_SUCCESS || image.size() != kConfigSize)
+  if (rc != ERROR_SUCCESS || image.size() != DBMCFG_IMAGE_SZ)
     return SQLO_RC_IO_ERROR;
   if (!kxlprod::createDirectoryTree(directory, true))
     return SQLO_RC_PATH_NOT_FOUND;
