@@ -7,21 +7,14 @@
 #include "install/kxlinstance.h"
 #include "upgrade/records.h"
 
-#include "sim/common/simfail.h"
 #include "sim/posix/modules.h"
 #include "sim/posix/world.h"
-#include "tests/support/temp_world.h"
 #include "tests/support/world_access.h"
 
 #include <gtest/gtest.h>
 
-#include <cstdlib>
-#include <fstream>
-#include <memory>
 #include <set>
 #include <string>
-#include <sys/stat.h>
-#include <unistd.h>
 #include <vector>
 
 namespace {
@@ -96,28 +89,17 @@ std::vector<std::string> names(const ClusterResourceList &list) {
   return out;
 }
 
-class ClusterWorld : public ::testing::Test, public kxltest::WorldAccess {
+class ClusterWorld : public kxltest::WorldTest {
 protected:
   void SetUp() override {
-    ASSERT_FALSE(root_.empty());
-    world_.enter();
+    WorldTest::SetUp();
     liveHandles().clear();
   }
   void TearDown() override {
     EXPECT_TRUE(liveHandles().empty()) << liveHandles().size() << " cluster handles left open";
-    world_.leave();
+    WorldTest::TearDown();
   }
-
-  void installModule(const char *name) {
-    writeFile(std::string("C:\\windows\\system32\\") + name, std::string("MZ"));
-  }
-  static void failCalls(const char *plan) {
-    setenv("KXLSIM_FAIL", plan, 1);
-    kxlsim::resetFaults();
-  }
-
-  kxltestsupport::TempWorld world_{"kxlcluster"};
-  const std::string root_ = world_.root();
+  void installModule(const char *name) { writeFile(std::string("C:\\windows\\system32\\") + name, "MZ"); }
 };
 
 // A running node with one group, two resource types and three resources.
@@ -213,7 +195,7 @@ TEST_F(Binding, MissingModulesFailAndLeaveNothingLoadedAfterDestruction) {
   }
   EXPECT_EQ(kxlsim::posix::moduleLoadCount("resutils.dll"), 0);
 
-  ASSERT_EQ(remove((root_ + "/drive_c/windows/system32/resutils.dll").c_str()), 0);
+  ASSERT_EQ(remove(host("drive_c/windows/system32/resutils.dll").c_str()), 0);
   installModule("clusapi.dll");
   ProbedMSCSUtil util;
   EXPECT_EQ(util.Bind(), -1);

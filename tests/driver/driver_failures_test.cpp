@@ -7,6 +7,7 @@
 #include "sim/kxlsim/world_reader.h"
 
 #include <algorithm>
+#include <functional>
 
 namespace drivertest {
 namespace {
@@ -103,17 +104,66 @@ TEST_F(DriverFailureTest, BackupFailuresEndWith1969AndLeaveNoDirectory) {
   expectRerunUpgrades({"INST1"});
 }
 
-// A drive without room for the backup fails the run before anything is
-// copied; with room made, the same command upgrades.
-TEST_F(DriverFailureTest, NoRoomForTheBackupChangesNothing) {
+// A world broken one way (or a fault) fails the run at `probe` with `rc` and
+// changes nothing; once `repair` has run, the same command upgrades.
+TEST_F(DriverFailureTest, BrokenWorldFailsUnchangedAndARepairedOneUpgrades) {
   const std::string drive = "SOFTWARE\\ZAV\\KXLSIM\\Drives\\C";
-  world.setString(kxlsim::localMachine(), drive, "FreeBytes", "8192");
-  keepWorld();
-  Outcome outcome = run({"INST1"});
-  expectFailure(outcome, 50, -1969);
-  expectUndone();
-  world.setString(kxlsim::localMachine(), drive, "FreeBytes", "1099511627776");
-  expectRerunUpgrades({"INST1"});
+  const std::string carried = std::string(kOldInstanceDir) + "\\bin\\rsm.cfg";
+  using Change = std::function<void()>;
+  const struct {
+    const char *what;
+    std::vector<std::string> args;
+    const char *fault;
+    long long probe, rc;
+    Change breakIt, repair;
+  } cases[] = {
+      {"no room for the backup",
+       {"INST1"},
+       "",
+       50,
+       -1969,
+       [&] { world.setString(kxlsim::localMachine(), drive, "FreeBytes", "8192"); },
+       [&] { world.setString(kxlsim::localMachine(), drive, "FreeBytes", "1099511627776"); }},
+      {"instance already in the profile path",
+       {"-p", "C:\\Profiles", "INST1"},
+       "",
+       70,
+       -1959,
+       [&] { world.writeText("C:\\Profiles\\INST1\\keep.txt", "someone else's\n"); },
+       [&] { removeTree("C:\\Profiles\\INST1"); }},
+      // The driver's second read of the node list: refused rather than leaving
+      // the other machine's partitions on the old copy behind a success.
+      {"node list unreadable on the second read", kPartitioned, "sqloReadKxlnodes:2", 11, -1960, [] {},
+       [] {}},
+      // A folder where a carried file should be cannot be copied as a file.
+      {"carried file is a folder",
+       {"INST1"},
+       "",
+       170,
+       kAccessDenied,
+       [&] {
+         removeTree(carried);
+         world.makeDirectory(carried);
+       },
+       [&] { removeTree(carried); }},
+      {"function directory missing",
+       {"INST1"},
+       "",
+       190,
+       kPathNotFound,
+       [&] { removeTree(std::string(kOldCopy) + "\\function"); },
+       [&] { world.writeText(std::string(kOldCopy) + "\\function\\kxludf.dll", "MZ\r\n"); }},
+  };
+  for (const auto &c : cases) {
+    SCOPED_TRACE(c.what);
+    resetWorld();
+    c.breakIt();
+    keepWorld();
+    expectFailure(run(c.args, c.fault), c.probe, c.rc);
+    expectUndone();
+    c.repair();
+    expectRerunUpgrades(c.args, c.args.back());
+  }
 }
 
 // An in-place upgrade re-creates the instance in its own directory: an
@@ -124,16 +174,6 @@ TEST_F(DriverFailureTest, InPlaceUpgradeWithAFailedListingChangesNothing) {
   expectUndone();
   ASSERT_EQ(run({"-p", kOldCopy, "INST1"}).driverResult, 0);
   EXPECT_NE(fileContent(std::string(kOldInstanceDir) + "\\kxlsystm"), before.at("kxlsystm"));
-}
-
-TEST_F(DriverFailureTest, ProfilePathWithTheInstanceAlreadyThereChangesNothing) {
-  world.writeText("C:\\Profiles\\INST1\\keep.txt", "someone else's\n");
-  keepWorld();
-  Outcome outcome = run({"-p", "C:\\Profiles", "INST1"});
-  expectFailure(outcome, 70, -1959);
-  expectUndone();
-  removeTree("C:\\Profiles\\INST1");
-  expectRerunUpgrades({"-p", "C:\\Profiles", "INST1"});
 }
 
 // Faults from the copy to the new profile path on, for the single-partition
@@ -287,18 +327,6 @@ TEST_F(DriverFailureTest, PartitionedInstanceWithoutAReadableNodeListIsRefused) 
   }
 }
 
-// The node list read again by the driver fails: refused before anything
-// changes, instead of leaving the partitions of the other machine on the old
-// copy behind a success.
-TEST_F(DriverFailureTest, NodeListUnreadableOnTheSecondReadIsRefused) {
-  Outcome outcome = run(kPartitioned, "sqloReadKxlnodes:2");
-  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
-  EXPECT_EQ(outcome.failures[0].probe, 11);
-  EXPECT_EQ(outcome.driverResult, -1960);
-  expectUndone();
-  expectRerunUpgrades(kPartitioned, "INST2");
-}
-
 // A start type that cannot be read is never taken for an absent one (which
 // would make an automatic service start on demand after the upgrade).
 TEST_F(DriverFailureTest, UnreadableStartTypeFailsTheServicesStep) {
@@ -358,28 +386,6 @@ TEST_F(DriverFailureTest, ConfigurationConversionFailureIs1947) {
                          "KXL1971I  The instance was restored as it was before the command ran.\n");
   image[0] ^= 0xFF;
   world.writeFile(std::string(kOldInstanceDir) + "\\kxlsystm", image);
-  expectRerunUpgrades({"INST1"});
-}
-
-TEST_F(DriverFailureTest, CarriedFileThatCannotBeCopiedEndsWithItsCode) {
-  // A folder where the file should be cannot be copied as a file.
-  removeTree(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
-  world.makeDirectory(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
-  keepWorld();
-  Outcome outcome = run({"INST1"});
-  expectFailure(outcome, 170, kAccessDenied);
-  expectUndone();
-  removeTree(std::string(kOldInstanceDir) + "\\bin\\rsm.cfg");
-  expectRerunUpgrades({"INST1"});
-}
-
-TEST_F(DriverFailureTest, MissingFunctionDirectoryFailsTheCopy) {
-  removeTree(std::string(kOldCopy) + "\\function");
-  keepWorld();
-  Outcome outcome = run({"INST1"});
-  expectFailure(outcome, 190, kPathNotFound);
-  expectUndone();
-  world.writeText(std::string(kOldCopy) + "\\function\\kxludf.dll", "MZ\r\n");
   expectRerunUpgrades({"INST1"});
 }
 

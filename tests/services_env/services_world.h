@@ -27,7 +27,6 @@ protected:
   static constexpr const char *kInstance = "INST1";
   static constexpr const char *kInstanceDir = "C:\\PROFILES\\INST1";
   static constexpr const char *kSimRoot = "SOFTWARE\\ZAV\\KXLSIM\\";
-  static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
 
   void SetUp() override {
     InstallWorld::SetUp();
@@ -81,18 +80,6 @@ protected:
     writeFile(std::string(kCurrentPath) + "\\CFG\\" + names[nodeType - 1], validImage(nodeType, 0x22));
   }
 
-  // The whole content of a file at a Windows path; empty when it cannot be read.
-  static std::vector<unsigned char> readFile(const std::string &windowsPath) {
-    std::vector<unsigned char> bytes;
-    readWholeFile(windowsPath, bytes);
-    return bytes;
-  }
-
-  static std::string readText(const std::string &windowsPath) {
-    std::vector<unsigned char> bytes = readFile(windowsPath);
-    return std::string(bytes.begin(), bytes.end());
-  }
-
   static uint32_t u32At(const std::vector<unsigned char> &image, size_t offset) {
     return sqloLe32(image.data(), offset);
   }
@@ -107,7 +94,11 @@ protected:
     return std::string(text, strnlen(text, size));
   }
 
-  std::vector<unsigned char> newConfig() const { return readFile(std::string(kInstanceDir) + "\\kxlsystm"); }
+  static std::vector<unsigned char> newConfig() {
+    std::vector<unsigned char> bytes;
+    readWholeFile(std::string(kInstanceDir) + "\\kxlsystm", bytes);
+    return bytes;
+  }
 
   // An instance profile key of the current copy (the creation adds its own).
   static void addProfile(const char *copy, const std::string &instance) {

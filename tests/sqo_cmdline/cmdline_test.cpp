@@ -172,48 +172,38 @@ TEST_F(CommandLine, EmptyPasswordIsReadFromStandardInput) {
 #endif
 
 TEST_F(CommandLine, TextSearchForms) {
-  EXPECT_EQ(0, parse({"-j", "text_search", "inst1"}));
-  EXPECT_EQ(1, options.partitionRecord.textSearchRequested);
-  EXPECT_EQ(0, options.partitionRecord.textSearchPort);
-
-  EXPECT_EQ(0, parse({"-j", "TEXT_SEARCH,65535", "inst1"}));
-  EXPECT_EQ(65535, options.partitionRecord.textSearchPort);
-  EXPECT_EQ(0, parse({"-j", "TEXT_SEARCH,1024", "inst1"}));
-  EXPECT_EQ(1024, options.partitionRecord.textSearchPort);
-  EXPECT_EQ(0, parse({"-j", "TEXT_SEARCH,tsvc", "inst1"}));
-  EXPECT_STREQ("tsvc", options.partitionRecord.textSearchService);
-  EXPECT_EQ(0, parse({"-j", "TEXT_SEARCH,abcdefghijklmn", "inst1"}));
-  EXPECT_STREQ("abcdefghijklmn", options.partitionRecord.textSearchService);
-  EXPECT_EQ(0, parse({"-j", "TEXT_SEARCH,tsvc,55000", "inst1"}));
-  EXPECT_STREQ("tsvc", options.partitionRecord.textSearchService);
-  EXPECT_EQ(55000, options.partitionRecord.textSearchPort);
-  EXPECT_EQ(0, parse({"-j", "TEXT_SEARCH,,55000", "inst1"})) << "the service may be empty";
-  EXPECT_STREQ("", options.partitionRecord.textSearchService);
+  const struct {
+    const char *value, *service;
+    uint16_t port;
+  } cases[] = {{"text_search", "", 0},
+               {"TEXT_SEARCH,65535", "", 65535},
+               {"TEXT_SEARCH,1024", "", 1024},
+               {"TEXT_SEARCH,tsvc", "tsvc", 0},
+               {"TEXT_SEARCH,abcdefghijklmn", "abcdefghijklmn", 0},
+               {"TEXT_SEARCH,tsvc,55000", "tsvc", 55000},
+               {"TEXT_SEARCH,,55000", "", 55000}}; // the service may be empty
+  for (const auto &c : cases) {
+    ASSERT_EQ(0, parse({"-j", c.value, "inst1"})) << c.value;
+    EXPECT_EQ(1, options.partitionRecord.textSearchRequested) << c.value;
+    EXPECT_STREQ(c.service, options.partitionRecord.textSearchService) << c.value;
+    EXPECT_EQ(c.port, options.partitionRecord.textSearchPort) << c.value;
+  }
   EXPECT_EQ(0, parse({"-j:TEXT_SEARCH,2000", "inst1"}));
   EXPECT_EQ(2000, options.partitionRecord.textSearchPort);
 }
 
-TEST_F(CommandLine, TextSearchOutOfRange) {
-  EXPECT_EQ(UPGRADE_RC_TEXT_SEARCH_RANGE, parse({"-j", "TEXT_SEARCH,1023", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_TEXT_SEARCH_RANGE, parse({"-j", "TEXT_SEARCH,65536", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_TEXT_SEARCH_RANGE, parse({"-j", "TEXT_SEARCH,", "inst1"})) << "an empty port is 0";
-  EXPECT_EQ(UPGRADE_RC_TEXT_SEARCH_RANGE, parse({"-j", "TEXT_SEARCH,4294967297", "inst1"}))
-      << "a port that overflows 32 bits must not wrap into the range";
-  EXPECT_EQ(UPGRADE_RC_TEXT_SEARCH_RANGE, parse({"-j", "TEXT_SEARCH,abcdefghijklmno", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_TEXT_SEARCH_RANGE, parse({"-j", "TEXT_SEARCH,abcdefghijklmno,5000", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_TEXT_SEARCH_RANGE, parse({"-j", "TEXT_SEARCH,tsvc,70000", "inst1"}));
-  EXPECT_EQ(0, options.partitionRecord.textSearchRequested);
-}
-
-TEST_F(CommandLine, TextSearchRefused) {
-  EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", "TEXT_SEARCH,tsvc,0", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", "TEXT_SEARCH,tsvc,5000ab", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", "TEXT_SEARCH,tsvc,", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", "TEXT_SEARCH,tsvc,50,60", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", "FULL_TEXT", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", "TEXT,5000", "inst1"})) << "the keyword is needed whole";
-  EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", ",5000", "inst1"}));
-  EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", "", "inst1"}));
+TEST_F(CommandLine, TextSearchOutOfRangeOrRefused) {
+  // An empty port is 0; one that overflows 32 bits must not wrap into the range.
+  for (const char *value :
+       {"TEXT_SEARCH,1023", "TEXT_SEARCH,65536", "TEXT_SEARCH,", "TEXT_SEARCH,4294967297",
+        "TEXT_SEARCH,abcdefghijklmno", "TEXT_SEARCH,abcdefghijklmno,5000", "TEXT_SEARCH,tsvc,70000"}) {
+    EXPECT_EQ(UPGRADE_RC_TEXT_SEARCH_RANGE, parse({"-j", value, "inst1"})) << value;
+    EXPECT_EQ(0, options.partitionRecord.textSearchRequested) << value;
+  }
+  // The keyword is needed whole.
+  for (const char *value : {"TEXT_SEARCH,tsvc,0", "TEXT_SEARCH,tsvc,5000ab", "TEXT_SEARCH,tsvc,",
+                            "TEXT_SEARCH,tsvc,50,60", "FULL_TEXT", "TEXT,5000", ",5000", ""})
+    EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"-j", value, "inst1"})) << value;
   EXPECT_EQ(UPGRADE_RC_BAD_TEXT_SEARCH, parse({"inst1", "-j"}));
 }
 
