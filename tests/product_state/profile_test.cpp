@@ -36,6 +36,10 @@ protected:
   }
 
   static constexpr const char *kV95 = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V95";
+  static constexpr const char *kGlobal = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE";
+  static std::string profile(const char *instance) {
+    return std::string("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\") + instance;
+  }
 };
 
 TEST_F(ProfileTest, CurrentInstanceValueReachesTheEnvironment) {
@@ -57,7 +61,7 @@ TEST_F(ProfileTest, CurrentInstanceValueReachesTheEnvironment) {
 }
 
 TEST_F(ProfileTest, EnvironmentFallsBackToTheProfileRegistry) {
-  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLEXTRAAGENTS", "3");
+  setString(kGlobal, "KXLEXTRAAGENTS", "3");
   char *value = nullptr;
   ASSERT_EQ(0, sqloGetEnvInternal(KXL_VAR_KXLEXTRAAGENTS, &value));
   ASSERT_NE(value, nullptr);
@@ -69,10 +73,9 @@ TEST_F(ProfileTest, EnvironmentFallsBackToTheProfileRegistry) {
 }
 
 TEST_F(ProfileTest, InstanceLevelWinsOverGlobalLevel) {
-  std::string copy = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101";
-  setString(copy + "\\GLOBAL_PROFILE", "KXLPORTRANGE", "60000:60003");
-  setString(copy + "\\GLOBAL_PROFILE", "KXLRESERVEDINST", "INST1");
-  setString(copy + "\\PROFILES\\INST1", "KXLPORTRANGE", "50000:50004");
+  setString(kGlobal, "KXLPORTRANGE", "60000:60003");
+  setString(kGlobal, "KXLRESERVEDINST", "INST1");
+  setString(profile("INST1"), "KXLPORTRANGE", "50000:50004");
   sqloPutEnv(KXL_VAR_KXLINSTANCE, "INST1");
   EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, nullptr), "50000:50004");
   EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, "KXLGLOBALPF"), "60000:60003");
@@ -83,8 +86,8 @@ TEST_F(ProfileTest, InstanceLevelWinsOverGlobalLevel) {
 }
 
 TEST_F(ProfileTest, ValuesAreCutToTheCapacity) {
-  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLRESERVEDINST", "LONGNAME12345");
-  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLPORTRANGE", "60000:60003");
+  setString(kGlobal, "KXLRESERVEDINST", "LONGNAME12345");
+  setString(kGlobal, "KXLPORTRANGE", "60000:60003");
   EXPECT_EQ(read(KXL_VAR_KXLRESERVEDINST, "KXLGLOBALPF"), "LONGNAME") << "an instance name has 8 characters";
   EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, "KXLGLOBALPF", 6), "60000");
 }
@@ -112,37 +115,32 @@ TEST_F(ProfileTest, SettingWritesTheInstanceOrGlobalLevel) {
   uint32_t var = KXL_VAR_KXLNODECOMPUTER;
   char value[] = "NODE1";
   EXPECT_EQ(SQLO_RC_PREG_NO_PROFILE, sqloPRegValuePE(SQLO_PREG_SET, &var, 0, value, "INST9", -1, 0));
-  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST9", "KXLPORTRANGE", "1:2");
+  setString(profile("INST9"), "KXLPORTRANGE", "1:2");
   ASSERT_EQ(0, sqloPRegValuePE(SQLO_PREG_SET, &var, 0, value, "INST9", -1, 0));
-  EXPECT_EQ(getString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST9", "KXLNODECOMPUTER"),
-            "NODE1");
+  EXPECT_EQ(getString(profile("INST9"), "KXLNODECOMPUTER"), "NODE1");
   ASSERT_EQ(0, sqloPRegValue(SQLO_PREG_SET, &var, 0, value, "KXLGLOBALPF"));
-  EXPECT_EQ(getString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLNODECOMPUTER"),
-            "NODE1");
+  EXPECT_EQ(getString(kGlobal, "KXLNODECOMPUTER"), "NODE1");
   ASSERT_EQ(0, sqloPRegValue(SQLO_PREG_UNSET, &var, 0, nullptr, "INST9"));
-  EXPECT_EQ(getString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST9", "KXLNODECOMPUTER"),
-            "<missing>");
+  EXPECT_EQ(getString(profile("INST9"), "KXLNODECOMPUTER"), "<missing>");
   uint32_t unknown = 1234;
   EXPECT_EQ(SQLO_RC_PREG_BAD_VARIABLE, sqloPRegValue(SQLO_PREG_GET, &unknown, 0, value, nullptr));
 }
 
 TEST_F(ProfileTest, ProfileEnumerationListsTheInstancesThenEnds) {
   EXPECT_TRUE(profiles().empty());
-  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST1", "KXLPORTRANGE", "1:2");
-  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\PROFILES\\INST2", "KXLPORTRANGE", "1:2");
-  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLPORTRANGE", "1:2");
+  setString(profile("INST1"), "KXLPORTRANGE", "1:2");
+  setString(profile("INST2"), "KXLPORTRANGE", "1:2");
+  setString(kGlobal, "KXLPORTRANGE", "1:2");
   EXPECT_EQ(profiles(), (std::vector<std::string>{"INST1", "INST2"}));
   char name[SQLO_PREG_PROFILE_SZ];
   EXPECT_EQ(SQLO_RC_PREG_END, sqloPRegProfile(SQLO_PREG_NEXT, name)) << "the end is repeated";
 }
 
 TEST_F(ProfileTest, FlagTextsReadAsTrueOrFalse) {
-  EXPECT_EQ(1, sqloStr2Flag("yes"));
-  EXPECT_EQ(1, sqloStr2Flag("ON"));
-  EXPECT_EQ(1, sqloStr2Flag("1"));
-  EXPECT_EQ(0, sqloStr2Flag("NO"));
-  EXPECT_EQ(0, sqloStr2Flag("YESS"));
-  EXPECT_EQ(0, sqloStr2Flag(nullptr));
+  for (const char *text : {"yes", "ON", "1"})
+    EXPECT_EQ(1, sqloStr2Flag(text)) << text;
+  for (const char *text : {"NO", "YESS", static_cast<const char *>(nullptr)})
+    EXPECT_EQ(0, sqloStr2Flag(text)) << (text != nullptr ? text : "null");
 }
 
 TEST_F(ProfileTest, OtherMachinesAreReachedThroughTheirSubtree) {
@@ -176,7 +174,7 @@ TEST_F(ProfileTest, OtherMachinesAreReachedThroughTheirSubtree) {
 }
 
 TEST_F(ProfileTest, InjectedFaultsFailProfileAndMachineCalls) {
-  setString("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\V101\\GLOBAL_PROFILE", "KXLPORTRANGE", "1:2");
+  setString(kGlobal, "KXLPORTRANGE", "1:2");
   failCalls("sqloPRegValuePE:1,sqloPRegMachineOpen:1,sqloPutEnv:1");
   EXPECT_NE(read(KXL_VAR_KXLPORTRANGE, "KXLGLOBALPF"), "1:2");
   EXPECT_EQ(read(KXL_VAR_KXLPORTRANGE, "KXLGLOBALPF"), "1:2");

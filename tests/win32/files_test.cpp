@@ -43,15 +43,21 @@ HANDLE createWith(const string &path, DWORD access, DWORD disposition) {
                      nullptr);
 }
 
-// The last error of a CreateFileA call that must fail; ERROR_SUCCESS when it
-// opened the file after all.
-DWORD failureOf(const string &path, DWORD access, DWORD disposition) {
+// The last error a call that must fail leaves (cleared first); ERROR_SUCCESS when it worked after all.
+template <typename Call> DWORD errorOf(Call call) {
   SetLastError(0);
-  HANDLE h = createWith(path, access, disposition);
-  if (h == INVALID_HANDLE_VALUE)
-    return GetLastError();
-  CloseHandle(h);
-  return ERROR_SUCCESS;
+  return call() ? static_cast<DWORD>(ERROR_SUCCESS) : GetLastError();
+}
+
+DWORD failureOf(const string &path, DWORD access, DWORD disposition) {
+  return errorOf([&] {
+    HANDLE h = createWith(path, access, disposition);
+    return h != INVALID_HANDLE_VALUE && CloseHandle(h);
+  });
+}
+
+DWORD attributesError(const string &path) {
+  return errorOf([&] { return GetFileAttributesA(path.c_str()) != INVALID_FILE_ATTRIBUTES; });
 }
 
 // --- Attributes and folders ----------------------------------------------
@@ -75,25 +81,18 @@ TEST_F(FilesTest, AttributesOfANewFileMarkItForArchiving) {
 }
 
 TEST_F(FilesTest, AttributesOfMissingPathsTellFileFromPath) {
-  SetLastError(0);
-  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(at("missing.txt").c_str()));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
-  SetLastError(0);
-  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(at("nofolder\\missing.txt").c_str()));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), attributesError(at("missing.txt")));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), attributesError(at("nofolder\\missing.txt")));
 }
 
 TEST_F(FilesTest, CreateDirectoryFailsOnExistingAndMissingParent) {
-  SetLastError(0);
-  EXPECT_FALSE(CreateDirectoryA(dir_.c_str(), nullptr));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
+  auto mkdir = [](const string &path) {
+    return errorOf([&] { return CreateDirectoryA(path.c_str(), nullptr); });
+  };
   ASSERT_TRUE(writeFile(at("file"), "x"));
-  SetLastError(0);
-  EXPECT_FALSE(CreateDirectoryA(at("file").c_str(), nullptr));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
-  SetLastError(0);
-  EXPECT_FALSE(CreateDirectoryA(at("missing\\child").c_str(), nullptr));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), mkdir(dir_));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), mkdir(at("file")));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), mkdir(at("missing\\child")));
   EXPECT_TRUE(CreateDirectoryA(at("child").c_str(), nullptr));
 }
 
@@ -107,9 +106,7 @@ TEST_F(FilesTest, FindGivesTheStoredNameWhenAskedInAnotherCase) {
   EXPECT_STREQ("MixedName.Txt", entry.cFileName);
   EXPECT_EQ(5u, entry.nFileSizeLow);
   EXPECT_EQ(0u, entry.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY);
-  SetLastError(0);
-  EXPECT_FALSE(FindNextFileA(find, &entry));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), errorOf([&] { return FindNextFileA(find, &entry); }));
   EXPECT_TRUE(FindClose(find));
 }
 
@@ -216,17 +213,16 @@ TEST_F(FilesTest, AccessTellsExistingFromMissing) {
 TEST_F(FilesTest, CopyFileHonoursFailIfExists) {
   ASSERT_TRUE(writeFile(at("source"), "first"));
   ASSERT_TRUE(writeFile(at("target"), "second"));
-  SetLastError(0);
-  EXPECT_FALSE(CopyFileA(at("source").c_str(), at("target").c_str(), TRUE));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_EXISTS), GetLastError());
+  auto copy = [this](const char *from, const char *to, BOOL failIfExists) {
+    return errorOf([&] { return CopyFileA(at(from).c_str(), at(to).c_str(), failIfExists); });
+  };
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_EXISTS), copy("source", "target", TRUE));
   EXPECT_EQ("second", readFile(at("target")));
-  EXPECT_TRUE(CopyFileA(at("source").c_str(), at("target").c_str(), FALSE));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_SUCCESS), copy("source", "target", FALSE));
   EXPECT_EQ("first", readFile(at("target")));
-  EXPECT_TRUE(CopyFileA(at("source").c_str(), at("fresh").c_str(), TRUE));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_SUCCESS), copy("source", "fresh", TRUE));
   EXPECT_EQ("first", readFile(at("fresh")));
-  SetLastError(0);
-  EXPECT_FALSE(CopyFileA(at("missing").c_str(), at("other").c_str(), FALSE));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), copy("missing", "other", FALSE));
 }
 
 TEST_F(FilesTest, CreateFileNewAndOpenExistingFailOnTheWrongState) {
@@ -244,39 +240,30 @@ TEST_F(FilesTest, CreateFileNewAndOpenExistingFailOnTheWrongState) {
 }
 
 // CREATE_ALWAYS and OPEN_ALWAYS succeed either way and tell, through the last
-// error, whether the file was already there.
+// error, whether the file was already there; the size shows whether it was replaced.
 TEST_F(FilesTest, CreateFileAlwaysReportsAnExistingFile) {
-  SetLastError(ERROR_INVALID_PARAMETER);
-  HANDLE h = createWith(at("always"), GENERIC_WRITE, CREATE_ALWAYS);
-  ASSERT_NE(INVALID_HANDLE_VALUE, h);
-  EXPECT_EQ(static_cast<DWORD>(ERROR_SUCCESS), GetLastError());
-  DWORD written = 0;
-  EXPECT_TRUE(WriteFile(h, "0123456789", 10, &written, nullptr));
-  CloseHandle(h);
-
-  h = createWith(at("always"), GENERIC_WRITE, CREATE_ALWAYS);
-  ASSERT_NE(INVALID_HANDLE_VALUE, h);
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
-  EXPECT_EQ(0u, GetFileSize(h, nullptr)); // replaced
-  CloseHandle(h);
-
   ASSERT_TRUE(writeFile(at("kept"), "keep me"));
-  h = createWith(at("kept"), GENERIC_READ | GENERIC_WRITE, OPEN_ALWAYS);
-  ASSERT_NE(INVALID_HANDLE_VALUE, h);
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
-  EXPECT_EQ(7u, GetFileSize(h, nullptr)); // kept
-  CloseHandle(h);
-
-  SetLastError(ERROR_INVALID_PARAMETER);
-  h = createWith(at("opened"), GENERIC_WRITE, OPEN_ALWAYS);
-  ASSERT_NE(INVALID_HANDLE_VALUE, h);
-  EXPECT_EQ(static_cast<DWORD>(ERROR_SUCCESS), GetLastError());
-  CloseHandle(h);
-
-  h = createWith(at("kept"), GENERIC_WRITE, TRUNCATE_EXISTING);
-  ASSERT_NE(INVALID_HANDLE_VALUE, h);
-  EXPECT_EQ(0u, GetFileSize(h, nullptr));
-  CloseHandle(h);
+  const struct {
+    const char *name;
+    DWORD disposition, lastError, size;
+  } rows[] = {
+      {"always", CREATE_ALWAYS, ERROR_SUCCESS, 0},    {"always", CREATE_ALWAYS, ERROR_ALREADY_EXISTS, 0},
+      {"kept", OPEN_ALWAYS, ERROR_ALREADY_EXISTS, 7}, {"opened", OPEN_ALWAYS, ERROR_SUCCESS, 0},
+      {"kept", TRUNCATE_EXISTING, ERROR_SUCCESS, 0},
+  };
+  for (const auto &row : rows) {
+    SCOPED_TRACE(row.name);
+    SetLastError(ERROR_INVALID_PARAMETER);
+    HANDLE h = createWith(at(row.name), GENERIC_READ | GENERIC_WRITE, row.disposition);
+    ASSERT_NE(INVALID_HANDLE_VALUE, h);
+    if (row.disposition != TRUNCATE_EXISTING) {
+      EXPECT_EQ(row.lastError, GetLastError());
+    }
+    EXPECT_EQ(row.size, GetFileSize(h, nullptr));
+    DWORD written = 0;
+    EXPECT_TRUE(WriteFile(h, "0123456789", 10, &written, nullptr));
+    CloseHandle(h);
+  }
 }
 
 // --- Moving, removing and reading ---------------------------------------
@@ -284,9 +271,8 @@ TEST_F(FilesTest, CreateFileAlwaysReportsAnExistingFile) {
 TEST_F(FilesTest, MoveFileReplacesOnlyWhenAsked) {
   ASSERT_TRUE(writeFile(at("from"), "moved"));
   ASSERT_TRUE(writeFile(at("to"), "old"));
-  SetLastError(0);
-  EXPECT_FALSE(MoveFileExA(at("from").c_str(), at("to").c_str(), 0));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS),
+            errorOf([&] { return MoveFileExA(at("from").c_str(), at("to").c_str(), 0); }));
   EXPECT_EQ("old", readFile(at("to")));
   EXPECT_TRUE(MoveFileExA(at("from").c_str(), at("to").c_str(), MOVEFILE_REPLACE_EXISTING));
   EXPECT_EQ("moved", readFile(at("to")));
@@ -301,15 +287,13 @@ TEST_F(FilesTest, MoveFileReplacesOnlyWhenAsked) {
 TEST_F(FilesTest, RemovalFailuresTellWhy) {
   ASSERT_TRUE(CreateDirectoryA(at("full").c_str(), nullptr));
   ASSERT_TRUE(writeFile(at("full\\file"), "x"));
-  SetLastError(0);
-  EXPECT_FALSE(RemoveDirectoryA(at("full").c_str()));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_DIR_NOT_EMPTY), GetLastError());
-  SetLastError(0);
-  EXPECT_FALSE(RemoveDirectoryA(at("missing").c_str()));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
-  SetLastError(0);
-  EXPECT_FALSE(DeleteFileA(at("missing").c_str()));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), GetLastError());
+  auto rmdir = [this](const char *name) {
+    return errorOf([&] { return RemoveDirectoryA(at(name).c_str()); });
+  };
+  EXPECT_EQ(static_cast<DWORD>(ERROR_DIR_NOT_EMPTY), rmdir("full"));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), rmdir("missing"));
+  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND),
+            errorOf([this] { return DeleteFileA(at("missing").c_str()); }));
   EXPECT_TRUE(DeleteFileA(at("full\\file").c_str()));
   EXPECT_TRUE(RemoveDirectoryA(at("full").c_str()));
 }

@@ -22,11 +22,29 @@ using kxltestsupport::writeHostFile;
 using posix::hive::HiveFile;
 using posix::hive::Key;
 
-int waitExit(pid_t pid) {
+// Runs `body` in a child process; its exit code (0 when body returned true).
+int inChild(const std::function<bool()> &body) {
+  pid_t pid = fork();
+  if (pid == 0)
+    _exit(body() ? 0 : 1);
   int status = 0;
   waitpid(pid, &status, 0);
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
+
+// Runs `forever` in a child process and kills it 20 to 100 ms later.
+void killMidway(std::mt19937 &random, const std::function<void()> &forever) {
+  pid_t child = fork();
+  if (child == 0) {
+    forever();
+    _exit(0);
+  }
+  usleep(20000 + random() % 80000);
+  kill(child, SIGKILL);
+  waitpid(child, nullptr, 0);
+}
+
+const char *const kHive = "HKEY_LOCAL_MACHINE";
 
 LONG putDword(HKEY key, const char *name, DWORD value) {
   return RegSetValueExA(key, name, 0, REG_DWORD, reinterpret_cast<const BYTE *>(&value), sizeof value);
@@ -51,21 +69,14 @@ TEST_F(SharingTest, AnOpenKeySeesAnotherProcessChanges) {
   ASSERT_EQ(putDword(key, "Value", 0), ERROR_SUCCESS);
   // Same-sized rewrites in quick succession: each must still be noticed.
   for (DWORD round = 1; round <= 20; ++round) {
-    pid_t child = fork();
-    if (child == 0) {
-      HKEY own = createKey("SOFTWARE\\SHARED");
-      _exit(putDword(own, "value", round) == ERROR_SUCCESS ? 0 : 1);
-    }
-    ASSERT_EQ(waitExit(child), 0);
+    ASSERT_EQ(
+        inChild([&] { return putDword(createKey("SOFTWARE\\SHARED"), "value", round) == ERROR_SUCCESS; }), 0);
     DWORD seen = 0;
     ASSERT_EQ(queryDword(key, "Value", seen), ERROR_SUCCESS);
     ASSERT_EQ(seen, round);
   }
   // A key deleted by another process is gone for this process's handle too.
-  pid_t child = fork();
-  if (child == 0)
-    _exit(SHDeleteKeyA(HKEY_LOCAL_MACHINE, "Software\\Shared") == ERROR_SUCCESS ? 0 : 1);
-  ASSERT_EQ(waitExit(child), 0);
+  ASSERT_EQ(inChild([] { return SHDeleteKeyA(HKEY_LOCAL_MACHINE, "Software\\Shared") == ERROR_SUCCESS; }), 0);
   DWORD seen = 0;
   EXPECT_EQ(queryDword(key, "Value", seen), ERROR_KEY_DELETED);
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
@@ -74,22 +85,21 @@ TEST_F(SharingTest, AnOpenKeySeesAnotherProcessChanges) {
 TEST_F(SharingTest, ConcurrentWritersLoseNothing) {
   constexpr int kWriters = 3, kValues = 40;
   std::vector<pid_t> children;
-  for (int writer = 0; writer < kWriters; ++writer) {
-    pid_t child = fork();
-    if (child == 0) {
+  for (int writer = 0; writer < kWriters; ++writer)
+    if ((children.emplace_back(fork())) == 0) {
       HKEY key = createKey("SOFTWARE\\Busy");
-      for (int i = 0; i < kValues; ++i) {
-        std::string name = "w" + std::to_string(writer) + "_" + std::to_string(i);
-        if (putDword(key, name.c_str(), static_cast<DWORD>(i)) != ERROR_SUCCESS)
+      for (int i = 0; i < kValues; ++i)
+        if (putDword(key, ("w" + std::to_string(writer) + "_" + std::to_string(i)).c_str(), i) !=
+            ERROR_SUCCESS)
           _exit(1);
-      }
       _exit(0);
     }
-    children.push_back(child);
+  for (pid_t child : children) {
+    int status = 0;
+    waitpid(child, &status, 0);
+    ASSERT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
   }
-  for (pid_t child : children)
-    ASSERT_EQ(waitExit(child), 0);
-  HiveFile file(worldRoot() + "/system.reg", "HKEY_LOCAL_MACHINE");
+  HiveFile file(worldRoot() + "/system.reg", kHive);
   ASSERT_EQ(file.read([](const Key &tree) -> LONG {
     const Key *busy = posix::hive::findKey(tree, {"SOFTWARE", "Busy"});
     EXPECT_NE(busy, nullptr);
@@ -116,24 +126,19 @@ TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
     return ERROR_SUCCESS;
   };
   {
-    HiveFile file(hivePath, "HKEY_LOCAL_MACHINE");
+    HiveFile file(hivePath, kHive);
     ASSERT_EQ(file.update([&](Key &t, bool &c) { return setGeneration(t, c, 0); }), ERROR_SUCCESS);
   }
   std::mt19937 random(12345);
   for (int round = 0; round < 6; ++round) {
-    pid_t child = fork();
-    if (child == 0) {
-      HiveFile file(hivePath, "HKEY_LOCAL_MACHINE");
+    killMidway(random, [&] {
+      HiveFile file(hivePath, kHive);
       for (DWORD generation = 1;; ++generation)
         file.update([&](Key &t, bool &c) { return setGeneration(t, c, generation); });
-    }
-    usleep(20000 + random() % 80000);
-    kill(child, SIGKILL);
-    waitpid(child, nullptr, 0);
-
+    });
     Key tree;
     std::string error;
-    ASSERT_TRUE(posix::hive::parseHive(readHostFile(hivePath), "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    ASSERT_TRUE(posix::hive::parseHive(readHostFile(hivePath), kHive, tree, error)) << error;
     const Key *load = posix::hive::findKey(tree, {"SOFTWARE", "Load"});
     ASSERT_NE(load, nullptr);
     ASSERT_EQ(load->subkeys.size(), static_cast<size_t>(kKeys));
@@ -147,16 +152,13 @@ TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
-// A batch keeps its changes in this process until it ends, then writes each
-// changed hive once; other readers see nothing of it before that and all of it
-// after.
+// A batch writes each changed hive once when it ends; others see none of it before, all after.
 TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
   // What a reader with a cache of its own (as another process) finds.
   auto othersSee = [this](const char *value) {
     Key tree;
     std::string error;
-    EXPECT_TRUE(posix::hive::loadHive(worldRoot() + "/system.reg", "HKEY_LOCAL_MACHINE", tree, error))
-        << error;
+    EXPECT_TRUE(posix::hive::loadHive(worldRoot() + "/system.reg", kHive, tree, error)) << error;
     const Key *batch = posix::hive::findKey(tree, {"SOFTWARE", "Batch"});
     return batch != nullptr && batch->values.count(posix::hive::fold(value)) != 0;
   };
@@ -189,14 +191,14 @@ TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
 // ---- the change log beside the hive
 
 std::string formatted(const Key &tree) {
-  return posix::hive::formatHive(tree, "HKEY_LOCAL_MACHINE");
+  return posix::hive::formatHive(tree, kHive);
 }
 
 // The registry as a reader with a cache of its own finds it: hive and log.
 std::string replayed(const std::string &hivePath) {
   Key tree;
   std::string error;
-  EXPECT_TRUE(posix::hive::loadHive(hivePath, "HKEY_LOCAL_MACHINE", tree, error)) << error;
+  EXPECT_TRUE(posix::hive::loadHive(hivePath, kHive, tree, error)) << error;
   return formatted(tree);
 }
 
@@ -204,9 +206,8 @@ bool exists(const std::string &path) {
   return std::filesystem::exists(path);
 }
 
-// Each kind of change, with names and data the text form must escape: what
-// another reader replays from the log is exactly the writer's tree, and once
-// the writer ends the hive file is that tree written whole, with no log left.
+// Each kind of change, with names the text form must escape: the log replays to the writer's
+// exact tree, and when the writer ends the hive is that tree written whole, with no log left.
 TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
   const std::string hivePath = worldRoot() + "/system.reg";
   using posix::hive::Value;
@@ -250,7 +251,7 @@ TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
   };
   std::string writerTree;
   {
-    HiveFile file(hivePath, "HKEY_LOCAL_MACHINE");
+    HiveFile file(hivePath, kHive);
     for (const auto &row : changes) {
       ASSERT_EQ(file.change([&](const Key &, posix::hive::Change &c) -> LONG {
         apply(row, c);
@@ -272,17 +273,11 @@ TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
   EXPECT_FALSE(exists(hivePath + ".log"));
 }
 
-// A writer killed in the middle of a record leaves it cut off: readers take
-// the records before it and nothing of it; the next writer writes the hive
-// whole instead of appending after it.
+// A record cut off by a kill is ignored; the next writer writes the hive whole instead of appending.
 TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
   const std::string hivePath = worldRoot() + "/system.reg";
-  pid_t child = fork();
-  if (child == 0) {
-    HKEY key = createKey("SOFTWARE\\Cut");
-    _exit(putDword(key, "Whole", 1) == ERROR_SUCCESS ? 0 : 1); // no clean-up: the log stays
-  }
-  ASSERT_EQ(waitExit(child), 0);
+  // No clean-up in the child: the log stays.
+  ASSERT_EQ(inChild([] { return putDword(createKey("SOFTWARE\\Cut"), "Whole", 1) == ERROR_SUCCESS; }), 0);
   const std::string whole = replayed(hivePath);
   ASSERT_NE(whole.find("\"Whole\"=dword:00000001"), std::string::npos);
   const std::string record = "[HKEY_LOCAL_MACHINE\\SOFTWARE\\Cut]\n\"Torn\"=dword:00000002\n";
@@ -305,25 +300,20 @@ TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
-// A writer killed after writing the hive whole but before removing the log
-// leaves a log of changes the hive already holds. Replayed again they would
-// bring back what was changed after them, so readers ignore that log, and the
-// next change starts a new one.
+// A log left beside the hive it was folded into would bring back later-changed
+// values if replayed: readers ignore it and the next change starts a new one.
 TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
   const std::string hivePath = worldRoot() + "/system.reg";
-  std::string oldLog;
-  pid_t child = fork();
-  if (child == 0) {
-    HKEY key = createKey("SOFTWARE\\Stale");
-    bool ok = putDword(key, "Value", 1) == ERROR_SUCCESS;
-    oldLog = readHostFile(hivePath + ".log");
-    ok = ok && RegDeleteValueA(key, "Value") == ERROR_SUCCESS;
-    writeHostFile(worldRoot() + "/old.log", oldLog);
-    _exit(ok ? 0 : 1);
-  }
-  ASSERT_EQ(waitExit(child), 0);
+  ASSERT_EQ(inChild([&] {
+              HKEY key = createKey("SOFTWARE\\Stale");
+              bool ok = putDword(key, "Value", 1) == ERROR_SUCCESS;
+              std::string oldLog = readHostFile(hivePath + ".log");
+              ok = ok && RegDeleteValueA(key, "Value") == ERROR_SUCCESS;
+              return writeHostFile(worldRoot() + "/old.log", oldLog) && ok;
+            }),
+            0);
   {
-    HiveFile fold(hivePath, "HKEY_LOCAL_MACHINE"); // folds when it ends, as a process does
+    HiveFile fold(hivePath, kHive); // folds when it ends, as a process does
     ASSERT_EQ(fold.change([](const Key &, posix::hive::Change &c) -> LONG {
       c.createKey({"SOFTWARE", "Stale", "Folded"});
       return ERROR_SUCCESS;
@@ -343,30 +333,22 @@ TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
-// A writer appending to the log, killed at random moments: what is left reads
-// as a prefix of its changes, none lost before the last one seen, and the
-// next process goes on from there.
+// A log writer killed at random leaves a prefix of its changes; the next process goes on from it.
 TEST_F(SharingTest, KilledLogWriterLeavesAPrefixOfItsChanges) {
   const std::string hivePath = worldRoot() + "/system.reg";
   std::mt19937 random(777);
   DWORD highest = 0;
   for (int round = 0; round < 6; ++round) {
-    pid_t child = fork();
-    if (child == 0) {
+    killMidway(random, [&] {
       HKEY key = createKey("SOFTWARE\\Prefix");
-      for (DWORD n = highest + 1;; ++n) {
-        std::string name = "V" + std::to_string(n);
-        putDword(key, name.c_str(), n);
-      }
-    }
-    usleep(20000 + random() % 60000);
-    kill(child, SIGKILL);
-    waitpid(child, nullptr, 0);
+      for (DWORD n = highest + 1;; ++n)
+        putDword(key, ("V" + std::to_string(n)).c_str(), n);
+    });
     Key tree;
     std::string error;
-    ASSERT_TRUE(posix::hive::loadHive(hivePath, "HKEY_LOCAL_MACHINE", tree, error)) << error;
-    ASSERT_TRUE(posix::hive::parseHive(readHostFile(hivePath), "HKEY_LOCAL_MACHINE", tree, error)) << error;
-    ASSERT_TRUE(posix::hive::loadHive(hivePath, "HKEY_LOCAL_MACHINE", tree, error)) << error;
+    ASSERT_TRUE(posix::hive::loadHive(hivePath, kHive, tree, error)) << error;
+    ASSERT_TRUE(posix::hive::parseHive(readHostFile(hivePath), kHive, tree, error)) << error;
+    ASSERT_TRUE(posix::hive::loadHive(hivePath, kHive, tree, error)) << error;
     const Key *prefix = posix::hive::findKey(tree, {"SOFTWARE", "Prefix"});
     size_t count = prefix == nullptr ? 0 : prefix->values.size();
     ASSERT_GE(count, highest);
