@@ -13,6 +13,12 @@
 namespace kxlsim::test {
 namespace {
 
+// Every part is somewhere in the diff's text.
+void expectParts(const std::string &text, std::initializer_list<const char *> parts) {
+  for (const char *part : parts)
+    EXPECT_NE(text.find(part), std::string::npos) << part << "\n---\n" << text;
+}
+
 // The demo world as built, and a copy of it for the case to change.
 class WorldPair : public ::testing::Test {
 protected:
@@ -51,15 +57,11 @@ TEST_F(WorldPair, ChangedValuesAreNamedByKeyAndMachine) {
   ASSERT_TRUE(w_.ok());
   std::string text;
   EXPECT_EQ(diff(text), 1);
-  EXPECT_NE(
-      text.find("registry ~ HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1 \"State\": dword:1 -> dword:4\n"),
-      std::string::npos)
-      << text;
-  EXPECT_NE(text.find("registry ~ [WINSRV2] HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1 \"ImagePath\": "
-                      "\"C:\\Program Files\\ZAV\\KXL95\\bin\\kxlsyscs.exe\" -> "
-                      "\"C:\\Program Files\\ZAV\\KXL101\\bin\\kxlsyscs.exe\""),
-            std::string::npos)
-      << text;
+  expectParts(text,
+              {"registry ~ HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1 \"State\": dword:1 -> dword:4\n",
+               "registry ~ [WINSRV2] HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1 \"ImagePath\": "
+               "\"C:\\Program Files\\ZAV\\KXL95\\bin\\kxlsyscs.exe\" -> "
+               "\"C:\\Program Files\\ZAV\\KXL101\\bin\\kxlsyscs.exe\""});
 }
 
 TEST_F(WorldPair, AddedKeysAndValuesShowInBothDirections) {
@@ -69,16 +71,11 @@ TEST_F(WorldPair, AddedKeysAndValuesShowInBothDirections) {
   ASSERT_TRUE(w_.ok());
   std::string text;
   EXPECT_EQ(diff(text), 1);
-  EXPECT_NE(text.find("registry + HKLM\\SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1\n"),
-            std::string::npos)
-      << text;
-  EXPECT_NE(text.find("+ \"KXLCOMM\" = \"tcp\""), std::string::npos) << text;
-  EXPECT_NE(text.find("registry + HKCU\\Software\\Test"), std::string::npos) << text;
-  EXPECT_NE(text.find("\"List\" = multi:[\"a\", \"b\"]"), std::string::npos) << text;
+  expectParts(text, {"registry + HKLM\\SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1\n",
+                     "+ \"KXLCOMM\" = \"tcp\"", "registry + HKCU\\Software\\Test",
+                     "\"List\" = multi:[\"a\", \"b\"]"});
   EXPECT_EQ(diff(text, true), 1);
-  EXPECT_NE(text.find("registry - HKLM\\SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1\n"),
-            std::string::npos)
-      << text;
+  expectParts(text, {"registry - HKLM\\SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\INST1\n"});
 }
 
 TEST_F(WorldPair, FileChangesAreListedTextByLineBinaryBySizeAndHash) {
@@ -96,37 +93,31 @@ TEST_F(WorldPair, FileChangesAreListedTextByLineBinaryBySizeAndHash) {
 
   std::string text;
   EXPECT_EQ(diff(text), 1);
-  EXPECT_NE(text.find("file + C:\\Program Files\\ZAV\\KXL95\\INST1\\notes.log (5 bytes, fnv "),
-            std::string::npos)
-      << text;
-  EXPECT_NE(text.find(")\n       + new\n"), std::string::npos) << "a new small text file shows its lines";
-  EXPECT_NE(text.find("file - C:\\Program Files\\ZAV\\KXL95\\function\\kxludf.dll\n"), std::string::npos)
-      << text;
-  EXPECT_NE(text.find("file ~ C:\\Program Files\\ZAV\\KXL95\\INST1\\kxlsystm (16384 bytes, fnv "),
-            std::string::npos)
-      << text;
-  EXPECT_NE(text.find("file ~ C:\\windows\\system32\\drivers\\etc\\services\n       + KXL_INST9 61000/tcp\n"),
-            std::string::npos)
-      << text;
+  expectParts(text, {"file + C:\\Program Files\\ZAV\\KXL95\\INST1\\notes.log (5 bytes, fnv ",
+                     ")\n       + new\n", // a new small text file shows its lines
+                     "file - C:\\Program Files\\ZAV\\KXL95\\function\\kxludf.dll\n",
+                     "file ~ C:\\Program Files\\ZAV\\KXL95\\INST1\\kxlsystm (16384 bytes, fnv ",
+                     "file ~ C:\\windows\\system32\\drivers\\etc\\services\n       + KXL_INST9 61000/tcp\n"});
 }
 
 TEST_F(WorldPair, RegistryFilesAreNotListedAsFiles) {
   w_.writeText("C:\\x.txt", "");
   std::string text;
   diff(text);
-  EXPECT_NE(text.find("file + C:\\x.txt (0 bytes"), std::string::npos) << text;
+  expectParts(text, {"file + C:\\x.txt (0 bytes"});
   EXPECT_EQ(text.find("system.reg"), std::string::npos) << "hives are compared as registry, not as files";
 }
 
 TEST(DisplayKeyPath, MachinesAreNamedAndRootsShortened) {
-  EXPECT_EQ(displayKeyPath("HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV"), "HKLM\\SOFTWARE\\ZAV");
-  EXPECT_EQ(displayKeyPath("HKEY_CURRENT_USER\\Software"), "HKCU\\Software");
-  EXPECT_EQ(
-      displayKeyPath("HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV\\KXLSIM\\Machines\\WINSRV2\\SOFTWARE\\ZAV\\KXL"),
-      "[WINSRV2] HKLM\\SOFTWARE\\ZAV\\KXL");
-  EXPECT_EQ(displayKeyPath("HKEY_LOCAL_MACHINE\\software\\zav\\kxlsim\\machines\\node3"), "[node3] HKLM");
-  EXPECT_EQ(displayKeyPath("HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV\\KXLSIM\\Machines"),
-            "HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Machines");
+  const std::pair<const char *, const char *> rows[] = {
+      {"HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV", "HKLM\\SOFTWARE\\ZAV"},
+      {"HKEY_CURRENT_USER\\Software", "HKCU\\Software"},
+      {"HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV\\KXLSIM\\Machines\\WINSRV2\\SOFTWARE\\ZAV\\KXL",
+       "[WINSRV2] HKLM\\SOFTWARE\\ZAV\\KXL"},
+      {"HKEY_LOCAL_MACHINE\\software\\zav\\kxlsim\\machines\\node3", "[node3] HKLM"},
+      {"HKEY_LOCAL_MACHINE\\SOFTWARE\\ZAV\\KXLSIM\\Machines", "HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Machines"}};
+  for (const auto &[path, shown] : rows)
+    EXPECT_EQ(displayKeyPath(path), shown);
 }
 
 } // namespace

@@ -6,30 +6,21 @@
 
 #include <gtest/gtest.h>
 
-#include <cstdio>
 #include <filesystem>
 
 namespace {
 
 class Tracing : public kxltest::ProductWorld {
 protected:
-  void SetUp() override {
-    ProductWorld::SetUp();
-    std::string name = ::testing::UnitTest::GetInstance()->current_test_info()->name();
-    tracePath_ = (std::filesystem::temp_directory_path() / ("kxltrace_" + name + ".txt")).string();
-    std::remove(tracePath_.c_str());
-  }
   void TearDown() override {
-    kxltest::setProcessVariable("KXLTRACE", nullptr);
-    kxlprod::resetTrace();
-    std::remove(tracePath_.c_str());
+    traceTo(nullptr);
     ProductWorld::TearDown();
   }
   void traceTo(const char *path) {
     kxltest::setProcessVariable("KXLTRACE", path);
     kxlprod::resetTrace();
   }
-  std::string tracePath_;
+  const std::string tracePath_ = world_.scratch("trace.txt"); // outside the world, gone with it
 };
 
 TEST_F(Tracing, EveryHookWritesOneLine) {

@@ -104,11 +104,9 @@ TEST_F(Files, DirectoryTreesAreCopiedWholeAndDeletedWhole) {
   EXPECT_FALSE(pathExists("C:\\inst\\INST1\\cfg\\inner"));
 
   // A listing that fails part way fails the copy instead of ending it early.
-  kxltest::setProcessVariable("KXLSIM_FAIL", "FindNextFileA:4");
-  kxlsim::resetFaults();
+  failCalls("FindNextFileA:4");
   EXPECT_NE(0, sqlocopydir("C:\\partial", "C:\\inst\\INST1", 0));
-  kxltest::setProcessVariable("KXLSIM_FAIL", nullptr);
-  kxlsim::resetFaults();
+  failCalls(nullptr);
 
   ASSERT_EQ(0, sqlodeletedir("C:\\backup"));
   EXPECT_FALSE(pathExists("C:\\backup"));
@@ -119,9 +117,8 @@ TEST_F(Files, DirectoryTreesAreCopiedWholeAndDeletedWhole) {
   EXPECT_TRUE(pathExists("C:\\inst"));
 }
 
-// A tree copy checks the target's drive for room first and writes nothing
-// when there is too little, or when the free space cannot be read; what the
-// target holds already counts as room, since its files are replaced.
+// Room on the target's drive is checked before anything is written (an unreadable free space
+// is no room); what the target holds already counts, since its files are replaced.
 TEST_F(Files, TreeCopiesNeedRoomForTheTreeBeforeWritingAnything) {
   makeTree("C:\\inst\\INST1"); // three files, five folders: 8 blocks of 4 KiB
   const std::string drive = "SOFTWARE\\ZAV\\KXLSIM\\Drives\\C";
@@ -135,12 +132,10 @@ TEST_F(Files, TreeCopiesNeedRoomForTheTreeBeforeWritingAnything) {
   for (const Case &c : cases) {
     SCOPED_TRACE(c.freeBytes);
     setString(drive, "FreeBytes", c.freeBytes);
-    kxltest::setProcessVariable("KXLSIM_FAIL", c.fault);
-    kxlsim::resetFaults();
+    failCalls(c.fault);
     EXPECT_EQ(c.rc, sqlocopydir("C:\\copy", "C:\\inst\\INST1", 0));
     EXPECT_EQ(c.rc == 0, pathExists("C:\\copy")) << "nothing written when it fails";
-    kxltest::setProcessVariable("KXLSIM_FAIL", nullptr);
-    kxlsim::resetFaults();
+    failCalls(nullptr);
     sqlodeletedir("C:\\copy");
   }
   // Copied back over itself (a restore) it needs no room beyond what is there.

@@ -5,7 +5,6 @@
 
 #include <gtest/gtest.h>
 
-#include <cstdio>
 #include <string>
 
 #include <unistd.h>
@@ -32,9 +31,8 @@ TEST(Compare, IgnoresCaseOverTheGivenLength) {
       {"", "SERVER", 0, false},
       {"", "", 0, true},
   };
-  for (const Case &c : cases) {
+  for (const Case &c : cases)
     EXPECT_EQ(c.equal, sqlomcpi(c.a, c.b, c.length) == 0) << c.a << " / " << c.b << " / " << c.length;
-  }
   EXPECT_LT(sqlomcpi("a", "B", 1), 0);
   EXPECT_GT(sqlomcpi("c", "B", 1), 0);
 }
@@ -51,25 +49,28 @@ TEST(Upper, ConvertsInPlaceWithinTheLength) {
 }
 
 TEST(InstanceNames, AcceptOnlyShortNamesOfNameCharacters) {
-  for (const char *good : {"KXL", "INST1", "A", "ABCDEFGH", "a_b$c#d@"}) {
+  for (const char *good : {"KXL", "INST1", "A", "ABCDEFGH", "a_b$c#d@"})
     EXPECT_EQ(0, sqloacss(good, 16)) << good;
-  }
-  for (const char *bad : {"", "1INST", "_INST", "ABCDEFGHI", "IN ST", "INST-1", "INST.1", "\xC4INST"}) {
+  for (const char *bad : {"", "1INST", "_INST", "ABCDEFGHI", "IN ST", "INST-1", "INST.1", "\xC4INST"})
     EXPECT_NE(0, sqloacss(bad, 16)) << bad;
-  }
   EXPECT_NE(0, sqloacss(nullptr, 16));
 }
 
 TEST(Languages, LocaleTextsBecomeDirectoryNames) {
-  EXPECT_EQ("de_DE", kxlprod::normalizeLanguage("de_DE.UTF-8@euro"));
-  EXPECT_EQ("pt_BR", kxlprod::normalizeLanguage("PT-br"));
-  EXPECT_EQ("fr", kxlprod::normalizeLanguage("fr"));
-  EXPECT_EQ("en_US", kxlprod::normalizeLanguage("C.UTF-8"));
-  EXPECT_EQ("en_US", kxlprod::normalizeLanguage("POSIX"));
-  EXPECT_EQ("es_419", kxlprod::normalizeLanguage("es_419"));
-  for (const char *bad : {"", "english", "de_", "../x", "d3_DE", "de_DE_X"}) {
-    EXPECT_EQ("", kxlprod::normalizeLanguage(bad)) << bad;
-  }
+  const std::pair<const char *, const char *> rows[] = {{"de_DE.UTF-8@euro", "de_DE"},
+                                                        {"PT-br", "pt_BR"},
+                                                        {"fr", "fr"},
+                                                        {"C.UTF-8", "en_US"},
+                                                        {"POSIX", "en_US"},
+                                                        {"es_419", "es_419"},
+                                                        {"", ""},
+                                                        {"english", ""},
+                                                        {"de_", ""},
+                                                        {"../x", ""},
+                                                        {"d3_DE", ""},
+                                                        {"de_DE_X", ""}};
+  for (const auto &[locale, directory] : rows)
+    EXPECT_EQ(directory, kxlprod::normalizeLanguage(locale)) << locale;
 }
 
 class EnvironmentLanguage : public kxltest::ProductWorld {
@@ -141,12 +142,10 @@ TEST_F(PipedInput, PasswordIsCutToTheBufferAndEndOfInputFails) {
 }
 
 TEST(TextFaults, InjectedFailureOfTheComparison) {
-  kxltest::setProcessVariable("KXLSIM_FAIL", "sqlomcpi:1");
-  kxlsim::resetFaults();
+  kxltest::WorldAccess::failCalls("sqlomcpi:1");
   EXPECT_NE(0, sqlomcpi("q", "q", 1));
   EXPECT_EQ(0, sqlomcpi("q", "q", 1));
-  kxltest::setProcessVariable("KXLSIM_FAIL", nullptr);
-  kxlsim::resetFaults();
+  kxltest::WorldAccess::failCalls(nullptr);
 }
 
 } // namespace
