@@ -72,6 +72,13 @@ Outcome DriverTest::run(const std::vector<std::string> &args, const std::string 
   return outcome;
 }
 
+void DriverTest::expectFailure(const Outcome &outcome, long long probe, long long rc) {
+  ASSERT_TRUE(outcome.driverRan) << outcome.out << outcome.err;
+  ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
+  EXPECT_EQ(outcome.failures[0].probe, probe);
+  EXPECT_EQ(outcome.driverResult, rc);
+}
+
 std::string DriverTest::worldChanges() const {
   static const char *const kIgnored[] = {"events.jsonl", "kxldiag.log", "C:\\KXLDBMIG.TXT",
                                          "C:\\upgrade.log"};

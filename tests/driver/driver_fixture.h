@@ -36,6 +36,9 @@ protected:
   Outcome run(const std::vector<std::string> &args, const std::string &faults = "",
               const std::string &kill = "");
 
+  // The driver failed once, at `probe`, with `rc`, and returned it.
+  static void expectFailure(const Outcome &outcome, long long probe, long long rc);
+
   Tree tree(const std::string &windowsPath) const;
   bool exists(const std::string &windowsPath) const;
   // The whole content of a file ("" when it cannot be read).

@@ -105,11 +105,8 @@ public: // for the cases' set-up
   using CommandWorld::world;
 };
 
-// Everything the upgrade of CINST1 changes in the registry: its profile key
-// moved on both nodes, its registration and both nodes' services re-pointed,
-// "KXL Server" registered and its one resource re-created under it (same
-// group, same dependencies: no line for them). It stays on E: though -p names
-// another path; the other resources are untouched.
+// CINST1's registry changes on both nodes; its resource keeps group and
+// dependencies (no line) and stays on E: though -p names another path.
 const char kSingleChanges[] = R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST1
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST1 "SeparateMonitor": dword:0 -> dword:1
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST1 "Type": "KXL" -> "KXL Server"
@@ -145,11 +142,8 @@ TEST_F(ClusterE2eTest, ClusteredInstanceUpgradesAndASecondRunConvertsNothing) {
   EXPECT_EQ(changesSince(converted).find("Cluster"), std::string::npos);
 }
 
-// CINST2's partitions run on both nodes, which are also its cluster's
-// machines: each machine's profile key moves once; every partition's service
-// is re-pointed on every node, under the account given; the other node's
-// cluster profile is made the local one again. Partition 2's resource is of another type
-// and stays, and so do the other instance's CINST3 and CINST3-0.
+// CINST2's partitions on both nodes (also its cluster's machines): each key moves
+// once; partition 2's resource and CINST3's are of other types and stay.
 const char kPartitionedChanges[] = R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST2
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-0 "SeparateMonitor": dword:0 -> dword:1
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-0 "Type": "KXL" -> "KXL Server"
@@ -241,9 +235,7 @@ TEST_F(ClusterE2eTest, FailedLibraryCompareStillFindsTheInstanceResource) {
   }
 }
 
-// One way the cluster step can end, driven through the command: the world's
-// change and the faults before the run, what the step reports, what the
-// cluster holds afterwards, and the repair after which a plain run succeeds.
+// One way the cluster step can end, and the repair after which a plain run succeeds.
 struct StepCase {
   const char *name;
   const ClusterUpgrade *upgrade;

@@ -11,12 +11,8 @@
 
 namespace {
 
-// Everything the upgrade changes, and nothing else: the profile key moved,
-// the instance registered under the current copy, its service re-pointed (its
-// start type unchanged), the converted kxlsystm, the carried files and the
-// function directory, the database check's own files, the audit settings the
-// audit tool rewrote, and the events of the programs run and the audit. No
-// backup directory is left under C:\windows\temp.
+// Everything the upgrade changes, and nothing else (no backup is left in
+// C:\windows\temp).
 const char kExpectedChanges[] = R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\INST1
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\INST1 "Copy": "KXL95" -> "KXL101"
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\INST1 "Directory": "C:\Program Files\ZAV\KXL95\INST1" -> "C:\Program Files\ZAV\KXL101\INST1"

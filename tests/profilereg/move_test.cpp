@@ -9,22 +9,19 @@ using namespace kxltest;
 class MoveProfile : public ProfileWorld {};
 
 TEST_F(MoveProfile, Version8SingleCopyKeyMovesAndIsDeleted) {
-  ownBy(KXLI_V8_COPY_NAME);
-  seedProfile(kLocal, kV8);
+  ownWith(KXLI_V8_COPY_NAME, kV8, {kLocal});
   EXPECT_EQ(0, moveInstanceProfile(context_, options_));
   expectMoved(kLocal, kV8, kCurrent);
 }
 
 TEST_F(MoveProfile, InstanceOfTheCurrentCopyStaysWhereItIs) {
-  ownBy(kCurrent);
-  seedProfile(kLocal, kCurrent);
+  ownWith(kCurrent, kCurrent, {kLocal});
   EXPECT_EQ(0, moveInstanceProfile(context_, options_));
   expectProfileAt(kLocal, kCurrent);
 }
 
 TEST_F(MoveProfile, NewKeyThatCannotBeCreatedChangesNothing) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
+  ownWith(kOld, kOld, {kLocal});
   startTrace();
   failCalls("RegCreateKeyExA:1");
   EXPECT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
@@ -35,16 +32,13 @@ TEST_F(MoveProfile, NewKeyThatCannotBeCreatedChangesNothing) {
 // Without the owning copy's version the old key is unknown: nothing is moved.
 TEST_F(MoveProfile, OwnerWithoutVersionIsRefused) {
   registerCopy("KXLNOVER", "C:\\KXLNOVER");
-  ownBy("KXLNOVER");
-  seedProfile(kLocal, kV8);
+  ownWith("KXLNOVER", kV8, {kLocal});
   EXPECT_EQ(UPGRADE_RC_NO_COPY, moveInstanceProfile(context_, options_));
   expectUntouched(kLocal, kV8, kCurrent);
 }
 
 TEST_F(MoveProfile, PartitionsSharingAMachineMoveItsKeyOnce) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  seedProfile("M2", kOld);
+  ownWith(kOld, kOld, {kLocal, "M2"});
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostb.zav.test M2 1\n");
   EXPECT_EQ(0, moveInstanceProfile(context_, options_));
   expectMoved(kLocal, kOld, kCurrent);
@@ -52,9 +46,7 @@ TEST_F(MoveProfile, PartitionsSharingAMachineMoveItsKeyOnce) {
 }
 
 TEST_F(MoveProfile, ForceCopyNameGivesOtherHostsAnEmptyPlaceholder) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  seedProfile("M2", kOld);
+  ownWith(kOld, kOld, {kLocal, "M2"});
   options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
   loadNodes("0 HOSTA.ZAV.TEST HOSTA 0\n1 hostb.zav.test M2 0\n");
   EXPECT_EQ(0, moveInstanceProfile(context_, options_));
@@ -75,9 +67,7 @@ TEST_F(MoveProfile, ForceCopyNameGivesOtherHostsAnEmptyPlaceholder) {
 // The drop fails while every old key is still there (the upgrade can be
 // undone whole); once one is gone it goes on past a machine it cannot reach.
 TEST_F(MoveProfile, ForcedKeysDropFailsOnlyBeforeAnyKeyIsGone) {
-  ownBy(kOld);
-  for (const char *machine : {kLocal, "M2", "M3"})
-    seedProfile(machine, kOld);
+  ownWith(kOld, kOld, {kLocal, "M2", "M3"});
   options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostc.zav.test M3 0\n");
   ASSERT_EQ(0, moveInstanceProfile(context_, options_));
@@ -95,8 +85,7 @@ TEST_F(MoveProfile, ForcedKeysDropFailsOnlyBeforeAnyKeyIsGone) {
 }
 
 TEST_F(MoveProfile, ForceCopyNameNeedsTheLocalHostName) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
+  ownWith(kOld, kOld, {kLocal});
   options_.flags |= UPGRADE_FLAG_FORCE_COPY_NAME;
   loadNodes("0 hosta.zav.test HOSTA 0\n");
   failCalls("sqloPdbTcpIpGetFullHostName:1");
@@ -106,9 +95,7 @@ TEST_F(MoveProfile, ForceCopyNameNeedsTheLocalHostName) {
 }
 
 TEST_F(MoveProfile, UnreachablePartitionMachineStopsTheMove) {
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  seedProfile("M2", kOld);
+  ownWith(kOld, kOld, {kLocal, "M2"});
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostc.zav.test M3 0\n2 hostb.zav.test M2 0\n");
   startTrace();
   EXPECT_EQ(UPGRADE_RC_MACHINE_REGISTRY, moveInstanceProfile(context_, options_));
@@ -119,9 +106,7 @@ TEST_F(MoveProfile, UnreachablePartitionMachineStopsTheMove) {
 
 TEST_F(MoveProfile, ClusteredInstanceMovesOnEveryListedMachine) {
   clusterOn("CLUS1", "M2 hosta M3");
-  ownBy(kOld);
-  for (const char *machine : {kLocal, "M2", "M3"})
-    seedProfile(machine, kOld);
+  ownWith(kOld, kOld, {kLocal, "M2", "M3"});
   EXPECT_EQ(0, moveInstanceProfile(context_, options_));
   for (const char *machine : {kLocal, "M2", "M3"})
     expectMoved(machine, kOld, kCurrent);
@@ -130,9 +115,7 @@ TEST_F(MoveProfile, ClusteredInstanceMovesOnEveryListedMachine) {
 
 TEST_F(MoveProfile, ClusterMachineUnreachableAfterTheLocalMove) {
   clusterOn("CLUS1", "HOSTA M9 M2");
-  ownBy(kOld);
-  seedProfile(kLocal, kOld);
-  seedProfile("M2", kOld);
+  ownWith(kOld, kOld, {kLocal, "M2"});
   startTrace();
   EXPECT_EQ(UPGRADE_RC_MACHINE_REGISTRY, moveInstanceProfile(context_, options_));
   expectMoved(kLocal, kOld, kCurrent);
@@ -142,9 +125,7 @@ TEST_F(MoveProfile, ClusterMachineUnreachableAfterTheLocalMove) {
 
 TEST_F(MoveProfile, PartitionMachinesThatAreAlsoClusterMachinesMoveOnce) {
   clusterOn("CLUS1", "hosta m2 M3 M2");
-  ownBy(kOld);
-  for (const char *machine : {kLocal, "M2", "M3"})
-    seedProfile(machine, kOld);
+  ownWith(kOld, kOld, {kLocal, "M2", "M3"});
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n");
   EXPECT_EQ(0, moveInstanceProfile(context_, options_));
   for (const char *machine : {kLocal, "M2", "M3"})

@@ -50,6 +50,13 @@ protected:
     context_.instance = instance_.get();
   }
 
+  // Owned by `copy`, with the profile key seeded under `under` on each of `machines`.
+  void ownWith(const char *copy, const char *under, std::initializer_list<const char *> machines) {
+    ownBy(copy);
+    for (const char *machine : machines)
+      seedProfile(machine, under);
+  }
+
   // A path of `machine`'s HKEY_LOCAL_MACHINE ("" the local machine).
   static std::string at(const std::string &machine, const std::string &path) {
     return machine.empty() ? path : "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + machine + "\\" + path;
@@ -118,7 +125,6 @@ protected:
   static DWORD serviceStart(const std::string &name) {
     return getDword("SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name, "Start");
   }
-
 
   std::unique_ptr<InstallCopy> owner_;
   std::unique_ptr<IKXLINSTANCE> instance_;

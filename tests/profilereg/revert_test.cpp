@@ -11,9 +11,7 @@ using namespace kxltest;
 class RevertProfile : public ProfileWorld {};
 
 TEST_F(RevertProfile, UnreachableMachineDoesNotStopTheOthersComingBack) {
-  ownBy(kOld);
-  for (const char *machine : {kLocal, "M3"})
-    seedProfile(machine, kCurrent);
+  ownWith(kOld, kCurrent, {kLocal, "M3"});
   loadNodes("0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M9 0\n2 hostc.zav.test M3 0\n");
   startTrace();
   EXPECT_EQ(UPGRADE_RC_MACHINE_REGISTRY, revertInstanceProfile(context_, options_));
@@ -23,8 +21,7 @@ TEST_F(RevertProfile, UnreachableMachineDoesNotStopTheOthersComingBack) {
 }
 
 TEST_F(RevertProfile, Version8OwnerGetsItsSingleCopyKeyAndShortDisplayName) {
-  ownBy(KXLI_V8_COPY_NAME);
-  seedProfile(kLocal, kCurrent);
+  ownWith(KXLI_V8_COPY_NAME, kCurrent, {kLocal});
   addService(kLocal, "INST1", "C:\\KXL101\\bin\\kxlsyscs.exe");
   context_.serviceStartType = SQLO_SVC_DEMAND_START;
   EXPECT_EQ(0, revertInstanceProfile(context_, options_));
@@ -35,8 +32,7 @@ TEST_F(RevertProfile, Version8OwnerGetsItsSingleCopyKeyAndShortDisplayName) {
 }
 
 TEST_F(RevertProfile, FailedCopyBackKeepsTheCurrentKeyAndTheService) {
-  ownBy(kOld);
-  seedProfile(kLocal, kCurrent);
+  ownWith(kOld, kCurrent, {kLocal});
   addService(kLocal, "INST1", "C:\\KXL101\\bin\\kxlsyscs.exe");
   startTrace();
   failCalls("SHCopyKeyA:1");
@@ -47,9 +43,7 @@ TEST_F(RevertProfile, FailedCopyBackKeepsTheCurrentKeyAndTheService) {
 }
 
 TEST_F(RevertProfile, PartitionServicesOnEveryMachine) {
-  ownBy(kOld);
-  for (const char *machine : {kLocal, "M2", "M3"})
-    seedProfile(machine, kCurrent);
+  ownWith(kOld, kCurrent, {kLocal, "M2", "M3"});
   setString(at("M2", std::string(kRoot) + "\\GLOBAL_PROFILE"), "KXLPATH", "D:\\KXLOLD");
   loadNodes(
       "0 hosta.zav.test HOSTA 0\n1 hostb.zav.test M2 0\n2 hostb.zav.test M2 1\n3 hostc.zav.test M3 0\n");

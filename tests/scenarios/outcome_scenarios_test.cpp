@@ -33,18 +33,22 @@ protected:
   static bool has(const std::string &line, const std::string &name, const std::string &value) {
     return line.find(field(name, value)) != std::string::npos;
   }
+  // The driver was handed each field with its value.
+  static void expectHanded(const RunResult &r, std::vector<std::pair<std::string, std::string>> fields) {
+    for (const auto &[name, value] : fields)
+      EXPECT_TRUE(has(handedOver(r), name, value)) << handedOver(r);
+  }
 };
 
 TEST_F(OutcomeScenario, SuccessMovesTheProfileUnderTheCurrentCopy) {
   RunResult r = run({"inst1"});
   EXPECT_EQ(r.out, kxltest::kSuccessText);
   EXPECT_EQ(r.result, 0);
-  std::string driver = handedOver(r);
-  EXPECT_TRUE(has(driver, "profile", "C:\\\\Program Files\\\\ZAV\\\\KXL101")) << driver;
-  EXPECT_TRUE(has(driver, "flags", "0x0005")) << driver;
-  EXPECT_TRUE(has(driver, "copy_path", "C:\\\\Program Files\\\\ZAV\\\\KXL95")) << driver;
-  EXPECT_TRUE(has(driver, "node_type", "1")) << driver;
-  EXPECT_TRUE(has(driver, "kxlinstance", "INST1")) << driver;
+  expectHanded(r, {{"profile", "C:\\\\Program Files\\\\ZAV\\\\KXL101"},
+                   {"flags", "0x0005"},
+                   {"copy_path", "C:\\\\Program Files\\\\ZAV\\\\KXL95"},
+                   {"node_type", "1"},
+                   {"kxlinstance", "INST1"}});
 
   removeCatalogs();
   EXPECT_EQ(run({"INST1"}).out, "KXLIUPGRADE: processing completed successfully.\n");
@@ -52,25 +56,19 @@ TEST_F(OutcomeScenario, SuccessMovesTheProfileUnderTheCurrentCopy) {
 
 TEST_F(OutcomeScenario, ProfilePathRules) {
   // -p naming the instance's own profile path, with a trailing backslash: no move.
-  RunResult same = run({"-p", std::string(kOldCopy) + "\\", "INST1"});
-  EXPECT_TRUE(has(handedOver(same), "flags", "0x0001")) << handedOver(same);
-  EXPECT_TRUE(has(handedOver(same), "profile", "C:\\\\Program Files\\\\ZAV\\\\KXL95")) << handedOver(same);
+  const std::vector<std::pair<std::string, std::string>> kept = {
+      {"flags", "0x0001"}, {"profile", "C:\\\\Program Files\\\\ZAV\\\\KXL95"}};
+  expectHanded(run({"-p", std::string(kOldCopy) + "\\", "INST1"}), kept);
 
   world.makeDirectory("C:\\profiles");
-  RunResult moved = run({"-p", "C:\\profiles\\", "INST1"});
-  EXPECT_TRUE(has(handedOver(moved), "flags", "0x0005")) << handedOver(moved);
-  EXPECT_TRUE(has(handedOver(moved), "profile", "C:\\\\profiles")) << handedOver(moved);
+  expectHanded(run({"-p", "C:\\profiles\\", "INST1"}), {{"flags", "0x0005"}, {"profile", "C:\\\\profiles"}});
 
   // A clustered instance keeps its path.
   world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1", "KXLCLUSTER",
                   "KXLCLUS");
   for (const std::vector<std::string> &args :
-       {std::vector<std::string>{"INST1"}, std::vector<std::string>{"-p", "C:\\profiles", "INST1"}}) {
-    RunResult clustered = run(args);
-    EXPECT_TRUE(has(handedOver(clustered), "flags", "0x0001")) << handedOver(clustered);
-    EXPECT_TRUE(has(handedOver(clustered), "profile", "C:\\\\Program Files\\\\ZAV\\\\KXL95"))
-        << handedOver(clustered);
-  }
+       {std::vector<std::string>{"INST1"}, std::vector<std::string>{"-p", "C:\\profiles", "INST1"}})
+    expectHanded(run(args), kept);
 }
 
 TEST_F(OutcomeScenario, InstanceOnANetworkShareKeepsItsPath) {
@@ -78,8 +76,7 @@ TEST_F(OutcomeScenario, InstanceOnANetworkShareKeepsItsPath) {
   addInstance("SHARED", "KXL95", "\\\\FILER\\KXLPROF\\SHARED", 9, 5);
   RunResult r = run({"SHARED"});
   EXPECT_EQ(r.out, kxltest::kSuccessText);
-  EXPECT_TRUE(has(handedOver(r), "profile", "\\\\\\\\FILER\\\\KXLPROF")) << handedOver(r);
-  EXPECT_TRUE(has(handedOver(r), "flags", "0x0001")) << handedOver(r);
+  expectHanded(r, {{"profile", "\\\\\\\\FILER\\\\KXLPROF"}, {"flags", "0x0001"}});
 }
 
 TEST_F(OutcomeScenario, VersionsThatMayBeUpgraded) {
@@ -99,15 +96,13 @@ TEST_F(OutcomeScenario, InstallerModeGoesOnWithAnInstanceOfTheCurrentCopy) {
   RunResult r = run({"-install", "NEWINST"});
   EXPECT_EQ(r.out, kxltest::kSuccessText);
   EXPECT_EQ(r.result, 0);
-  EXPECT_TRUE(has(handedOver(r), "flags", "0x0009")) << handedOver(r);
+  expectHanded(r, {{"flags", "0x0009"}});
 }
 
 TEST_F(OutcomeScenario, PartitionedInstanceWithAccountReachesTheDriver) {
   RunResult r = run({"-u", "kxlsvc,secret", "INST2"});
   EXPECT_EQ(r.out, kxltest::kSuccessText);
-  EXPECT_TRUE(has(handedOver(r), "partitioned", "1")) << handedOver(r);
-  EXPECT_TRUE(has(handedOver(r), "node_type", "4")) << handedOver(r);
-  EXPECT_TRUE(has(handedOver(r), "ports", "60000:60003")) << handedOver(r);
+  expectHanded(r, {{"partitioned", "1"}, {"node_type", "4"}, {"ports", "60000:60003"}});
   // A port range of one port: the last lies four above it.
   world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1",
                   "KXLPORTRANGE", "50000");

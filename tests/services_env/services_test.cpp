@@ -131,9 +131,9 @@ protected:
     setString(std::string(kMach2) + "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL10\\GLOBAL_PROFILE", "KXLPATH",
               "D:\\KXL10");
     setString(std::string(kSimRoot) + "Hosts\\host2.zav.example", "Computer", "MACH2");
-    addOldService("", "INST1-0");
-    addOldService("", "INST1-1");
-    addOldService(kMach2, "INST1-2");
+    addOldService(serviceKey("INST1-0"), 3);
+    addOldService(serviceKey("INST1-1"), 3);
+    addOldService(kMach2 + serviceKey("INST1-2"), 3);
     bind(4);
     options->partitionedInstance = 1;
     uint32_t entries = 0, maxNode = 0;
@@ -142,14 +142,6 @@ protected:
   }
 
   static std::string nodesPath() { return std::string(kInstanceDir) + "\\kxlnodes.cfg"; }
-
-  static void addOldService(const std::string &machine, const std::string &name) {
-    std::string key = machine + serviceKey(name);
-    setString(key, "ImagePath", std::string(kOldPath) + "\\bin\\kxlsyscs.exe");
-    setString(key, "ObjectName", "OLDACCT");
-    setDword(key, "Start", 3);
-    setDword(key, "State", 1);
-  }
 };
 
 TEST_F(PartitionedServicesTest, PartitionsRepointedThroughTheirMachines) {
@@ -202,8 +194,8 @@ TEST_F(PartitionedServicesTest, NodesFileFailuresAndUnreachableMachine) {
 // A step that fails once the nodes file is saved puts it back and leaves no
 // saved copy: the undo's restore of the instance directory removes no file.
 TEST_F(PartitionedServicesTest, FailedStepLeavesTheNodesFileAndNoCopy) {
-  for (const char *fault : {"sqloQueryNTServiceConfig:1", "sqlo_instance_create_extended:1",
-                            "sqlocopy:2", "sqloPRegMachineOpen:1"}) {
+  for (const char *fault : {"sqloQueryNTServiceConfig:1", "sqlo_instance_create_extended:1", "sqlocopy:2",
+                            "sqloPRegMachineOpen:1"}) {
     SCOPED_TRACE(fault);
     failCalls(fault);
     EXPECT_NE(0, run());

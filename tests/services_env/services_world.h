@@ -112,9 +112,13 @@ protected:
     addProfile(kCurrentCopy, kInstance);
     if (!withService)
       return;
-    std::string key = serviceKey(kInstance);
+    addOldService(serviceKey(kInstance), start);
+    setString(serviceKey(kInstance), "DisplayName", "KXL - KXL95 - INST1");
+  }
+
+  // A stopped service of the older copy's program under the account OLDACCT.
+  static void addOldService(const std::string &key, DWORD start) {
     setString(key, "ImagePath", std::string(kOldPath) + "\\bin\\kxlsyscs.exe");
-    setString(key, "DisplayName", "KXL - KXL95 - INST1");
     setString(key, "ObjectName", "OLDACCT");
     setDword(key, "Start", start);
     setDword(key, "State", 1);
