@@ -6,7 +6,6 @@
 
 #include "sim/kxlsim/world_reader.h"
 
-#include <algorithm>
 #include <functional>
 
 namespace drivertest {

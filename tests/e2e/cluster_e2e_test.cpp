@@ -144,7 +144,25 @@ TEST_F(ClusterE2eTest, ClusteredInstanceUpgradesAndASecondRunConvertsNothing) {
 
 // CINST2's partitions on both nodes (also its cluster's machines): each key moves
 // once; partition 2's resource and CINST3's are of other types and stay.
-const char kPartitionedChanges[] = R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST2
+// CINST2's three partition services on one machine ("[WINSRV2] " or ""),
+// re-pointed under the account given.
+std::string partitionServiceChanges(const std::string &machine) {
+  std::string out;
+  for (const char *p : {"CINST2-0", "CINST2-1", "CINST2-2"}) {
+    std::string key = "registry ~ " + machine + "HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\" + p;
+    out += key + " \"DisplayName\": \"KXL - KXL95 - " + p + "\" -> \"KXL - KXL101 - " + p + "\"\n";
+    out +=
+        key +
+        R"( "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe")"
+        "\n";
+    out += key + R"( "ObjectName": ".\kxlsvc" -> "kxlsvc")"
+                 "\n";
+  }
+  return out;
+}
+
+const std::string kPartitionedChanges =
+    std::string(R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST2
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-0 "SeparateMonitor": dword:0 -> dword:1
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-0 "Type": "KXL" -> "KXL Server"
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-1 "SeparateMonitor": dword:0 -> dword:1
@@ -152,25 +170,9 @@ registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\Resources\CINST2-1 "Type": "KXL" -> 
 registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\CINST2 "Copy": "KXL95" -> "KXL101"
 registry ~ [WINSRV2] HKLM\Cluster\ZAV\KXL\PROFILES\CINST2 "KXLINSTPROF": "X:\OLD" -> "F:\KXLPROF"
 registry - [WINSRV2] HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\CINST2
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "DisplayName": "KXL - KXL95 - CINST2-0" -> "KXL - KXL101 - CINST2-0"
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "ObjectName": ".\kxlsvc" -> "kxlsvc"
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "DisplayName": "KXL - KXL95 - CINST2-1" -> "KXL - KXL101 - CINST2-1"
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "ObjectName": ".\kxlsvc" -> "kxlsvc"
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "DisplayName": "KXL - KXL95 - CINST2-2" -> "KXL - KXL101 - CINST2-2"
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
-registry ~ [WINSRV2] HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "ObjectName": ".\kxlsvc" -> "kxlsvc"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "DisplayName": "KXL - KXL95 - CINST2-0" -> "KXL - KXL101 - CINST2-0"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-0 "ObjectName": ".\kxlsvc" -> "kxlsvc"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "DisplayName": "KXL - KXL95 - CINST2-1" -> "KXL - KXL101 - CINST2-1"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-1 "ObjectName": ".\kxlsvc" -> "kxlsvc"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "DisplayName": "KXL - KXL95 - CINST2-2" -> "KXL - KXL101 - CINST2-2"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
-registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\CINST2-2 "ObjectName": ".\kxlsvc" -> "kxlsvc"
-registry + HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST2
+)") +
+    partitionServiceChanges("[WINSRV2] ") + partitionServiceChanges("") +
+    R"(registry + HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST2
 registry + HKLM\SOFTWARE\ZAV\KXLSIM\Cluster\ResourceTypes\KXL Server
 registry + [WINSRV2] HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST2
 )";

@@ -37,6 +37,8 @@ protected:
       all.push_back(product->GetInfo()->code);
     return all;
   }
+
+  char registered[KXLI_PRODUCT_CODE_SZ] = {}; // the code detectProduct found registered
 };
 
 TEST(ProductCodes, DeriveByRaisingTheFourthGroup) {
@@ -54,7 +56,6 @@ TEST(ProductCodes, DeriveByRaisingTheFourthGroup) {
 }
 
 TEST_F(Products, NeedTheMarkerAndTheInstallerRegistrationAtTheSameFolder) {
-  char registered[KXLI_PRODUCT_CODE_SZ] = {};
   registerInstaller(kServerCode, "C:\\K101\\");
   EXPECT_EQ(KXLI_DETECT_NONE, detectProduct("hpe", "C:\\K101", registered, false, false));
   marker("C:\\K101", "hpe");
@@ -76,7 +77,6 @@ TEST_F(Products, OfASecondCopyAreFoundUnderDerivedCodes) {
   marker("C:\\K101", "hpe");
   registerInstaller(kServerCode, "C:\\K95\\");
   registerInstaller(kServerCodeNext, "C:\\K101\\");
-  char registered[KXLI_PRODUCT_CODE_SZ] = {};
   EXPECT_EQ(KXLI_DETECT_MAIN, detectProduct("hpe", "C:\\K101", registered, false, false));
   EXPECT_STREQ(kServerCodeNext, registered);
   // The sixteenth copy is beyond the derived codes tried.
@@ -89,7 +89,6 @@ TEST_F(Products, OfASecondCopyAreFoundUnderDerivedCodes) {
 
 TEST_F(Products, TryTheColumnsOfTheRegistryView) {
   marker("C:\\K32", "hpe");
-  char registered[KXLI_PRODUCT_CODE_SZ] = {};
   // The 32-bit view's code counts only for a 32-bit view copy.
   registerInstaller("{6E1C2A40-9F3B-4D21-8A20-5B2C7D0E9A01}", "C:\\K32");
   EXPECT_EQ(KXLI_DETECT_NONE, detectProduct("hpe", "C:\\K32", registered, false, false));
@@ -104,7 +103,6 @@ TEST_F(Products, TryTheColumnsOfTheRegistryView) {
 TEST_F(Products, AreNotInstalledWhenTheMarkerPathIsTooLong) {
   std::string path = "C:\\" + std::string(239, 'p');
   ASSERT_EQ(242u, path.size()); // 242 + 3 + 11 = 256
-  char registered[KXLI_PRODUCT_CODE_SZ] = {};
   EXPECT_EQ(KXLI_DETECT_NONE, detectProduct("hpe", path.c_str(), registered, true, false));
   std::string shorter = "C:\\" + std::string(238, 'p');
   marker(shorter, "srv");
@@ -112,7 +110,6 @@ TEST_F(Products, AreNotInstalledWhenTheMarkerPathIsTooLong) {
 }
 
 TEST_F(Products, OfTheVersion8InstallationNeedOnlyTheirMarker) {
-  char registered[KXLI_PRODUCT_CODE_SZ] = {};
   marker("C:\\SQLLIB", "srv");
   marker("C:\\SQLLIB", "txt");
   marker("C:\\SQLLIB", "qqq");

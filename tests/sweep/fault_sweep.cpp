@@ -9,13 +9,10 @@
 // leave the world of the clean upgrade. The last line gives the figures.
 #include "tests/sweep/sweep_world.h"
 
-#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <fstream>
 #include <iostream>
-#include <map>
 #include <string>
 #include <vector>
 
