@@ -1,7 +1,5 @@
-// What the file calls do with the host files under the world, beyond what the
-// Win32 conformance suite states: host permissions read as attributes, renames
-// and copies of the host files, the working and temporary folders as Windows
-// paths, and injected faults.
+// The file calls over the world's host files, beyond the Win32 conformance suite: permissions as
+// attributes, renames and copies, working and temporary folders as Windows paths, injected faults.
 #include "tests/support/world_access.h"
 
 #include <fcntl.h>
@@ -45,9 +43,8 @@ TEST_F(FilesTest, RenameInAnotherLetterCaseRenamesTheHostFile) {
   EXPECT_FALSE(exists("drive_c/M/dst.txt"));
 }
 
-// A copy keeps what cp -a keeps: exact permission bits (whatever the umask),
-// extended attributes (where the file system has them) and times; the
-// content whole, small or spanning many blocks.
+// A copy keeps what cp -a keeps (exact mode whatever the umask, extended attributes where
+// supported, times) and the whole content, small or spanning many blocks.
 TEST_F(FilesTest, CopiesKeepContentPermissionsAndTimes) {
   std::string large(3 * 1024 * 1024 + 17, '\0');
   for (size_t i = 0; i < large.size(); ++i)
@@ -92,8 +89,8 @@ TEST_F(FilesTest, CopyProgressIsReportedAndACancelledCopyLeavesNoTarget) {
     DWORD answer;
     std::vector<long long> copied;
   };
-  LPPROGRESS_ROUTINE routine = [](LARGE_INTEGER total, LARGE_INTEGER copied, LARGE_INTEGER, LARGE_INTEGER, DWORD, DWORD,
-                    HANDLE, HANDLE, LPVOID data) -> DWORD {
+  LPPROGRESS_ROUTINE routine = [](LARGE_INTEGER total, LARGE_INTEGER copied, LARGE_INTEGER, LARGE_INTEGER,
+                                  DWORD, DWORD, HANDLE, HANDLE, LPVOID data) -> DWORD {
     auto *heard = static_cast<Heard *>(data);
     EXPECT_EQ(total.QuadPart, 3 * 1024 * 1024 + 5);
     heard->copied.push_back(copied.QuadPart);
@@ -111,7 +108,8 @@ TEST_F(FilesTest, CopyProgressIsReportedAndACancelledCopyLeavesNoTarget) {
   Heard stopping{PROGRESS_CANCEL, {}};
   BOOL cancel = TRUE;
   for (BOOL *flag : {static_cast<BOOL *>(nullptr), &cancel}) {
-    EXPECT_FALSE(CopyFileExA("C:\\P\\big", "C:\\P\\cancelled", flag ? LPPROGRESS_ROUTINE() : routine, &stopping, flag, 0));
+    EXPECT_FALSE(CopyFileExA("C:\\P\\big", "C:\\P\\cancelled", flag ? LPPROGRESS_ROUTINE() : routine,
+                             &stopping, flag, 0));
     EXPECT_EQ(GetLastError(), DWORD(ERROR_REQUEST_ABORTED));
     EXPECT_FALSE(exists("drive_c/P/cancelled"));
   }

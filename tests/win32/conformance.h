@@ -22,6 +22,12 @@ std::string uniqueName();
 // Byte-wise equality ignoring ASCII case, as Windows compares names.
 bool sameIgnoringCase(const std::string &a, const std::string &b);
 
+// The last error a call that must fail leaves (cleared first); ERROR_SUCCESS when it worked after all.
+template <typename Call> DWORD errorOf(Call call) {
+  SetLastError(0);
+  return call() ? static_cast<DWORD>(ERROR_SUCCESS) : GetLastError();
+}
+
 // Every case runs in a machine of its own: a fresh temporary world with the
 // run-time modules' files on non-Windows hosts, the real machine on Windows.
 class Win32Test : public ::testing::Test {

@@ -43,12 +43,6 @@ HANDLE createWith(const string &path, DWORD access, DWORD disposition) {
                      nullptr);
 }
 
-// The last error a call that must fail leaves (cleared first); ERROR_SUCCESS when it worked after all.
-template <typename Call> DWORD errorOf(Call call) {
-  SetLastError(0);
-  return call() ? static_cast<DWORD>(ERROR_SUCCESS) : GetLastError();
-}
-
 DWORD failureOf(const string &path, DWORD access, DWORD disposition) {
   return errorOf([&] {
     HANDLE h = createWith(path, access, disposition);

@@ -1,5 +1,4 @@
-// Modules, environment, text conversion and Windows Installer queries, as
-// Windows has them.
+// Modules, environment, text conversion and Windows Installer queries, as Windows has them.
 #include "conformance.h"
 
 #include <cstring>
@@ -18,17 +17,15 @@ const char unknownProduct[] = "{5B6C1E2A-0F3D-4A77-9C21-6D8E0A4B3F19}";
 // --- Modules -------------------------------------------------------------
 
 TEST_F(Win32Test, LoadOfAMissingModuleIsModNotFound) {
-  SetLastError(0);
-  EXPECT_EQ(nullptr, LoadLibraryA("kxlnosuchmodule.dll"));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_MOD_NOT_FOUND), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_MOD_NOT_FOUND),
+            errorOf([] { return LoadLibraryA("kxlnosuchmodule.dll") != nullptr; }));
 }
 
 TEST_F(Win32Test, MissingEntryPointIsProcNotFound) {
   HMODULE module = LoadLibraryA("odbc32.dll");
   ASSERT_NE(nullptr, module) << "error " << GetLastError();
-  SetLastError(0);
-  EXPECT_EQ(nullptr, GetProcAddress(module, "KxlNoSuchEntryPoint"));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_PROC_NOT_FOUND), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_PROC_NOT_FOUND),
+            errorOf([&] { return GetProcAddress(module, "KxlNoSuchEntryPoint") != nullptr; }));
   EXPECT_TRUE(FreeLibrary(module));
 }
 
@@ -43,9 +40,8 @@ TEST_F(Win32Test, EnvironmentVariableSizesFollowTheBufferRules) {
   EXPECT_EQ(5u, GetEnvironmentVariableA(name, buffer, sizeof buffer)); // length without it
   EXPECT_STREQ("value", buffer);
   ASSERT_TRUE(SetEnvironmentVariableA(name, nullptr));
-  SetLastError(0);
-  EXPECT_EQ(0u, GetEnvironmentVariableA(name, buffer, sizeof buffer));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ENVVAR_NOT_FOUND), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_ENVVAR_NOT_FOUND),
+            errorOf([&] { return GetEnvironmentVariableA(name, buffer, sizeof buffer) != 0; }));
 }
 
 // --- Text ----------------------------------------------------------------
@@ -56,9 +52,8 @@ TEST_F(Win32Test, MultiByteToWideCharCountsTheTerminatorOnlyForMinusOne) {
   WCHAR wide[8] = {};
   ASSERT_EQ(6, MultiByteToWideChar(CP_UTF8, 0, utf8, -1, wide, 8));
   EXPECT_EQ(0, std::memcmp(utf16, wide, sizeof utf16));
-  SetLastError(0);
-  EXPECT_EQ(0, MultiByteToWideChar(CP_UTF8, 0, utf8, -1, wide, 3));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_INSUFFICIENT_BUFFER), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_INSUFFICIENT_BUFFER),
+            errorOf([&] { return MultiByteToWideChar(CP_UTF8, 0, utf8, -1, wide, 3) != 0; }));
 }
 
 TEST_F(Win32Test, WideCharToMultiByteCountsTheTerminatorOnlyForMinusOne) {
@@ -67,9 +62,9 @@ TEST_F(Win32Test, WideCharToMultiByteCountsTheTerminatorOnlyForMinusOne) {
   char narrow[8] = {};
   ASSERT_EQ(7, WideCharToMultiByte(CP_UTF8, 0, utf16, -1, narrow, sizeof narrow, nullptr, nullptr));
   EXPECT_STREQ(utf8, narrow);
-  SetLastError(0);
-  EXPECT_EQ(0, WideCharToMultiByte(CP_UTF8, 0, utf16, -1, narrow, 3, nullptr, nullptr));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_INSUFFICIENT_BUFFER), GetLastError());
+  EXPECT_EQ(static_cast<DWORD>(ERROR_INSUFFICIENT_BUFFER), errorOf([&] {
+              return WideCharToMultiByte(CP_UTF8, 0, utf16, -1, narrow, 3, nullptr, nullptr) != 0;
+            }));
 }
 
 // --- Windows Installer ---------------------------------------------------
@@ -107,29 +102,22 @@ protected:
       SHDeleteKeyA(HKEY_LOCAL_MACHINE, key);
   }
 
-  static void write(const char *key, const char *name, const std::string &value) {
+  static void write(const char *key, const char *name, DWORD type, const void *data, DWORD size) {
     HKEY handle = nullptr;
     ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, key, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr,
                                              &handle, nullptr));
-    ASSERT_EQ(ERROR_SUCCESS,
-              RegSetValueExA(handle, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
-                             static_cast<DWORD>(value.size() + 1)));
+    ASSERT_EQ(ERROR_SUCCESS, RegSetValueExA(handle, name, 0, type, static_cast<const BYTE *>(data), size));
     RegCloseKey(handle);
   }
-
-  static void writeFlag(const char *key, const char *name, DWORD value) {
-    HKEY handle = nullptr;
-    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, key, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr,
-                                             &handle, nullptr));
-    ASSERT_EQ(ERROR_SUCCESS, RegSetValueExA(handle, name, 0, REG_DWORD,
-                                            reinterpret_cast<const BYTE *>(&value), sizeof value));
-    RegCloseKey(handle);
+  static void write(const char *key, const char *name, const char *text) {
+    write(key, name, REG_SZ, text, static_cast<DWORD>(std::strlen(text) + 1));
   }
 
   static void advertise() { write(productKey, "ProductName", "KxlConformance"); }
   static void installProperties() {
     write(propertiesKey, "InstallLocation", location);
-    writeFlag(propertiesKey, "WindowsInstaller", 1);
+    const DWORD one = 1;
+    write(propertiesKey, "WindowsInstaller", REG_DWORD, &one, sizeof one);
   }
 };
 
