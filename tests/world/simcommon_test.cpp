@@ -16,6 +16,17 @@ using kxltestsupport::writeHostFile;
 
 using FaultTest = kxltest::WorldTest;
 
+// Creates (and closes) a key of HKEY_LOCAL_MACHINE; the result and, if asked, the handle left.
+LONG createKey(const char *name, HKEY *left = nullptr) {
+  HKEY key = left != nullptr ? *left : nullptr;
+  LONG rc = RegCreateKeyExA(HKEY_LOCAL_MACHINE, name, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr);
+  if (left != nullptr)
+    *left = key;
+  if (key != nullptr)
+    RegCloseKey(key);
+  return rc;
+}
+
 TEST_F(FaultTest, ExactlyTheNamedCallsFail) {
   setenv("KXLSIM_FAIL", "Open:3,Other:1,Open:5,broken,Open:0,:2,Open:x", 1);
   resetFaults();
@@ -42,35 +53,17 @@ TEST_F(FaultTest, ExactlyTheNamedCallsFail) {
 TEST_F(FaultTest, RegistryCallFailsAsWindowsWouldAndTheNextOneWorks) {
   setenv("KXLSIM_FAIL", "RegCreateKeyExA:2", 1);
   resetFaults();
-  HKEY key = nullptr;
-  EXPECT_EQ(RegCreateKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE\\A", 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key,
-                            nullptr),
-            ERROR_SUCCESS);
-  RegCloseKey(key);
-  key = reinterpret_cast<HKEY>(1);
-  EXPECT_EQ(RegCreateKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE\\B", 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key,
-                            nullptr),
-            ERROR_ACCESS_DENIED);
+  EXPECT_EQ(createKey("SOFTWARE\\A"), ERROR_SUCCESS);
+  HKEY key = reinterpret_cast<HKEY>(1);
+  EXPECT_EQ(createKey("SOFTWARE\\B", &key), ERROR_ACCESS_DENIED);
   EXPECT_EQ(key, nullptr);
   EXPECT_EQ(RegOpenKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE\\B", 0, KEY_READ, &key), ERROR_FILE_NOT_FOUND);
-  EXPECT_EQ(RegCreateKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE\\B", 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key,
-                            nullptr),
-            ERROR_SUCCESS);
-  RegCloseKey(key);
+  EXPECT_EQ(createKey("SOFTWARE\\B"), ERROR_SUCCESS);
 }
 
-// A process killed in the middle of a registry write (half a change record
-// appended, or a whole new hive not yet in place) leaves a registry that reads
+// A kill mid-write (half a change record, or a new hive not yet in place) leaves the registry
 // as before that write; the next writer goes on from it.
 TEST_F(FaultTest, KillAtARegistryWriteLeavesTheRegistryWhole) {
-  auto createKey = [](const char *name) {
-    HKEY key = nullptr;
-    LONG rc =
-        RegCreateKeyExA(HKEY_LOCAL_MACHINE, name, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr);
-    if (key != nullptr)
-      RegCloseKey(key);
-    return rc;
-  };
   for (int write = 1; write <= 3; ++write) {
     SCOPED_TRACE(write);
     std::string kill = "hivewrite:" + std::to_string(write);
