@@ -177,9 +177,8 @@ TEST_F(ClusterTest, ResourcesAreCreatedEnumeratedLinkedAndDeleted) {
   EXPECT_TRUE(api->CloseCluster(cluster));
 }
 
-// The rules by which the cluster refuses a change: an online resource cannot
-// be deleted, dependencies stay within a group, and a resource named like a
-// service of the node owning its group is online exactly while it runs.
+// An online resource cannot be deleted, dependencies stay within a group, and a resource named
+// like a service of the node owning its group is online exactly while that service runs.
 TEST_F(ClusterTest, OnlineResourcesStayAndDependenciesStayInTheirGroup) {
   const std::string services = "SOFTWARE\\ZAV\\KXLSIM\\Services\\";
   const std::string remoteServices = "SOFTWARE\\ZAV\\KXLSIM\\Machines\\NODE2\\" + services;

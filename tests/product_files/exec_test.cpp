@@ -98,9 +98,7 @@ TEST_F(Programs, AProgramThatCannotStartIsAnError) {
   EXPECT_EQ(0, sqloexec2("argdump.exe", nullptr, 0, 0xC0, nullptr, &result, 0, 0));
 }
 
-// The call returns only once the program has ended: a wait that fails is
-// tried again, so that the program never goes on changing files while its
-// caller undoes them; only a wait that fails twice is an error.
+// The call returns only once the program has ended, so it never changes files its caller undoes.
 TEST_F(Programs, AFailedWaitIsTriedAgain) {
   SQLO_EXEC_RESULT result{};
   failCalls("WaitForSingleObject:1");

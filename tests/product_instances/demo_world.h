@@ -47,11 +47,11 @@ protected:
     return data;
   }
 
-  static constexpr const char *kCopy = "C:\\Program Files\\ZAV\\KXL101";
-  static constexpr const char *kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
-  static constexpr const char *kServices = "SOFTWARE\\ZAV\\KXLSIM\\Services\\";
-  static constexpr const char *kInstances = "SOFTWARE\\ZAV\\KXLSIM\\Instances\\";
-  static constexpr const char *kRemote = "SOFTWARE\\ZAV\\KXLSIM\\Machines\\WINSRV2\\";
+  inline static const std::string kCopy = "C:\\Program Files\\ZAV\\KXL101";
+  inline static const std::string kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
+  inline static const std::string kServices = "SOFTWARE\\ZAV\\KXLSIM\\Services\\";
+  inline static const std::string kInstances = "SOFTWARE\\ZAV\\KXLSIM\\Instances\\";
+  inline static const std::string kRemote = "SOFTWARE\\ZAV\\KXLSIM\\Machines\\WINSRV2\\";
 
 private:
   std::string before_;

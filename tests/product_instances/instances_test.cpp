@@ -12,9 +12,9 @@ protected:
                         uint8_t textSearch = 0, const char *tsService = nullptr, uint16_t tsPort = 0,
                         int32_t *reason = nullptr, const char *cluster = nullptr) {
     int32_t ownReason = -7, extra = -7;
-    int32_t rc = sqlo_instance_create_extended(name, "C:\\inst", kCopy, 0, user, user ? "s3cret!pw" : nullptr,
-                                               0, 1, nodeType, cluster, 1, 1, textSearch, tsService, tsPort,
-                                               reason ? reason : &ownReason, &extra);
+    int32_t rc = sqlo_instance_create_extended(
+        name, "C:\\inst", kCopy.c_str(), 0, user, user ? "s3cret!pw" : nullptr, 0, 1, nodeType, cluster, 1, 1,
+        textSearch, tsService, tsPort, reason ? reason : &ownReason, &extra);
     EXPECT_EQ(extra, 0);
     return rc;
   }
@@ -28,7 +28,7 @@ TEST_F(Instances, CreationTakesTheTemplateOfEachNodeTypeAndRegistersTheInstance)
     ASSERT_EQ(0, create(name.c_str(), type, type == 3 ? ".\\kxluser" : nullptr));
     std::vector<uint8_t> image = readFile("C:\\inst\\" + name + "\\kxlsystm");
     ASSERT_EQ(image.size(), 16384u);
-    EXPECT_EQ(image, readFile(std::string(kCopy) + "\\CFG\\" + templates[type - 1]));
+    EXPECT_EQ(image, readFile(kCopy + "\\CFG\\" + templates[type - 1]));
     EXPECT_EQ(sqloLe16(image.data(), 40), type);
     EXPECT_EQ(regString(kInstances + name, "Directory"), "C:\\inst\\" + name);
     EXPECT_EQ(regString(kInstances + name, "Copy"), "KXL101");
@@ -37,7 +37,7 @@ TEST_F(Instances, CreationTakesTheTemplateOfEachNodeTypeAndRegistersTheInstance)
     EXPECT_EQ(keyExists(kServices + name), hasService);
     if (!hasService)
       continue;
-    EXPECT_EQ(regString(kServices + name, "ImagePath"), std::string(kCopy) + "\\bin\\kxlsyscs.exe");
+    EXPECT_EQ(regString(kServices + name, "ImagePath"), kCopy + "\\bin\\kxlsyscs.exe");
     EXPECT_EQ(regString(kServices + name, "DisplayName"), "KXL - KXL101 - " + name);
     EXPECT_EQ(regString(kServices + name, "ObjectName"), type == 3 ? ".\\kxluser" : "LocalSystem");
   }
@@ -52,7 +52,7 @@ TEST_F(Instances, RefusesBadArgumentsAndMissingTemplates) {
   EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, create("BAD\\N", 1));
   EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, create("NEW", 6));
   snapshot();
-  ASSERT_TRUE(DeleteFileA((std::string(kCopy) + "\\CFG\\kxlsyssr").c_str()));
+  ASSERT_TRUE(DeleteFileA((kCopy + "\\CFG\\kxlsyssr").c_str()));
   EXPECT_EQ(SQLO_RC_FILE_NOT_FOUND, create("NEW", 3));
   EXPECT_EQ(diff(), "file - C:\\Program Files\\ZAV\\KXL101\\CFG\\kxlsyssr\n")
       << "nothing but the removed template";
@@ -71,15 +71,14 @@ TEST_F(Instances, DropUndoesACreationCompletely) {
 }
 
 TEST_F(Instances, DropAfterReCreatingAnExistingInstancePutsItBack) {
-  std::string dir = std::string(kOldCopy) + "\\INST1";
+  std::string dir = kOldCopy + "\\INST1";
   snapshot();
   int32_t extra = -1, reason = -1;
-  ASSERT_EQ(0, sqlo_instance_create_extended("INST1", kOldCopy, kCopy, 0, nullptr, nullptr, 0, 1, 1, nullptr,
-                                             1, 1, 0, nullptr, 0, &reason, &extra));
-  EXPECT_EQ(regString(kInstances + std::string("INST1"), "Copy"), "KXL101");
-  EXPECT_EQ(regString(kServices + std::string("INST1"), "ImagePath"),
-            std::string(kCopy) + "\\bin\\kxlsyscs.exe");
-  EXPECT_EQ(getDword(kServices + std::string("INST1"), "Start"), 2u) << "the start type stays";
+  ASSERT_EQ(0, sqlo_instance_create_extended("INST1", kOldCopy.c_str(), kCopy.c_str(), 0, nullptr, nullptr, 0,
+                                             1, 1, nullptr, 1, 1, 0, nullptr, 0, &reason, &extra));
+  EXPECT_EQ(regString(kInstances + "INST1", "Copy"), "KXL101");
+  EXPECT_EQ(regString(kServices + "INST1", "ImagePath"), kCopy + "\\bin\\kxlsyscs.exe");
+  EXPECT_EQ(getDword(kServices + "INST1", "Start"), 2u) << "the start type stays";
   EXPECT_TRUE(pathExists(dir + "\\security\\kxlaudit.cfg")) << "other files of the directory stay";
   ASSERT_EQ(0, sqlo_instance_drop("INST1", dir.c_str()));
   EXPECT_EQ(diff(), "");
@@ -87,13 +86,13 @@ TEST_F(Instances, DropAfterReCreatingAnExistingInstancePutsItBack) {
 
 TEST_F(Instances, DropOfAnInstanceNotCreatedHereRemovesEveryTrace) {
   ASSERT_EQ(0, sqlo_instance_drop("INST2", nullptr));
-  EXPECT_FALSE(keyExists(kInstances + std::string("INST2")));
+  EXPECT_FALSE(keyExists(kInstances + "INST2"));
   EXPECT_FALSE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST2"));
-  EXPECT_FALSE(keyExists(kServices + std::string("INST2-0")));
-  EXPECT_TRUE(keyExists(std::string(kRemote) + kServices + "INST2-1")) << "other machines are not touched";
-  EXPECT_EQ(GetFileAttributesA((std::string(kOldCopy) + "\\INST2").c_str()), INVALID_FILE_ATTRIBUTES);
+  EXPECT_FALSE(keyExists(kServices + "INST2-0"));
+  EXPECT_TRUE(keyExists(kRemote + kServices + "INST2-1")) << "other machines are not touched";
+  EXPECT_EQ(GetFileAttributesA((kOldCopy + "\\INST2").c_str()), INVALID_FILE_ATTRIBUTES);
   EXPECT_EQ(SQLO_RC_NOT_FOUND, sqlo_instance_drop("INST2", nullptr));
-  EXPECT_TRUE(keyExists(kInstances + std::string("INST1")));
+  EXPECT_TRUE(keyExists(kInstances + "INST1"));
 }
 
 TEST_F(Instances, TextSearchReportsWhyItCouldNotBeConfigured) {
@@ -115,9 +114,9 @@ TEST_F(Instances, PartitionEntriesAddAndRemoveTheirService) {
   SQLO_INST_OUT out1{}, out2{};
   ASSERT_EQ(0, create("PART", 4));
   ASSERT_EQ(0, sqlo_instance_addnode("PART", 0, nullptr, 0, nullptr, nullptr, &out1, &out2));
-  EXPECT_EQ(regString(kServices + std::string("PART-0"), "DisplayName"), "KXL - KXL101 - PART-0");
+  EXPECT_EQ(regString(kServices + "PART-0", "DisplayName"), "KXL - KXL101 - PART-0");
   ASSERT_EQ(0, sqlo_instance_addnode("PART", 1, "winsrv2", 0, nullptr, nullptr, &out1, &out2));
-  EXPECT_TRUE(keyExists(std::string(kRemote) + kServices + "PART-1"));
+  EXPECT_TRUE(keyExists(kRemote + kServices + "PART-1"));
   EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE,
             sqlo_instance_addnode("PART", 2, "nohost", 0, nullptr, nullptr, &out1, &out2));
   EXPECT_EQ(out2.code, SQLO_RC_MACHINE_UNREACHABLE);
@@ -129,14 +128,13 @@ TEST_F(Instances, PartitionEntriesAddAndRemoveTheirService) {
 }
 
 TEST_F(Instances, ReAddingAnExistingPartitionAndRemovingItRestoresTheService) {
-  ASSERT_EQ(0, sqlo_instance_create_extended("INST2", kOldCopy, kCopy, 0, nullptr, nullptr, 0, 4, 4, nullptr,
-                                             1, 1, 0, nullptr, 0, nullptr, nullptr));
+  ASSERT_EQ(0, sqlo_instance_create_extended("INST2", kOldCopy.c_str(), kCopy.c_str(), 0, nullptr, nullptr, 0,
+                                             4, 4, nullptr, 1, 1, 0, nullptr, 0, nullptr, nullptr));
   snapshot();
   SQLO_INST_OUT out1{}, out2{};
   ASSERT_EQ(0, sqlo_instance_addnode("INST2", 0, nullptr, 0, nullptr, nullptr, &out1, &out2));
-  EXPECT_EQ(regString(kServices + std::string("INST2-0"), "ImagePath"),
-            std::string(kCopy) + "\\bin\\kxlsyscs.exe");
-  EXPECT_EQ(regString(kServices + std::string("INST2-0"), "ObjectName"), ".\\kxlsvc") << "the account stays";
+  EXPECT_EQ(regString(kServices + "INST2-0", "ImagePath"), kCopy + "\\bin\\kxlsyscs.exe");
+  EXPECT_EQ(regString(kServices + "INST2-0", "ObjectName"), ".\\kxlsvc") << "the account stays";
   ASSERT_EQ(0, sqlo_instance_delnode("INST2", 0, nullptr, 0, &out1, &out2));
   EXPECT_EQ(diff(), "");
 }

@@ -48,22 +48,21 @@ TEST_F(Services, ChangeOnAnotherMachineGoesToItsSubtree) {
   ASSERT_EQ(0, sqloChangeNTServiceConfig("INST2-1", "WINSRV2", SQLO_SVC_NO_CHANGE, 4, SQLO_SVC_NO_CHANGE,
                                          program, nullptr, nullptr, nullptr, ".\\newacct", "pw-never-kept",
                                          "KXL - KXL101 - INST2-1", &out));
-  std::string key = std::string(kRemote) + kServices + "INST2-1";
+  std::string key = kRemote + kServices + "INST2-1";
   EXPECT_EQ(regString(key, "ImagePath"), program);
   EXPECT_EQ(getDword(key, "Start"), 4u);
   EXPECT_EQ(regString(key, "ObjectName"), ".\\newacct");
   EXPECT_EQ(regString(key, "DisplayName"), "KXL - KXL101 - INST2-1");
   EXPECT_EQ(getDword(key, "State"), 1u);
-  EXPECT_FALSE(keyExists(std::string(kServices) + "INST2-1")) << "nothing on this machine";
+  EXPECT_FALSE(keyExists(kServices + "INST2-1")) << "nothing on this machine";
   EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE, changeStart("INST2-1", "WINSRV9", 4, program));
   failCalls("sqloChangeNTServiceConfig:1");
   EXPECT_NE(0, changeStart("INST1", nullptr, 4));
-  EXPECT_EQ(getDword(std::string(kServices) + "INST1", "Start"), 2u);
-  // A service key that cannot be read is a failure, never a service that is
-  // not there (which callers may pass over).
+  EXPECT_EQ(getDword(kServices + "INST1", "Start"), 2u);
+  // An unreadable service key is a failure, never a missing service (which callers pass over).
   failCalls("RegOpenKeyExA:1");
   EXPECT_EQ(SQLO_RC_SYSTEM_ERROR, changeStart("INST1", nullptr, 4));
-  EXPECT_EQ(getDword(std::string(kServices) + "INST1", "Start"), 2u);
+  EXPECT_EQ(getDword(kServices + "INST1", "Start"), 2u);
 }
 
 TEST_F(Services, RegisterCreatesOnceAndReportsAnExistingService) {
@@ -71,7 +70,7 @@ TEST_F(Services, RegisterCreatesOnceAndReportsAnExistingService) {
   const char *program = "C:\\Program Files\\ZAV\\KXL101\\bin\\ctelock.exe";
   ASSERT_EQ(0, sqloRegisterNTService("WINSRV2", "KXLEXT - INST2-1", "KXLEXT - KXL101 - INST2-1", 0, program,
                                      0, ".\\kxlsvc", "secret", "kxlwint64.dll", &out));
-  std::string key = std::string(kRemote) + kServices + "KXLEXT - INST2-1";
+  std::string key = kRemote + kServices + "KXLEXT - INST2-1";
   EXPECT_EQ(regString(key, "ImagePath"), program);
   EXPECT_EQ(getDword(key, "Start"), 3u) << "start type 0 registers a demand-started service";
   EXPECT_EQ(regString(key, "Password"), "<no value>");

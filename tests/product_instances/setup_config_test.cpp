@@ -83,7 +83,7 @@ TEST_F(Configuration, ParameterIndexesLieInTheFlagArea) {
 }
 
 TEST_F(Configuration, AuthenticationTypeGoesIntoTheCurrentInstanceWithAValidChecksum) {
-  std::string path = std::string(kOldCopy) + "\\INST1\\kxlsystm";
+  std::string path = kOldCopy + "\\INST1\\kxlsystm";
   std::vector<uint8_t> before = readFile(path);
   setInstance("INST1");
   uint16_t type = 3;
@@ -101,7 +101,7 @@ TEST_F(Configuration, AuthenticationTypeGoesIntoTheCurrentInstanceWithAValidChec
 }
 
 TEST_F(Configuration, BadUpdatesAndDamagedFilesChangeNothing) {
-  std::string path = std::string(kOldCopy) + "\\INST1\\kxlsystm";
+  std::string path = kOldCopy + "\\INST1\\kxlsystm";
   setInstance("INST1");
   snapshot();
   uint16_t type = 9;

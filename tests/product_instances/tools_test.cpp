@@ -17,7 +17,7 @@ protected:
   // Runs the copy's program from its bin folder; its exit code.
   int run(const std::string &program, const std::string &args) {
     std::string host;
-    EXPECT_TRUE(kxlsim::posix::hostPath(std::string(kCopy) + "\\bin\\" + program, host));
+    EXPECT_TRUE(kxlsim::posix::hostPath(kCopy + "\\bin\\" + program, host));
     std::string command =
         "KXLSIM_ROOT='" + worldRoot() + "' KXLINSTANCE=INST1 '" + host + "' " + args + " 2>/dev/null";
     int status = std::system(command.c_str());

@@ -61,9 +61,8 @@ TEST_F(InstallationsTest, IterationListsEveryInstanceOfEveryCopyThenEnds) {
   EXPECT_EQ(found["INST2"], "\\\\SRV\\SHARE\\INST2|V101");
 }
 
-// A value that is there but cannot be read is a failure: an entry whose copy
-// could not be read is never an instance of the version-8 installation (no
-// copy), nor one that has gone since the list was opened (no directory).
+// An unreadable copy is never the version-8 installation's empty one, nor an unreadable
+// directory an instance gone since the list was opened: both fail the iteration.
 TEST_F(InstallationsTest, EntryThatCannotBeReadFailsTheIteration) {
   const std::string key = "SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1";
   OSSInstanceInfo_t info{};

@@ -131,9 +131,8 @@ TEST_F(FilesTest, FindWithoutMatchTellsFileFromPath) {
 
 // --- Current and temporary folders ---------------------------------------
 
-// The buffer rules of the functions that give a path: a buffer too small (or
-// none) gets the size needed with the terminator; one that fits gets the path
-// and its length without it. Returns the path.
+// A buffer too small (or none) gets the size needed with the terminator; one that fits gets
+// the path and its length without it. Returns the path.
 string checkPathBufferRules(DWORD(WINAPI *getPath)(DWORD, LPSTR)) {
   DWORD needed = getPath(0, nullptr);
   EXPECT_GT(needed, 1u);

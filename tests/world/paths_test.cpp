@@ -122,8 +122,7 @@ TEST_F(PathTest, HostPathsGiveWindowsPathsBack) {
     EXPECT_EQ(windowsPath(hostFile), windows) << hostFile;
 }
 
-// Started through a link by the tests below: writes the world it finds to the
-// file KXL_WORLD_PROBE names.
+// Run through a link by the tests below: writes the world it finds to the file KXL_WORLD_PROBE names.
 TEST(WorldProbe, Report) {
   const char *out = std::getenv("KXL_WORLD_PROBE");
   if (out == nullptr)
