@@ -76,6 +76,11 @@ struct ClusterApi {
   KXL_BOUND(resutils, ResUtilResourceTypesEqual);
 #undef KXL_BOUND
 
+  // A resource type shown under its own name, with the usual poll intervals.
+  DWORD addType(HCLUSTER cluster, const char16_t *name, const char16_t *dll = u"kxl.dll") {
+    return CreateClusterResourceType(cluster, name, name, dll, 5000, 60000);
+  }
+
   ~ClusterApi() {
     FreeLibrary(clusapi);
     FreeLibrary(resutils);
@@ -113,15 +118,9 @@ protected:
 TEST_F(ClusterTest, ResourcesAreCreatedEnumeratedLinkedAndDeleted) {
   HCLUSTER cluster = api->OpenCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  EXPECT_EQ(
-      api->CreateClusterResourceType(cluster, u"KXL Server", u"KXL Server", u"kxlserver.dll", 5000, 60000),
-      0u);
-  EXPECT_EQ(
-      api->CreateClusterResourceType(cluster, u"kxl server", u"KXL Server", u"kxlserver.dll", 5000, 60000),
-      static_cast<DWORD>(ERROR_ALREADY_EXISTS));
-  EXPECT_EQ(api->CreateClusterResourceType(cluster, u"Physical Disk", u"Physical Disk", u"clusres.dll", 5000,
-                                           60000),
-            0u);
+  EXPECT_EQ(api->addType(cluster, u"KXL Server"), 0u);
+  EXPECT_EQ(api->addType(cluster, u"kxl server"), static_cast<DWORD>(ERROR_ALREADY_EXISTS));
+  EXPECT_EQ(api->addType(cluster, u"Physical Disk", u"clusres.dll"), 0u);
 
   EXPECT_EQ(api->OpenClusterGroup(cluster, u"NoGroup"), nullptr);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_GROUP_NOT_FOUND));
@@ -187,7 +186,7 @@ TEST_F(ClusterTest, OnlineResourcesStayAndDependenciesStayInTheirGroup) {
   setString("SOFTWARE\\ZAV\\KXLSIM\\Cluster\\Groups\\G2", "OwnerNode", "NODE2");
   HCLUSTER cluster = api->OpenCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  api->CreateClusterResourceType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
+  api->addType(cluster, u"KXL");
   HGROUP g1 = api->OpenClusterGroup(cluster, u"G1");
   HGROUP g2 = api->OpenClusterGroup(cluster, u"G2");
   HRESOURCE inst1 = api->CreateClusterResource(g1, u"INST1", u"KXL", 0);
@@ -218,7 +217,7 @@ TEST_F(ClusterTest, OnlineResourcesStayAndDependenciesStayInTheirGroup) {
 TEST_F(ClusterTest, EnumerationReportsLengthsAndEndsWithNoMoreItems) {
   HCLUSTER cluster = api->OpenCluster(nullptr);
   ASSERT_NE(cluster, nullptr);
-  api->CreateClusterResourceType(cluster, u"KXL", u"KXL", u"kxl.dll", 5000, 60000);
+  api->addType(cluster, u"KXL");
   HGROUP group = api->OpenClusterGroup(cluster, u"G1");
   for (const char16_t *name : {u"A-resource", u"B"})
     api->CloseClusterResource(api->CreateClusterResource(group, name, u"KXL", 0));
