@@ -9,6 +9,7 @@
 #include <chrono>
 #include <cstdarg>
 #include <cstdio>
+#include <cstdlib>
 #include <new>
 #include <vector>
 
@@ -181,7 +182,7 @@ int32_t checkRoom(const std::string &target, ULONGLONG needed) {
 class CopyProgress {
 public:
   CopyProgress(const std::string &target, ULONGLONG total, bool wanted)
-      : target_(target), total_(total), enabled_(wanted && errorIsConsole()),
+      : target_(target), total_(total), enabled_(wanted && errorIsConsole()), after_(showAfter()),
         start_(std::chrono::steady_clock::now()) {}
   ~CopyProgress() {
     if (shown_) {
@@ -209,6 +210,15 @@ private:
     progress->update(progress->done_ + static_cast<ULONGLONG>(transferred.QuadPart));
     return PROGRESS_CONTINUE;
   }
+  // A second, as for an administrator watching; KXLSIM_PROGRESS_AFTER_MS lets
+  // a test see the line without a copy that takes that long.
+  static std::chrono::milliseconds showAfter() {
+    const char *setting = std::getenv("KXLSIM_PROGRESS_AFTER_MS");
+    char *end = nullptr;
+    long value = setting != nullptr ? std::strtol(setting, &end, 10) : -1;
+    bool valid = setting != nullptr && end != setting && *end == '\0' && value >= 0;
+    return std::chrono::milliseconds(valid ? value : 1000);
+  }
   static bool errorIsConsole() {
     DWORD mode = 0;
     return GetConsoleMode(GetStdHandle(STD_ERROR_HANDLE), &mode) != 0;
@@ -217,7 +227,7 @@ private:
     if (!enabled_)
       return;
     auto now = std::chrono::steady_clock::now();
-    if (now - start_ < std::chrono::seconds(1) || (shown_ && now - last_ < std::chrono::milliseconds(250)))
+    if (now - start_ < after_ || (shown_ && now - last_ < std::chrono::milliseconds(250)))
       return;
     last_ = now;
     shown_ = true;
@@ -237,6 +247,7 @@ private:
   ULONGLONG total_;
   ULONGLONG done_ = 0;
   bool enabled_;
+  std::chrono::milliseconds after_;
   bool shown_ = false;
   std::chrono::steady_clock::time_point start_, last_;
 };

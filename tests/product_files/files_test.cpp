@@ -4,7 +4,11 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdio>
 #include <cstring>
+#include <fcntl.h>
+#include <pty.h>
+#include <unistd.h>
 
 namespace {
 
@@ -143,6 +147,48 @@ TEST_F(Files, TreeCopiesNeedRoomForTheTreeBeforeWritingAnything) {
   setString(drive, "FreeBytes", "0");
   EXPECT_EQ(0, sqlocopydir("C:\\copy", "C:\\inst\\INST1", 0));
   EXPECT_EQ(SQLO_RC_DISK_FULL, sqlocopydir("C:\\other", "C:\\inst\\INST1", 0));
+}
+
+// A copy's progress goes to standard error only when that is a console, as one
+// line rewritten in place and ended when the copy ends; nothing without the flag.
+TEST_F(Files, TreeCopyShowsItsProgressOnAConsoleOnly) {
+  makeTree("C:\\inst\\INST1");
+  setenv("KXLSIM_PROGRESS_AFTER_MS", "0", 1);
+  auto copyWithErrorTo = [](int fd, uint32_t flags) {
+    std::fflush(stderr);
+    int saved = dup(2);
+    dup2(fd, 2);
+    int32_t rc = sqlocopydir("C:\\copy", "C:\\inst\\INST1", flags);
+    std::fflush(stderr);
+    dup2(saved, 2);
+    close(saved);
+    sqlodeletedir("C:\\copy");
+    return rc;
+  };
+  auto shown = [](int fd) {
+    std::string text;
+    char buffer[512];
+    for (ssize_t n; (n = read(fd, buffer, sizeof buffer)) > 0;)
+      text.append(buffer, static_cast<size_t>(n));
+    return text;
+  };
+  int console = -1, terminal = -1;
+  ASSERT_EQ(0, openpty(&console, &terminal, nullptr, nullptr, nullptr));
+  fcntl(console, F_SETFL, O_NONBLOCK);
+  EXPECT_EQ(0, copyWithErrorTo(terminal, 0));
+  EXPECT_EQ(shown(console), "");
+  EXPECT_EQ(0, copyWithErrorTo(terminal, SQLO_COPYDIR_SHOW_PROGRESS));
+  std::string line = shown(console);
+  EXPECT_EQ(line.rfind("\rcopying to C:\\copy: 0 of 0 MiB (", 0), 0u) << line;
+  EXPECT_NE(line.find("(100%)\r\n"), std::string::npos) << line; // the terminal turns \n into \r\n
+  close(terminal);
+  close(console);
+  FILE *file = std::tmpfile();
+  ASSERT_NE(file, nullptr);
+  EXPECT_EQ(0, copyWithErrorTo(fileno(file), SQLO_COPYDIR_SHOW_PROGRESS));
+  EXPECT_EQ(std::ftell(file), 0L) << "not a console: nothing shown";
+  std::fclose(file);
+  unsetenv("KXLSIM_PROGRESS_AFTER_MS");
 }
 
 TEST_F(Files, DeleteRemovesFilesOnly) {
