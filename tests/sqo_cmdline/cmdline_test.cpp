@@ -15,6 +15,8 @@
 
 namespace {
 
+using Args = std::vector<std::string>;
+
 class CommandLine : public kxltest::ProductWorld {
 protected:
   // Parses "KXLIUPGRADE" followed by `args` into a cleared record.
@@ -35,29 +37,25 @@ TEST_F(CommandLine, NoArgumentsAndHelpAreUsage) {
   const char *alone[] = {"KXLIUPGRADE", nullptr};
   EXPECT_EQ(UPGRADE_RC_USAGE, parseCommandLine(1, alone, &options));
   EXPECT_EQ(UPGRADE_RC_USAGE, parseCommandLine(0, nullptr, &options));
-  EXPECT_EQ(UPGRADE_RC_USAGE, parse({"-?"}));
-  EXPECT_EQ(UPGRADE_RC_USAGE, parse({"INST1", "-?"}));
-  EXPECT_EQ(UPGRADE_RC_USAGE, parse({"INST1", "/?"}));
-  EXPECT_EQ(UPGRADE_RC_USAGE, parse({"-q"})) << "options without an instance name";
+  // The last: options without an instance name.
+  for (const std::vector<std::string> &args :
+       {Args{"-?"}, Args{"INST1", "-?"}, Args{"INST1", "/?"}, Args{"-q"}})
+    EXPECT_EQ(UPGRADE_RC_USAGE, parse(args)) << args.back();
 }
 
 TEST_F(CommandLine, OptionWordsPrefixAndCase) {
-  EXPECT_EQ(0, parse({"/q", "inst1"}));
-  EXPECT_EQ(1, options.quiet);
-  EXPECT_EQ(0, parse({"-Q", "inst1"}));
-  EXPECT_EQ(1, options.quiet);
-  EXPECT_EQ(0, parse({"-quack", "inst1"})) << "only the option letter decides";
-  EXPECT_EQ(1, options.quiet);
+  for (const char *quiet : {"/q", "-Q", "-quack"}) { // only the option letter decides
+    EXPECT_EQ(0, parse({quiet, "inst1"})) << quiet;
+    EXPECT_EQ(1, options.quiet) << quiet;
+  }
 
   EXPECT_EQ(0, parse({"inst1", "-INSTALL", "/forcecn"}));
   EXPECT_EQ(UPGRADE_FLAG_INSTALLER | UPGRADE_FLAG_FORCE_COPY_NAME, options.flags);
   EXPECT_EQ(0, parse({"inst1", "-installer"}));
   EXPECT_EQ(UPGRADE_FLAG_INSTALLER, options.flags);
 
-  EXPECT_EQ(UPGRADE_RC_USAGE, parse({"inst1", "-inst"})) << "shorter than the option word";
-  EXPECT_EQ(UPGRADE_RC_USAGE, parse({"inst1", "-force"}));
-  EXPECT_EQ(UPGRADE_RC_USAGE, parse({"inst1", "-x"}));
-  EXPECT_EQ(UPGRADE_RC_USAGE, parse({"inst1", "-"}));
+  for (const char *unknown : {"-inst", "-force", "-x", "-"}) // the first two: shorter than the option word
+    EXPECT_EQ(UPGRADE_RC_USAGE, parse({"inst1", unknown})) << unknown;
 }
 
 TEST_F(CommandLine, InstanceNameLengthCaseAndCount) {
@@ -115,10 +113,7 @@ TEST_F(CommandLine, ProfilePathMustBeADirectory) {
 #endif
   EXPECT_EQ(UPGRADE_RC_BAD_PROFILE_PATH, parse({"-p", "Q:\\", "inst1"}));
 
-  HANDLE file = CreateFileA("C:\\Profiles\\note.txt", GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS,
-                            FILE_ATTRIBUTE_NORMAL, nullptr);
-  ASSERT_NE(INVALID_HANDLE_VALUE, file);
-  CloseHandle(file);
+  writeFile("C:\\Profiles\\note.txt", std::string());
   EXPECT_EQ(UPGRADE_RC_BAD_PROFILE_PATH, parse({"-p", "C:\\Profiles\\note.txt", "inst1"}));
   EXPECT_EQ(UPGRADE_RC_BAD_PROFILE_PATH, parse({"-p", "C:\\Profiles\\Missing", "inst1"}));
   EXPECT_EQ(UPGRADE_RC_USAGE, parse({"inst1", "-p"}));
