@@ -2,6 +2,7 @@
 
 #include "NT/kxliutil.h"
 #include "NT/pathjoin.h"
+#include "install/iutil.h"
 #include "install/kxlinstance.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
@@ -98,7 +99,7 @@ bool readWhole(const char *path, std::string &text, bool &missing) {
                             FILE_ATTRIBUTE_NORMAL, nullptr);
   if (file == INVALID_HANDLE_VALUE) {
     DWORD error = GetLastError();
-    missing = error == ERROR_FILE_NOT_FOUND || error == ERROR_PATH_NOT_FOUND;
+    missing = kxliIsMissing(static_cast<LONG>(error));
     return false;
   }
   char buffer[kMaxRecordSize];

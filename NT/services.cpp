@@ -5,6 +5,7 @@
 #include "NT/localhost.h"
 #include "NT/nodetypechoice.h"
 #include "NT/pathjoin.h"
+#include "install/iutil.h"
 #include "platform/kxlsys.h"
 #include "platform/win32.h"
 #include "upgrade/errortrace.h"
@@ -170,11 +171,6 @@ bool clusterProfileKeyPath(const ServicesStep &step, char *path, size_t size) {
   return formed(ossSnprintf(path, size, "Cluster\\ZAV\\KXL\\PROFILES\\%s", step.instanceName));
 }
 
-// A key or value that is not there is missing; any other failure is a failed read.
-bool missing(LONG rc) {
-  return rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND;
-}
-
 // ERROR_SUCCESS with the value, a missing code, or the failure.
 LONG readClusterValue(HKEY key, const char *name, char *value) {
   DWORD size = kClusterValueSize;
@@ -206,7 +202,7 @@ int32_t writeMachineClusterValues(const ServicesStep &step) {
     return unformed();
   HKEY key = nullptr;
   LONG opened = RegOpenKeyExA(step.machine->hklm, path, 0, KEY_ALL_ACCESS, &key);
-  if (missing(opened))
+  if (kxliIsMissing(opened))
     return 0;
   if (opened != ERROR_SUCCESS)
     return traced(kProbeClusterProfile, UPGRADE_RC_MACHINE_REGISTRY);
@@ -227,11 +223,12 @@ int32_t readClusterProfile(ServicesStep &step) {
   LONG opened = RegOpenKeyExA(HKEY_LOCAL_MACHINE, path, 0, KEY_ALL_ACCESS, &cluster.key);
   if (opened != ERROR_SUCCESS) {
     cluster.key = nullptr;
-    return missing(opened) ? 0 : traced(kProbeClusterProfile, UPGRADE_RC_MACHINE_REGISTRY);
+    return kxliIsMissing(opened) ? 0 : traced(kProbeClusterProfile, UPGRADE_RC_MACHINE_REGISTRY);
   }
   LONG list = readClusterValue(cluster.key, kClusterList, cluster.list);
   LONG profile = readClusterValue(cluster.key, kClusterInstanceProfile, cluster.instanceProfile);
-  if ((list != ERROR_SUCCESS && !missing(list)) || (profile != ERROR_SUCCESS && !missing(profile)))
+  if ((list != ERROR_SUCCESS && !kxliIsMissing(list)) ||
+      (profile != ERROR_SUCCESS && !kxliIsMissing(profile)))
     return traced(kProbeClusterProfile, UPGRADE_RC_MACHINE_REGISTRY);
   cluster.hasList = list == ERROR_SUCCESS;
   cluster.hasInstanceProfile = profile == ERROR_SUCCESS;

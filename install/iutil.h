@@ -27,6 +27,12 @@ LONG kxliReadRegString(HKEY root, const char *key, REGSAM access, const char *va
 // Reads a string value of an open key the same way.
 LONG kxliQueryString(HKEY key, const char *valueName, char *buffer, DWORD size);
 
+// A key, value or file that is not there, as against one that could not be
+// read (which is never taken for a missing one).
+inline bool kxliIsMissing(LONG rc) {
+  return rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND;
+}
+
 // Whether root\key opens with `access`.
 bool kxliKeyOpens(HKEY root, const char *key, REGSAM access);
 

@@ -85,8 +85,8 @@ std::string displayName(const CopyInfo &copy, const std::string &service) {
   return copy.v8 ? "KXL - " + service : "KXL - " + copy.name + " - " + service;
 }
 
-// A value (or the service's key) that is not there, as against one that
-// could not be read.
+// A value, key or file that is not there, as against one that could not be
+// read.
 bool absent(LONG rc) {
   return rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND;
 }
@@ -184,7 +184,7 @@ int32_t writeConfiguration(const CopyInfo &copy, const CreateRequest &request, c
       kxlprod::joinPath(copy.path, std::string("CFG\\") + dbmCfgTemplateName(request.nodeType));
   std::vector<uint8_t> image;
   LONG rc = kxlprod::readWholeFile(source, DBMCFG_IMAGE_SZ, image);
-  if (rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND)
+  if (absent(rc))
     return SQLO_RC_FILE_NOT_FOUND;
   if (rc != ERROR_SUCCESS || image.size() != DBMCFG_IMAGE_SZ)
     return SQLO_RC_IO_ERROR;
