@@ -409,10 +409,21 @@ bool readClusterList(const char *instance, char (&list)[kRegValueBuffer]) {
   list[0] = '\0';
   if (!formatWhole(key, sizeof key, "Cluster\\ZAV\\KXL\\PROFILES\\%s", instance))
     return false;
+  // A failed read leaves the list empty.
   LONG rc = kxliReadRegString(HKEY_LOCAL_MACHINE, key, KEY_ALL_ACCESS, kClusterListValue, list, sizeof list);
-  if (rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND)
-    list[0] = '\0';
-  return rc == ERROR_SUCCESS || rc == ERROR_FILE_NOT_FOUND || rc == ERROR_PATH_NOT_FOUND;
+  return rc == ERROR_SUCCESS || kxliIsMissing(rc);
+}
+
+// The cluster's machines, read once per run and kept: the undo walks the
+// machines the move walked (after a kill, the next run reads them afresh).
+bool clusterMachines(MachineWalk &walk, char (&list)[kRegValueBuffer]) {
+  if (!walk.context.clusterMachines) {
+    if (!readClusterList(walk.options.instanceName, list))
+      return false;
+    walk.context.clusterMachines = list;
+  }
+  std::snprintf(list, sizeof list, "%s", walk.context.clusterMachines->c_str());
+  return true;
 }
 
 // The machines of the cluster list that the first pass did not handle, through
@@ -430,7 +441,7 @@ int32_t walkCluster(MachineWalk &walk) {
   if (nameRc != 0)
     return ErrorTrace{walk.function}(kProbeClusterName, static_cast<int32_t>(nameRc));
   char list[kRegValueBuffer];
-  if (!readClusterList(walk.options.instanceName, list))
+  if (!clusterMachines(walk, list))
     return ErrorTrace{walk.function}(kProbeClusterList, UPGRADE_RC_NO_COPY);
   int32_t first = 0;
   for (char *name = list; *name != '\0';) {
@@ -578,7 +589,7 @@ void repointClusterServices(MachineWalk &walk) {
     computer[0] = '\0';
   computer[sizeof computer - 1] = '\0';
   char list[kRegValueBuffer];
-  if (!readClusterList(walk.options.instanceName, list)) {
+  if (!clusterMachines(walk, list)) {
     serviceNotBack(walk, UPGRADE_RC_NO_COPY);
     return;
   }

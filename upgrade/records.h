@@ -11,6 +11,7 @@
 
 #include <cstdint>
 #include <cstdlib>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -146,4 +147,8 @@ public:
   uint32_t recreatedNodeType = 0;
   // Filled by the services step before it changes any service's account.
   std::vector<ServiceAccount> serviceAccounts;
+  // The cluster's machines ("KXLCLUSTERLIST") as the profile move read them;
+  // the undo walks these, so that a read failing in the undo cannot leave a
+  // machine moved. Unset until read in this process.
+  std::optional<std::string> clusterMachines;
 };
