@@ -657,19 +657,8 @@ int32_t sqloIsContentExtenderInstalled(const char *installPath);
 int32_t pdLog(uint32_t level, uint32_t functionId, uint32_t probe, int32_t rc, const char *format, ...)
     KXL_PRINTF(5, 6);
 void pdtEntry(uint32_t functionId);
-void pdtEntry1(uint32_t functionId, uint32_t type, uint64_t size, const void *data);
 void pdtExit(uint32_t functionId, int64_t rc, uint32_t probe);
-void pdtExit1(uint32_t functionId, int64_t rc, uint32_t probe, uint32_t type, uint64_t size,
-              const void *data);
 void pdtError(uint32_t functionId, uint32_t probe, int64_t rc);
 void pdtData1(uint32_t functionId, uint32_t probe, uint32_t type, uint64_t size, const void *data);
-void pdtData2(uint32_t functionId, uint32_t probe, uint32_t type1, uint64_t size1, const void *data1,
-              uint32_t type2, uint64_t size2, const void *data2);
-void pdFlightRecordTrc(uint32_t functionId, uint32_t probe, const char *text);
-void sqltEntry(uint32_t functionId);
-void sqltExit(uint32_t functionId, int32_t rc);
-void sqltError(uint32_t functionId, uint32_t probe, int32_t rc);
-void sqltData2(uint32_t functionId, uint32_t probe, uint64_t size1, const void *data1, uint64_t size2,
-               const void *data2);
 
 } // extern "C"

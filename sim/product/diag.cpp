@@ -4,7 +4,7 @@
 //   entry 0x<id>
 //   exit 0x<id> rc=<n>
 //   error 0x<id> probe=<n> rc=<n>
-//   data 0x<id> probe=<n> <items>
+//   data 0x<id> probe=<n> <item>
 // Without it the hooks return after one cached check. Both files are host
 // files outside the simulated drives, so they are written with the C run time.
 #include "sim/product/diag.h"
@@ -110,32 +110,20 @@ void traceWrite(Line &line) {
   appendLine(tracePath(), line.finish());
 }
 
+void traceLine(const char *format, ...) KXL_PRINTF(1, 2);
+void traceLine(const char *format, ...) {
+  Line line;
+  va_list args;
+  va_start(args, format);
+  line.addv(format, args);
+  va_end(args);
+  traceWrite(line);
+}
+
 // Called once by every hook: each hook is also a kill point ("trace").
 bool tracing() {
   kxlsim::killPoint("trace");
   return !tracePath().empty();
-}
-
-void traceExit(uint32_t functionId, int64_t rc) {
-  Line line;
-  line.add("exit 0x%08" PRIX32 " rc=%" PRId64, functionId, rc);
-  traceWrite(line);
-}
-
-void traceError(uint32_t functionId, uint32_t probe, int64_t rc) {
-  Line line;
-  line.add("error 0x%08" PRIX32 " probe=%" PRIu32 " rc=%" PRId64, functionId, probe, rc);
-  traceWrite(line);
-}
-
-void traceData(uint32_t functionId, uint32_t probe, uint32_t type1, uint64_t size1, const void *data1,
-               uint32_t type2, uint64_t size2, const void *data2) {
-  Line line;
-  line.add("data 0x%08" PRIX32 " probe=%" PRIu32, functionId, probe);
-  line.addItem(type1, size1, data1);
-  if (type2 != 0 && data2 != nullptr)
-    line.addItem(type2, size2, data2);
-  traceWrite(line);
 }
 
 } // namespace
@@ -175,78 +163,28 @@ int32_t pdLog(uint32_t level, uint32_t functionId, uint32_t probe, int32_t rc, c
 }
 
 void pdtEntry(uint32_t functionId) {
-  if (!tracing())
-    return;
-  Line line;
-  line.add("entry 0x%08" PRIX32, functionId);
-  traceWrite(line);
-}
-
-void pdtEntry1(uint32_t functionId, uint32_t type, uint64_t size, const void *data) {
-  if (!tracing())
-    return;
-  Line line;
-  line.add("entry 0x%08" PRIX32, functionId);
-  line.addItem(type, size, data);
-  traceWrite(line);
+  if (tracing())
+    traceLine("entry 0x%08" PRIX32, functionId);
 }
 
 void pdtExit(uint32_t functionId, int64_t rc, uint32_t probe) {
   (void)probe;
   if (tracing())
-    traceExit(functionId, rc);
-}
-
-void pdtExit1(uint32_t functionId, int64_t rc, uint32_t probe, uint32_t type, uint64_t size,
-              const void *data) {
-  (void)probe;
-  if (!tracing())
-    return;
-  Line line;
-  line.add("exit 0x%08" PRIX32 " rc=%" PRId64, functionId, rc);
-  line.addItem(type, size, data);
-  traceWrite(line);
+    traceLine("exit 0x%08" PRIX32 " rc=%" PRId64, functionId, rc);
 }
 
 void pdtError(uint32_t functionId, uint32_t probe, int64_t rc) {
   if (tracing())
-    traceError(functionId, probe, rc);
+    traceLine("error 0x%08" PRIX32 " probe=%" PRIu32 " rc=%" PRId64, functionId, probe, rc);
 }
 
 void pdtData1(uint32_t functionId, uint32_t probe, uint32_t type, uint64_t size, const void *data) {
-  if (tracing())
-    traceData(functionId, probe, type, size, data, 0, 0, nullptr);
-}
-
-void pdtData2(uint32_t functionId, uint32_t probe, uint32_t type1, uint64_t size1, const void *data1,
-              uint32_t type2, uint64_t size2, const void *data2) {
-  if (tracing())
-    traceData(functionId, probe, type1, size1, data1, type2, size2, data2);
-}
-
-void pdFlightRecordTrc(uint32_t functionId, uint32_t probe, const char *text) {
-  if (tracing())
-    traceData(functionId, probe, PD_TYPE_STRING, 0, text, 0, 0, nullptr);
-}
-
-void sqltEntry(uint32_t functionId) {
-  pdtEntry(functionId);
-}
-
-void sqltExit(uint32_t functionId, int32_t rc) {
-  if (tracing())
-    traceExit(functionId, rc);
-}
-
-void sqltError(uint32_t functionId, uint32_t probe, int32_t rc) {
-  if (tracing())
-    traceError(functionId, probe, rc);
-}
-
-void sqltData2(uint32_t functionId, uint32_t probe, uint64_t size1, const void *data1, uint64_t size2,
-               const void *data2) {
-  if (tracing())
-    traceData(functionId, probe, PD_TYPE_BYTES, size1, data1, PD_TYPE_BYTES, size2, data2);
+  if (!tracing())
+    return;
+  Line line;
+  line.add("data 0x%08" PRIX32 " probe=%" PRIu32, functionId, probe);
+  line.addItem(type, size, data);
+  traceWrite(line);
 }
 
 } // extern "C"
