@@ -1,5 +1,7 @@
-// Creating instances under the current copy, partition entries, and removing
-// what a creation made.
+// Creating instances under the current copy and removing what a creation made.
+// Re-creating an instance and its partition 0 and undoing both are driven by
+// the upgrade's failure table (tests/driver) and the re-creation cases
+// (tests/services_env), which add and remove partition 0 on this machine only.
 #include "demo_world.h"
 
 namespace kxltest {
@@ -70,31 +72,6 @@ TEST_F(Instances, DropUndoesACreationCompletely) {
   EXPECT_EQ(diff(), "");
 }
 
-TEST_F(Instances, DropAfterReCreatingAnExistingInstancePutsItBack) {
-  std::string dir = kOldCopy + "\\INST1";
-  snapshot();
-  int32_t extra = -1, reason = -1;
-  ASSERT_EQ(0, sqlo_instance_create_extended("INST1", kOldCopy.c_str(), kCopy.c_str(), 0, nullptr, nullptr, 0,
-                                             1, 1, nullptr, 1, 1, 0, nullptr, 0, &reason, &extra));
-  EXPECT_EQ(regString(kInstances + "INST1", "Copy"), "KXL101");
-  EXPECT_EQ(regString(kServices + "INST1", "ImagePath"), kCopy + "\\bin\\kxlsyscs.exe");
-  EXPECT_EQ(getDword(kServices + "INST1", "Start"), 2u) << "the start type stays";
-  EXPECT_TRUE(pathExists(dir + "\\security\\kxlaudit.cfg")) << "other files of the directory stay";
-  ASSERT_EQ(0, sqlo_instance_drop("INST1", dir.c_str()));
-  EXPECT_EQ(diff(), "");
-}
-
-TEST_F(Instances, DropOfAnInstanceNotCreatedHereRemovesEveryTrace) {
-  ASSERT_EQ(0, sqlo_instance_drop("INST2", nullptr));
-  EXPECT_FALSE(keyExists(kInstances + "INST2"));
-  EXPECT_FALSE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST2"));
-  EXPECT_FALSE(keyExists(kServices + "INST2-0"));
-  EXPECT_TRUE(keyExists(kRemote + kServices + "INST2-1")) << "other machines are not touched";
-  EXPECT_EQ(GetFileAttributesA((kOldCopy + "\\INST2").c_str()), INVALID_FILE_ATTRIBUTES);
-  EXPECT_EQ(SQLO_RC_NOT_FOUND, sqlo_instance_drop("INST2", nullptr));
-  EXPECT_TRUE(keyExists(kInstances + "INST1"));
-}
-
 TEST_F(Instances, TextSearchReportsWhyItCouldNotBeConfigured) {
   int32_t reason = -1;
   ASSERT_EQ(0, create("TSA", 1, nullptr, 1, "kxltsa", 60002, &reason));
@@ -107,36 +84,6 @@ TEST_F(Instances, TextSearchReportsWhyItCouldNotBeConfigured) {
   EXPECT_EQ(reason, 0);
   EXPECT_NE(readText("C:\\windows\\system32\\drivers\\etc\\services").find("KXLTS_TSD          55000/tcp"),
             std::string::npos);
-}
-
-TEST_F(Instances, PartitionEntriesAddAndRemoveTheirService) {
-  snapshot();
-  SQLO_INST_OUT out1{}, out2{};
-  ASSERT_EQ(0, create("PART", 4));
-  ASSERT_EQ(0, sqlo_instance_addnode("PART", 0, nullptr, 0, nullptr, nullptr, &out1, &out2));
-  EXPECT_EQ(regString(kServices + "PART-0", "DisplayName"), "KXL - KXL101 - PART-0");
-  ASSERT_EQ(0, sqlo_instance_addnode("PART", 1, "winsrv2", 0, nullptr, nullptr, &out1, &out2));
-  EXPECT_TRUE(keyExists(kRemote + kServices + "PART-1"));
-  EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE,
-            sqlo_instance_addnode("PART", 2, "nohost", 0, nullptr, nullptr, &out1, &out2));
-  EXPECT_EQ(out2.code, SQLO_RC_MACHINE_UNREACHABLE);
-  ASSERT_EQ(0, sqlo_instance_delnode("PART", 1, "winsrv2", 0, &out1, &out2));
-  ASSERT_EQ(0, sqlo_instance_delnode("PART", 0, nullptr, 0, &out1, &out2));
-  EXPECT_EQ(SQLO_RC_SVC_NOT_FOUND, sqlo_instance_delnode("PART", 0, nullptr, 0, &out1, &out2));
-  ASSERT_EQ(0, sqlo_instance_drop("PART", nullptr));
-  EXPECT_EQ(diff(), "");
-}
-
-TEST_F(Instances, ReAddingAnExistingPartitionAndRemovingItRestoresTheService) {
-  ASSERT_EQ(0, sqlo_instance_create_extended("INST2", kOldCopy.c_str(), kCopy.c_str(), 0, nullptr, nullptr, 0,
-                                             4, 4, nullptr, 1, 1, 0, nullptr, 0, nullptr, nullptr));
-  snapshot();
-  SQLO_INST_OUT out1{}, out2{};
-  ASSERT_EQ(0, sqlo_instance_addnode("INST2", 0, nullptr, 0, nullptr, nullptr, &out1, &out2));
-  EXPECT_EQ(regString(kServices + "INST2-0", "ImagePath"), kCopy + "\\bin\\kxlsyscs.exe");
-  EXPECT_EQ(regString(kServices + "INST2-0", "ObjectName"), ".\\kxlsvc") << "the account stays";
-  ASSERT_EQ(0, sqlo_instance_delnode("INST2", 0, nullptr, 0, &out1, &out2));
-  EXPECT_EQ(diff(), "");
 }
 
 TEST_F(Instances, InjectedFailuresChangeNothing) {

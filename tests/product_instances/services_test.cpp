@@ -1,8 +1,8 @@
 // Service configuration on this and other machines, the services file, host
-// names and measures.
+// names and measures. What the upgrade's services step relies on is driven
+// through it in tests/services_env; here what those cases cannot see.
 #include "demo_world.h"
 
-#include <algorithm>
 #include <cstring>
 
 namespace kxltest {
@@ -17,29 +17,12 @@ int32_t changeStart(const char *name, const char *machine, uint32_t start, const
                                    nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, &out);
 }
 
-TEST_F(Services, QueryGivesTheStoredConfiguration) {
-  SQLO_SVC_CONFIG config{};
-  SQLO_SVC_OUT out{};
-  ASSERT_EQ(0, sqloQueryNTServiceConfig("INST1", nullptr, &config, &out));
-  EXPECT_EQ(config.startType, 2);
-  EXPECT_STREQ(config.programPath, "C:\\Program Files\\ZAV\\KXL95\\bin\\kxlsyscs.exe");
-  EXPECT_STREQ(config.displayName, "KXL - KXL95 - INST1");
-  EXPECT_STREQ(config.account, "LocalSystem");
-  ASSERT_EQ(0, sqloQueryNTServiceConfig("INST2-2", "WINSRV2", &config, &out));
-  EXPECT_STREQ(config.account, ".\\kxlsvc");
-  EXPECT_EQ(SQLO_RC_SVC_NOT_FOUND, sqloQueryNTServiceConfig("INST2-2", nullptr, &config, &out));
-  EXPECT_EQ(SQLO_RC_MACHINE_UNREACHABLE, sqloQueryNTServiceConfig("INST1", "WINSRV9", &config, &out));
-}
-
 TEST_F(Services, ChangeTouchesOnlyWhatIsGiven) {
   snapshot();
   ASSERT_EQ(0, changeStart("INST1", nullptr, 3));
   EXPECT_EQ(diff(),
             "registry ~ HKLM\\SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1 \"Start\": dword:2 -> dword:3\n");
-  snapshot();
-  ASSERT_EQ(0, changeStart("INST1", "WINSRV1", SQLO_SVC_NO_CHANGE));
-  EXPECT_EQ(diff(), "") << "no change at all, the local computer by name";
-  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, changeStart("INST1", nullptr, 9));
+  EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, changeStart("INST1", "WINSRV1", 9));
 }
 
 TEST_F(Services, ChangeOnAnotherMachineGoesToItsSubtree) {
@@ -88,22 +71,18 @@ TEST_F(Services, ServicesFileRangesAreReservedOnce) {
   ASSERT_EQ(0, sqloUpdateServiceFile(3, "NEWP", first, last));
   EXPECT_STREQ(first, "60004") << "the ports between INST2's entries count as used";
   EXPECT_STREQ(last, "60007");
-  std::string changes = diff();
-  EXPECT_EQ(changes.rfind("file ~ C:\\windows\\system32\\drivers\\etc\\services\n", 0), 0u) << changes;
-  EXPECT_NE(changes.find("+ KXL_NEWP           60004/tcp\n"), std::string::npos) << changes;
-  EXPECT_NE(changes.find("+ KXL_NEWP_END       60007/tcp\n"), std::string::npos) << changes;
-  EXPECT_EQ(std::count(changes.begin(), changes.end(), '\n'), 3) << changes;
+  EXPECT_EQ(diff(), "file ~ C:\\windows\\system32\\drivers\\etc\\services\n"
+                    "       + KXL_NEWP           60004/tcp\n"
+                    "       + KXL_NEWP_END       60007/tcp\n");
   EXPECT_EQ(SQLO_RC_INVALID_ARGUMENT, sqloUpdateServiceFile(1, "NEWP", first, last));
 }
 
-TEST_F(Services, HostNamesResolveOnlyWhenKnown) {
-  char full[SQLO_HOSTNAME_SZ] = {};
-  ASSERT_EQ(0, sqloPdbTcpIpResolveHostName("WINSRV2", full, 5, 1));
-  EXPECT_STREQ(full, "winsrv2.zav.test");
+// Resolving, names and their faults are driven by the re-creation of an
+// instance (tests/services_env); here what a caller's buffer gets.
+TEST_F(Services, HostNamesResolveOnlyWhenKnownAndNamesNeedRoom) {
+  char full[SQLO_HOSTNAME_SZ] = "old";
   EXPECT_EQ(SQLO_RC_NOT_FOUND, sqloPdbTcpIpResolveHostName("winsrv3", full, 5, 1));
   EXPECT_STREQ(full, "");
-  ASSERT_EQ(0, sqloPdbTcpIpGetFullHostName(full, 5));
-  EXPECT_STREQ(full, "winsrv1.zav.test");
   char computer[16] = {};
   uint32_t size = 4;
   EXPECT_EQ(0, sqloGetComputerNameA(computer, &size));
@@ -112,42 +91,19 @@ TEST_F(Services, HostNamesResolveOnlyWhenKnown) {
   ASSERT_NE(0, sqloGetComputerNameA(computer, &size));
   EXPECT_STREQ(computer, "WINSRV1");
   EXPECT_EQ(size, 7u);
-  failCalls("sqloGetComputerNameA:1,sqloPdbTcpIpGetFullHostName:1");
-  EXPECT_EQ(0, sqloGetComputerNameA(computer, &size));
-  EXPECT_EQ(GetLastError(), DWORD(ERROR_ACCESS_DENIED));
-  EXPECT_NE(0, sqloPdbTcpIpGetFullHostName(full, 5));
 }
 
-TEST_F(Services, MeasuresAcceptTextAndDwords) {
-  float value = 0;
-  ASSERT_EQ(0, sqlocpum(&value));
-  EXPECT_FLOAT_EQ(value, 4e-5f);
-  ASSERT_EQ(0, sqloGetCommBandwidth(&value, 4));
-  EXPECT_FLOAT_EQ(value, 100.0f);
-  float bits = 2.5f;
+// The demo machine's measures (text) are in the converted configuration file
+// of the end-to-end upgrade; text values and faults in tests/services_env.
+TEST_F(Services, MeasuresAcceptDwordsAndRefuseText) {
+  float value = 0, bits = 2.5f;
   DWORD word = 0;
   std::memcpy(&word, &bits, sizeof word);
-  setDword("SOFTWARE\\ZAV\\KXLSIM\\Identity", "CommBandwidth", word);
+  setDword(kIdentity, "CommBandwidth", word);
   ASSERT_EQ(0, sqloGetCommBandwidth(&value, 4));
   EXPECT_FLOAT_EQ(value, 2.5f);
-  setString("SOFTWARE\\ZAV\\KXLSIM\\Identity", "CpuMeasure", "fast");
+  setString(kIdentity, "CpuMeasure", "fast");
   EXPECT_NE(0, sqlocpum(&value));
-  failCalls("sqloGetCommBandwidth:1");
-  EXPECT_NE(0, sqloGetCommBandwidth(&value, 4));
-}
-
-TEST_F(Services, AssistantReportsItsMachineNameInsideASession) {
-  CAPRO_REQUEST request{};
-  CAPRO_RESULT result{};
-  request.queryKind = CAPRO_QUERY_MACHINE_NAME;
-  EXPECT_NE(0, caProIfQuery(&request, &result)) << "no session yet";
-  ASSERT_EQ(0, caProIfInit());
-  ASSERT_EQ(0, caProIfQuery(&request, &result));
-  EXPECT_STREQ(request.machineName, "winsrv1.zav.test");
-  EXPECT_EQ(0, caProIfTerm());
-  EXPECT_NE(0, caProIfTerm());
-  failCalls("caProIfInit:1");
-  EXPECT_NE(0, caProIfInit());
 }
 
 } // namespace

@@ -7,32 +7,29 @@ namespace {
 
 using SetupTest = kxltest::ProductWorld;
 
-TEST_F(SetupTest, InitialisedBlockCarriesItsIdAndSizeOnly) {
+TEST_F(SetupTest, InitialisedBlockCarriesItsIdAndSizeAndTheProducerTagIsBlankPadded) {
   sqlca ca;
   std::memset(&ca, 0x5A, sizeof ca);
   sqloinca(&ca);
-  EXPECT_EQ(std::string(ca.sqlcaid, 8), "SQLCA   ");
-  EXPECT_EQ(ca.sqlcabc, 136);
-  EXPECT_EQ(ca.sqlcode, 0);
+  EXPECT_EQ(std::string(reinterpret_cast<const char *>(&ca), 16),
+            std::string("SQLCA   \x88\0\0\0\0\0\0\0", 16)); // id, size 136, sqlcode 0
   EXPECT_EQ(ca.sqlerrml, 0);
   EXPECT_EQ(ca.sqlerrp[0], '\0');
+  sqlcaSetProducer(ca, "AB");
+  EXPECT_EQ(std::string(ca.sqlerrp, 8), "AB      ");
 }
 
 TEST_F(SetupTest, TokensAreJoinedBySeparatorAndCutToTheField) {
   sqlca ca;
   sqloinca(&ca);
-  const char *two[] = {"USER1", "X"};
+  std::string longToken(100, 'T');
+  const char *two[] = {"USER1", "X"}, *one[] = {longToken.c_str()};
+  const uint64_t three[] = {3};
   ASSERT_EQ(0, sqlegsca(-1092, 2, nullptr, two, &ca));
   EXPECT_EQ(ca.sqlcode, -1092);
   EXPECT_EQ(std::string(ca.sqlerrmc, ca.sqlerrml), std::string("USER1\xFFX"));
-
-  // A token length shorter than the text limits what is taken.
-  const uint64_t lengths[] = {3};
-  ASSERT_EQ(0, sqlegsca(-1092, 1, lengths, two, &ca));
-  EXPECT_EQ(std::string(ca.sqlerrmc, ca.sqlerrml), "USE");
-
-  std::string longToken(100, 'T');
-  const char *one[] = {longToken.c_str()};
+  ASSERT_EQ(0, sqlegsca(-1092, 1, three, two, &ca));
+  EXPECT_EQ(std::string(ca.sqlerrmc, ca.sqlerrml), "USE") << "a token length shorter than the text limits it";
   ASSERT_EQ(0, sqlegsca(-1092, 1, nullptr, one, &ca));
   EXPECT_EQ(ca.sqlerrml, 70);
   EXPECT_EQ(std::string(ca.sqlerrp, 8), std::string(8, '\0')) << "tokens must stay inside sqlerrmc";
@@ -44,7 +41,6 @@ TEST_F(SetupTest, ResultCodesBecomeSqlcodesWithTheProducerTag) {
   ASSERT_EQ(0, sqlzRcToSqlca(0, &ca, "KXLIUPGRADE", -1403, 0, 0));
   EXPECT_EQ(ca.sqlcode, -1403);
   EXPECT_EQ(std::string(ca.sqlerrp, 8), "KXLIUPGR");
-
   // A library code is no SQLCODE: it is reported as a system error naming the code.
   ASSERT_EQ(0, sqlzRcToSqlca(0, &ca, "KXLIUPGRADE", SQLO_RC_IO_ERROR, 0, 0));
   EXPECT_EQ(ca.sqlcode, -1042);
