@@ -18,8 +18,9 @@ protected:
     OSSInstanceInfo_t info{};
     while ((endCode = ossGetNextInstance(handle, &info, false)) == 0)
       found.push_back(info.instanceName);
-    if (endCode == OSS_RC_END_OF_LIST)
+    if (endCode == OSS_RC_END_OF_LIST) {
       EXPECT_EQ(endCode, ossGetNextInstance(handle, &info, false)) << "the end is repeated";
+    }
     EXPECT_EQ(0u, ossCloseInstanceList(handle));
     return found;
   }
