@@ -38,12 +38,11 @@ TEST(Compare, IgnoresCaseOverTheGivenLength) {
 }
 
 TEST(Upper, ConvertsInPlaceWithinTheLength) {
-  char name[] = "inst1x@";
+  char name[] = "inst1x@", shortText[] = "ab";
   EXPECT_EQ(0, sqlotoup(5, 0, name));
   EXPECT_STREQ("INST1x@", name);
   EXPECT_EQ(0, sqlotoup(0, 0, name));
   EXPECT_STREQ("INST1X@", name);
-  char shortText[] = "ab";
   EXPECT_EQ(0, sqlotoup(8, 0, shortText));
   EXPECT_STREQ("AB", shortText);
 }
@@ -119,26 +118,20 @@ protected:
   int saved_ = -1;
 };
 
-TEST_F(PipedInput, PasswordIsReadFromANonTerminal) {
-  feed("s3cret pass\r\nnext line\n");
-  char password[256] = "old";
-  ::testing::internal::CaptureStdout();
-  int32_t rc = sqlo_get_password("joe", password, sizeof password);
-  std::string shown = ::testing::internal::GetCapturedStdout();
-  EXPECT_EQ(0, rc);
-  EXPECT_STREQ("s3cret pass", password);
-  EXPECT_EQ("Enter password for joe:", shown);
-}
-
-TEST_F(PipedInput, PasswordIsCutToTheBufferAndEndOfInputFails) {
-  feed("abcdefghij");
-  char password[5];
+// The prompt and a plain password are also driven through the command line (tests/sqo_cmdline).
+TEST_F(PipedInput, PasswordIsReadLineByLineCutToTheBufferUntilTheInputEnds) {
+  feed("s3cret pass\r\nabcdefghij");
+  char password[256] = "old", small[5];
   ::testing::internal::CaptureStdout();
   EXPECT_EQ(0, sqlo_get_password("joe", password, sizeof password));
-  EXPECT_STREQ("abcd", password);
+  EXPECT_EQ(0, sqlo_get_password("joe", small, sizeof small));
+  EXPECT_EQ("Enter password for joe:Enter password for joe:", ::testing::internal::GetCapturedStdout());
+  EXPECT_STREQ("s3cret pass", password);
+  EXPECT_STREQ("abcd", small);
+  ::testing::internal::CaptureStdout();
   EXPECT_NE(0, sqlo_get_password("joe", password, sizeof password)) << "nothing left to read";
-  EXPECT_STREQ("", password);
   ::testing::internal::GetCapturedStdout();
+  EXPECT_STREQ("", password);
 }
 
 TEST(TextFaults, InjectedFailureOfTheComparison) {
