@@ -98,13 +98,6 @@ uint16_t readU16(const std::vector<uint8_t> &image, size_t offset) {
   return uint16_t(image[offset] | (image[offset + 1] << 8));
 }
 
-uint32_t readU32(const std::vector<uint8_t> &image, size_t offset) {
-  if (offset + 4 > image.size())
-    return 0;
-  return uint32_t(image[offset]) | (uint32_t(image[offset + 1]) << 8) | (uint32_t(image[offset + 2]) << 16) |
-         (uint32_t(image[offset + 3]) << 24);
-}
-
 void writeU16(std::vector<uint8_t> &image, size_t offset, uint16_t value) {
   if (offset + 2 > image.size())
     return;
@@ -117,11 +110,6 @@ void writeU32(std::vector<uint8_t> &image, size_t offset, uint32_t value) {
     return;
   for (int i = 0; i < 4; ++i)
     image[offset + i] = uint8_t(value >> (8 * i));
-}
-
-bool dbmCfgChecksumValid(const std::vector<uint8_t> &image) {
-  return image.size() > 4 &&
-         readU32(image, kDbmCfgOffsetChecksum) == dbmCfgChecksum(image.data(), image.size());
 }
 
 void dbmCfgSealChecksum(std::vector<uint8_t> &image) {

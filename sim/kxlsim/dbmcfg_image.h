@@ -40,12 +40,10 @@ inline constexpr DbmRelease kDbmReleaseV101{0x0D00, 10100};
 DbmRelease dbmReleaseForVersion(int version, int release);
 
 uint16_t readU16(const std::vector<uint8_t> &image, size_t offset);
-uint32_t readU32(const std::vector<uint8_t> &image, size_t offset);
 void writeU16(std::vector<uint8_t> &image, size_t offset, uint16_t value);
 void writeU32(std::vector<uint8_t> &image, size_t offset, uint32_t value);
 
-// Whether the stored checksum is right; sealing stores the right one.
-bool dbmCfgChecksumValid(const std::vector<uint8_t> &image);
+// Stores the image's checksum.
 void dbmCfgSealChecksum(std::vector<uint8_t> &image);
 
 // A complete, sealed image for a node type 1..5 with in-range defaults
