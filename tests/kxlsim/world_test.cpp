@@ -1,11 +1,14 @@
 // Building worlds: the demo world as the command will see it, what `show`
-// reports of it, and what `create` refuses.
+// reports of it, what `create` refuses, and the tools program's names. The
+// tools program's runs inside a world are checked by the scenarios and the
+// end-to-end upgrade, which start it as the command does.
 #include "sim/kxlsim/dbmcfg_image.h"
 #include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/show.h"
 #include "sim/kxlsim/world_reader.h"
 #include "sim/kxlsim/world_writer.h"
 #include "sim/posix/world.h"
+#include "sim/tools/tool_names.h"
 #include "tests/support/scenario_world.h"
 #include "tests/support/temp_world.h"
 
@@ -90,6 +93,19 @@ TEST(CreateWorld, AnEmptyWorldHasAMachineAndCreateRefusesExistingWorldsAndUnknow
   EXPECT_FALSE(createWorld(fresh, "no-such-scenario", kxltestsupport::buildSources(), errors));
   EXPECT_FALSE(std::filesystem::exists(fresh));
   std::filesystem::remove_all(std::filesystem::path(fresh).parent_path());
+}
+
+TEST(ToolNames, BaseNameWithoutExtensionInLowerCase) {
+  EXPECT_EQ(toolProgramName("C:\\KXL\\BIN\\KXLSET.EXE"), "kxlset");
+  EXPECT_EQ(toolProgramName("/w/drive_c/bin/kxlckupgrade.exe"), "kxlckupgrade");
+  EXPECT_EQ(toolProgramName("kxlimaudcfg"), "kxlimaudcfg");
+  EXPECT_EQ(toolProgramName("kxlsyscs.exe.bak"), "kxlsyscs.exe.bak");
+  EXPECT_TRUE(isToolProgram("kxlimsslcfg"));
+  EXPECT_FALSE(isToolProgram("kxltools"));
+  EXPECT_FALSE(isToolProgram(""));
+  char a0[] = "kxlset", a1[] = "-cleanup", a2[] = "\"C:\\A B\"";
+  char *argv[] = {a0, a1, a2};
+  EXPECT_EQ(joinArguments(3, argv), "-cleanup \"C:\\A B\"");
 }
 
 } // namespace

@@ -134,11 +134,4 @@ TEST_F(PipedInput, PasswordIsReadLineByLineCutToTheBufferUntilTheInputEnds) {
   EXPECT_STREQ("", password);
 }
 
-TEST(TextFaults, InjectedFailureOfTheComparison) {
-  kxltest::WorldAccess::failCalls("sqlomcpi:1");
-  EXPECT_NE(0, sqlomcpi("q", "q", 1));
-  EXPECT_EQ(0, sqlomcpi("q", "q", 1));
-  kxltest::WorldAccess::failCalls(nullptr);
-}
-
 } // namespace
