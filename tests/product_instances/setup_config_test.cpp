@@ -16,55 +16,48 @@ const unsigned char *tableBytes() {
   return reinterpret_cast<const unsigned char *>(sqlz_krcbp->partitionTable);
 }
 
-std::string hostOfPartition(uint32_t partition) {
-  if (partition >= sqloLe32(tableBytes(), 12))
-    return "<no slot>";
-  uint32_t offset = sqloLe32(tableBytes(), SQLO_NODELIST_HDR_INDEX + 4 * size_t(partition));
-  if (offset == 0)
-    return "<none>";
-  return reinterpret_cast<const char *>(tableBytes() + offset + 22);
+// The table as text: "partitions N, this P, shared yes|no:" and the host of each slot.
+std::string partitionTable() {
+  const unsigned char *table = tableBytes();
+  if (table == nullptr)
+    return "<no table>";
+  std::string text = "partitions " + std::to_string(sqloLe32(table, 16)) + ", this " +
+                     std::to_string(sqlz_krcbp->currentPartition) + ", shared " +
+                     (sqlz_krcbp->partitionFlag != 0 ? "yes:" : "no:");
+  for (uint32_t slot = 0; slot < sqloLe32(table, 12); ++slot) {
+    uint32_t offset = sqloLe32(table, SQLO_NODELIST_HDR_INDEX + 4 * size_t(slot));
+    text += offset == 0 ? " <none>" : " " + std::string(reinterpret_cast<const char *>(table + offset + 22));
+  }
+  return text;
 }
 
-TEST_F(AppEnvironment, PartitionedInstanceGetsItsNodesFileAsTable) {
-  setInstance("INST2");
-  sqlca ca{};
-  ASSERT_EQ(0, sqleInitApplicationEnvironment(0, 0, 1, &ca));
-  EXPECT_EQ(ca.sqlcode, 0);
-  ASSERT_NE(tableBytes(), nullptr);
-  EXPECT_EQ(sqloLe32(tableBytes(), 16), 3u);
-  uint32_t first = sqloLe32(tableBytes(), 20);
-  EXPECT_EQ(first, sqloLe32(tableBytes(), 24)) << "partition 0 is the first entry";
-  EXPECT_EQ(hostOfPartition(0), "winsrv1.zav.test");
-  EXPECT_EQ(hostOfPartition(1), "winsrv2.zav.test");
-  EXPECT_EQ(hostOfPartition(2), "winsrv2.zav.test");
-  // Entries follow each other by their length.
-  const unsigned char *entry = tableBytes() + first;
-  entry += sqloLe16(entry, 0);
-  EXPECT_EQ(sqloLe16(entry, 2), 1u);
-  EXPECT_EQ(sqlz_krcbp->currentPartition, 0) << "the partition of this machine";
-  EXPECT_NE(sqlz_krcbp->partitionFlag, 0u) << "two partitions share winsrv2";
-}
-
-TEST_F(AppEnvironment, SingleInstanceHasPartitionZeroOnThisHost) {
-  setInstance("INST1");
-  ASSERT_EQ(0, sqleInitApplicationEnvironment(0, 0, 0, nullptr));
-  EXPECT_EQ(sqloLe32(tableBytes(), 16), 1u);
-  EXPECT_EQ(hostOfPartition(0), "winsrv1.zav.test");
-  EXPECT_EQ(hostOfPartition(1), "<no slot>") << "one slot only";
-  EXPECT_EQ(sqlz_krcbp->currentPartition, 0);
-  EXPECT_EQ(sqlz_krcbp->partitionFlag, 0u);
-}
-
-TEST_F(AppEnvironment, FailuresLeaveNoTableAndReportInTheStatusBlock) {
-  sqlca ca{};
-  setInstance(nullptr);
-  EXPECT_NE(0, sqleInitApplicationEnvironment(0, 0, 0, &ca));
-  EXPECT_EQ(ca.sqlcode, -1042);
-  setInstance("INST1");
-  EXPECT_EQ(SQLO_RC_FILE_NOT_FOUND_W, sqleInitApplicationEnvironment(0, 0, 1, &ca))
-      << "INST1 has no nodes file";
-  EXPECT_EQ(sqlz_krcbp->partitionTable, nullptr);
+TEST_F(AppEnvironment, TheInstanceNodesFileBecomesThePartitionTable) {
+  const struct {
+    const char *instance;
+    uint32_t partitioned;
+    int32_t rc, sqlcode;
+    const char *table;
+  } rows[] = {
+      {nullptr, 0, SQLO_RC_INVALID_ARGUMENT, -1042, "<no table>"},
+      {"INST1", 1, SQLO_RC_FILE_NOT_FOUND_W, -1042, "<no table>"}, // INST1 has no nodes file
+      {"INST1", 0, 0, 0, "partitions 1, this 0, shared no: winsrv1.zav.test"},
+      {"INST2", 1, 0, 0,
+       "partitions 3, this 0, shared yes: winsrv1.zav.test winsrv2.zav.test winsrv2.zav.test"},
+  };
+  for (const auto &row : rows) {
+    SCOPED_TRACE(row.table);
+    setInstance(row.instance);
+    sqlca ca{};
+    EXPECT_EQ(row.rc, sqleInitApplicationEnvironment(0, 0, row.partitioned, &ca));
+    EXPECT_EQ(ca.sqlcode, row.sqlcode);
+    EXPECT_EQ(partitionTable(), row.table);
+  }
+  // Partition 0 is the first entry, and entries follow each other by their length.
+  const unsigned char *entry = tableBytes() + sqloLe32(tableBytes(), 20);
+  EXPECT_EQ(entry, tableBytes() + sqloLe32(tableBytes(), 24));
+  EXPECT_EQ(sqloLe16(entry + sqloLe16(entry, 0), 2), 1u);
   failCalls("sqleInitApplicationEnvironment:1");
+  sqlca ca{};
   EXPECT_NE(0, sqleInitApplicationEnvironment(0, 0, 0, &ca));
   EXPECT_EQ(sqlz_krcbp->partitionTable, nullptr);
 }
