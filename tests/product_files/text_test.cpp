@@ -72,16 +72,32 @@ TEST(Languages, LocaleTextsBecomeDirectoryNames) {
     EXPECT_EQ(directory, kxlprod::normalizeLanguage(locale)) << locale;
 }
 
-class EnvironmentLanguage : public kxltest::ProductWorld {
+// The language variables unset after the case, and standard input replaced
+// by a pipe holding `input` for it.
+class ProcessInput : public kxltest::ProductWorld {
 protected:
+  void feed(const std::string &input) {
+    int fds[2];
+    ASSERT_EQ(0, pipe(fds));
+    saved_ = dup(0);
+    ASSERT_EQ(ssize_t(input.size()), write(fds[1], input.data(), input.size()));
+    close(fds[1]);
+    dup2(fds[0], 0);
+    close(fds[0]);
+  }
   void TearDown() override {
     kxltest::setProcessVariable("LC_ALL", nullptr);
     kxltest::setProcessVariable("LANG", nullptr);
+    if (saved_ >= 0) {
+      dup2(saved_, 0);
+      close(saved_);
+    }
     ProductWorld::TearDown();
   }
+  int saved_ = -1;
 };
 
-TEST_F(EnvironmentLanguage, IdentityThenEnvironmentThenEnglish) {
+TEST_F(ProcessInput, IdentityThenEnvironmentThenEnglish) {
   kxltest::setProcessVariable("LC_ALL", nullptr);
   kxltest::setProcessVariable("LANG", nullptr);
   EXPECT_STREQ("en_US", sqloGetNormalizedEnvLang(1));
@@ -96,30 +112,8 @@ TEST_F(EnvironmentLanguage, IdentityThenEnvironmentThenEnglish) {
   EXPECT_STREQ("fr_FR", sqloGetNormalizedEnvLang(1)) << "unusable values are passed over";
 }
 
-// Standard input replaced by a pipe holding `input` for one case.
-class PipedInput : public kxltest::ProductWorld {
-protected:
-  void feed(const std::string &input) {
-    int fds[2];
-    ASSERT_EQ(0, pipe(fds));
-    saved_ = dup(0);
-    ASSERT_EQ(ssize_t(input.size()), write(fds[1], input.data(), input.size()));
-    close(fds[1]);
-    dup2(fds[0], 0);
-    close(fds[0]);
-  }
-  void TearDown() override {
-    if (saved_ >= 0) {
-      dup2(saved_, 0);
-      close(saved_);
-    }
-    ProductWorld::TearDown();
-  }
-  int saved_ = -1;
-};
-
 // The prompt and a plain password are also driven through the command line (tests/sqo_cmdline).
-TEST_F(PipedInput, PasswordIsReadLineByLineCutToTheBufferUntilTheInputEnds) {
+TEST_F(ProcessInput, PasswordIsReadLineByLineCutToTheBufferUntilTheInputEnds) {
   feed("s3cret pass\r\nabcdefghij");
   char password[256] = "old", small[5];
   ::testing::internal::CaptureStdout();
