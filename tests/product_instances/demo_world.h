@@ -50,7 +50,6 @@ protected:
   inline static const std::string kCopy = "C:\\Program Files\\ZAV\\KXL101";
   inline static const std::string kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
   inline static const std::string kServices = "SOFTWARE\\ZAV\\KXLSIM\\Services\\";
-  inline static const std::string kInstances = "SOFTWARE\\ZAV\\KXLSIM\\Instances\\";
   inline static const std::string kRemote = "SOFTWARE\\ZAV\\KXLSIM\\Machines\\WINSRV2\\";
 
 private:

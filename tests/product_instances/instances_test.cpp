@@ -1,4 +1,5 @@
 // Creating instances under the current copy and removing what a creation made.
+// The registrations of a creation are in the end-to-end upgrade's exact changes.
 // Re-creating an instance and its partition 0 and undoing both are driven by
 // the upgrade's failure table (tests/driver) and the re-creation cases
 // (tests/services_env), which add and remove partition 0 on this machine only.
@@ -28,13 +29,8 @@ TEST_F(Instances, CreationTakesTheTemplateOfEachNodeTypeAndRegistersTheInstance)
     std::string name = "NEW" + std::to_string(type);
     SCOPED_TRACE(name);
     ASSERT_EQ(0, create(name.c_str(), type, type == 3 ? ".\\kxluser" : nullptr));
-    std::vector<uint8_t> image = readFile("C:\\inst\\" + name + "\\kxlsystm");
-    ASSERT_EQ(image.size(), 16384u);
-    EXPECT_EQ(image, readFile(kCopy + "\\CFG\\" + templates[type - 1]));
-    EXPECT_EQ(sqloLe16(image.data(), 40), type);
-    EXPECT_EQ(regString(kInstances + name, "Directory"), "C:\\inst\\" + name);
-    EXPECT_EQ(regString(kInstances + name, "Copy"), "KXL101");
-    EXPECT_TRUE(keyExists("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL101\\PROFILES\\" + name));
+    EXPECT_EQ(readFile("C:\\inst\\" + name + "\\kxlsystm"),
+              readFile(kCopy + "\\CFG\\" + templates[type - 1]));
     bool hasService = type != 2 && type != 4;
     EXPECT_EQ(keyExists(kServices + name), hasService);
     if (!hasService)

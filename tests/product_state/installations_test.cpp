@@ -80,19 +80,18 @@ TEST_F(InstallationsTest, CurrentInstallationIsTheCopyHoldingTheProgram) {
 TEST_F(InstallationsTest, SwitchingChangesTheCurrentInstallationUntilSwitchedBack) {
   registerOwnCopy("V101");
   registerCopy("V95", "C:\\KXL\\V95");
-  char name[SQLO_COPY_NAME_SZ];
-  ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
-  EXPECT_STREQ(name, "V101");
+  auto current = [] {
+    char name[SQLO_COPY_NAME_SZ] = {};
+    EXPECT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
+    return std::string(name);
+  };
+  EXPECT_EQ(current(), "V101");
   ASSERT_EQ(0, sqloSwitchToInstallationName("v95"));
-  ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
-  EXPECT_STREQ(name, "V95");
+  EXPECT_EQ(current(), "V95");
   EXPECT_EQ(SQLO_RC_NO_INSTALLATION, sqloSwitchToInstallationName("V77"));
-  ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
-  EXPECT_STREQ(name, "V95") << "a refused switch keeps the current installation";
+  EXPECT_EQ(current(), "V95") << "a refused switch keeps the current installation";
   ASSERT_EQ(0, sqloSwitchToInstallationName("V101"));
-  ASSERT_EQ(0, sqloGetCurrentInstallationName(name, sizeof name));
-  EXPECT_STREQ(name, "V101");
-
+  EXPECT_EQ(current(), "V101");
   char small[3];
   EXPECT_NE(0, sqloGetCurrentInstallationName(small, sizeof small));
   EXPECT_EQ(small[0], '\0');

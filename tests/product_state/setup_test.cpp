@@ -1,4 +1,4 @@
-// Status blocks, the process control block, and who runs the program:
+// Status blocks and who runs the program:
 // administrator bits, authorization ID, content extender.
 #include "tests/support/product_world.h"
 
@@ -46,18 +46,6 @@ TEST_F(SetupTest, ResultCodesBecomeSqlcodesWithTheProducerTag) {
   ASSERT_EQ(0, sqlzRcToSqlca(0, &ca, "KXLIUPGRADE", SQLO_RC_IO_ERROR, 0, 0));
   EXPECT_EQ(ca.sqlcode, -1042);
   EXPECT_EQ(std::string(ca.sqlerrmc, ca.sqlerrml), "0x870F0004");
-}
-
-TEST_F(SetupTest, ControlBlockAndCharacterSetAreUsableAtOnce) {
-  ASSERT_NE(sqlz_krcbp, nullptr);
-  auto *bytes = reinterpret_cast<unsigned char *>(sqlz_krcbp);
-  sqlz_krcbp->utilityMode = 1;
-  EXPECT_EQ(bytes[SQLZ_KRCB_UTILITY_MODE] | bytes[SQLZ_KRCB_UTILITY_MODE + 1] << 8, 1);
-  ASSERT_GT(std::strlen(sqlz_charset), 13u);
-  std::string names(sqlz_charset + 13);
-  EXPECT_NE(names.find('A'), std::string::npos);
-  EXPECT_NE(names.find('_'), std::string::npos);
-  EXPECT_EQ(names.find('.'), std::string::npos);
 }
 
 TEST_F(SetupTest, InjectedFaultsFailTheNamedCallOnly) {
