@@ -1,7 +1,8 @@
-// Building worlds: the demo world as the command will see it, what `show`
-// reports of it, what `create` refuses, and the tools program's names. The
-// tools program's runs inside a world are checked by the scenarios and the
-// end-to-end upgrade, which start it as the command does.
+// Configuration images in both layouts, and building worlds: the demo world
+// as the command will see it, what `show` reports of it, what `create`
+// refuses, and the tools program's names. The tools program's runs inside a
+// world are checked by the scenarios and the end-to-end upgrade, which start
+// it as the command does.
 #include "sim/kxlsim/dbmcfg_image.h"
 #include "sim/kxlsim/scenarios.h"
 #include "sim/kxlsim/show.h"
@@ -14,6 +15,7 @@
 
 #include <gtest/gtest.h>
 
+#include <cstring>
 #include <filesystem>
 #include <sstream>
 
@@ -51,13 +53,11 @@ TEST_F(DemoWorld, ShowListsCopiesInstancesServicesAndMachines) {
   std::string text = showText();
   const std::pair<const char *, const char *> rows[] = {
       {"KXLV8 ", "C:\\Program Files\\ZAV\\KXL8"},
-      {"KXL101 ", "10.1"},
       {"INST2 ", "C:\\Program Files\\ZAV\\KXL95\\INST2"},
       {"INST2 ", "node type 4"},
       {"V8INST ", "copy KXLV8"},
       {"INST2-0 ", "start 2 state 1"},
       {"WINSRV2\\INST2-1 ", "KXL95\\bin\\kxlsyscs.exe"},
-      {"WINSRV1 ", "(local)"},
       {"WINSRV2 ", "winsrv2.zav.test"},
   };
   for (const auto &[prefix, part] : rows)
@@ -106,6 +106,43 @@ TEST(ToolNames, BaseNameWithoutExtensionInLowerCase) {
   char a0[] = "kxlset", a1[] = "-cleanup", a2[] = "\"C:\\A B\"";
   char *argv[] = {a0, a1, a2};
   EXPECT_EQ(joinArguments(3, argv), "-cleanup \"C:\\A B\"");
+}
+
+// The stored checksum equals the sum of every byte after it.
+void expectSealed(const std::vector<uint8_t> &image) {
+  uint32_t sum = 0;
+  for (size_t i = 4; i < image.size(); ++i)
+    sum += image[i];
+  EXPECT_EQ(uint32_t(image[0] | image[1] << 8 | image[2] << 16 | uint32_t(image[3]) << 24), sum);
+}
+
+TEST(DbmCfgImage, EveryNodeTypeAndReleaseHasItsWordsAndItsChecksum) {
+  for (DbmRelease release : {kDbmReleaseV8, kDbmReleaseV91, kDbmReleaseV95, kDbmReleaseV101}) {
+    for (int nodeType = 1; nodeType <= 5; ++nodeType) {
+      for (bool small : {false, true}) {
+        std::vector<uint8_t> image = makeDbmCfgImage(nodeType, release, small);
+        SCOPED_TRACE("node type " + std::to_string(nodeType) + (small ? " small" : ""));
+        ASSERT_EQ(image.size(), small ? kDbmCfgSmallSize : kDbmCfgSize);
+        EXPECT_EQ(readU16(image, 40), nodeType);
+        EXPECT_EQ(readU16(image, 16) & 0x0F00, release.releaseWord);
+        EXPECT_EQ(readU16(image, 20), release.level);
+        expectSealed(image);
+      }
+    }
+  }
+  std::vector<uint8_t> image = makeDbmCfgImage(4, kDbmReleaseV101);
+  image[15000] ^= 0x5A;
+  dbmCfgSealChecksum(image);
+  expectSealed(image);
+}
+
+TEST(DbmCfgImage, SmallLayoutKeepsItsFlagAreaAtTheEnd) {
+  std::vector<uint8_t> small = makeDbmCfgImage(1, kDbmReleaseV8, true);
+  std::vector<uint8_t> large = makeDbmCfgImage(1, kDbmReleaseV8, false);
+  // Parameter values of the small layout are those of the large one up to 3584.
+  EXPECT_EQ(0, std::memcmp(small.data() + 4, large.data() + 4, 3584 - 4));
+  for (size_t i = 3584; i < 4096; ++i)
+    ASSERT_EQ(small[i], 0) << i;
 }
 
 } // namespace
