@@ -80,22 +80,18 @@ const Row kType4Rows[] = {
     {3120, F32, 50, 0.05, 100001, 1.25, 0}, {3464, I32, -1, -2, 32768, 0, 0},
 };
 
-Cfg withValue(uint16_t type, const Row &row, double value) {
+// The row's field set to `value` in an otherwise empty image of `type`, read
+// back after the range check.
+double checked(uint16_t type, const Row &row, double value) {
   Cfg cfg(type, 0x0D00);
-  switch (row.width) {
-  case U16:
-  case I16:
-    return cfg.u16(row.offset, uint16_t(int64_t(value)));
-  case U32:
-  case I32:
-    return cfg.u32(row.offset, uint32_t(int64_t(value)));
-  case F32:
-    return cfg.f32(row.offset, float(value));
-  }
-  return cfg;
-}
-
-double valueAt(const Bytes &image, const Row &row) {
+  if (row.width == F32)
+    cfg.f32(row.offset, float(value));
+  else if (row.width == U16 || row.width == I16)
+    cfg.u16(row.offset, uint16_t(int64_t(value)));
+  else
+    cfg.u32(row.offset, uint32_t(int64_t(value)));
+  Bytes image = cfg.sealed();
+  kxldbm::rangeCheck(image.data());
   switch (row.width) {
   case U16:
     return r16(image, row.offset);
@@ -111,12 +107,6 @@ double valueAt(const Bytes &image, const Row &row) {
   return 0;
 }
 
-double checked(uint16_t type, const Row &row, double value) {
-  Bytes image = withValue(type, row, value).sealed();
-  kxldbm::rangeCheck(image.data());
-  return valueAt(image, row);
-}
-
 void expectValue(double expected, double actual, const char *what, const Row &row, uint16_t type) {
   if (expected == 0 || std::fabs(expected) >= 1)
     EXPECT_EQ(expected, actual) << what << " at " << row.offset << ", node type " << type;
@@ -126,10 +116,9 @@ void expectValue(double expected, double actual, const char *what, const Row &ro
 
 void expectRow(const Row &row, uint16_t type, double fix) {
   expectValue(row.good, checked(type, row, row.good), "in range", row, type);
-  if (!std::isnan(row.below))
-    expectValue(fix, checked(type, row, row.below), "below", row, type);
-  if (!std::isnan(row.above))
-    expectValue(fix, checked(type, row, row.above), "above", row, type);
+  for (double outside : {row.below, row.above})
+    if (!std::isnan(outside))
+      expectValue(fix, checked(type, row, outside), "outside", row, type);
 }
 
 TEST(RangeCheckTest, EveryRowForServerNodeTypes) {
@@ -158,23 +147,21 @@ TEST(RangeCheckTest, EveryRowForTypeTwo) {
   EXPECT_EQ(0, checked(2, unset, 0)) << "44 is 3 only when it was set";
 }
 
+// 1940 is left when 1930 is 1 and 1948 takes the value at 88; a value at 808
+// that is not a number becomes the floor.
 TEST(RangeCheckTest, RowsThatDependOnOtherFields) {
-  Bytes image = Cfg(4, 0x0D00).u16(1930, 1).u16(1940, 0).u32(88, 700).u32(1948, 0).u32(76, 9).sealed();
-  kxldbm::rangeCheck(image.data());
-  EXPECT_EQ(0, r16(image, 1940)) << "left when 1930 is 1";
-  EXPECT_EQ(700u, r32(image, 1948)) << "takes the value at 88";
-  EXPECT_EQ(0u, r32(image, 76));
-  image = Cfg(1, 0x0D00).u16(1930, 4).u16(1940, 0).u32(80, 9).sealed();
-  kxldbm::rangeCheck(image.data());
-  EXPECT_EQ(1, r16(image, 1940));
-  EXPECT_EQ(0u, r32(image, 80));
-  image = Cfg(2, 0x0D00).u16(1930, 1).u16(1940, 1).u32(76, 9).sealed();
-  kxldbm::rangeCheck(image.data());
-  EXPECT_EQ(0, r16(image, 1940));
-  EXPECT_EQ(0u, r32(image, 76));
-  image = Cfg(4, 0x0D00).u32(808, 0x7FC00000).sealed(); // not a number
-  kxldbm::rangeCheck(image.data());
-  EXPECT_EQ(0x3827C5ACu, r32(image, 808));
+  const std::pair<Cfg, const char *> rows[] = {
+      {Cfg(4, 0x0D00).u16(1930, 1).u16(1940, 0).u32(88, 700).u32(1948, 0).u32(76, 9),
+       "h1940=0 w1948=700 w76=0"},
+      {Cfg(1, 0x0D00).u16(1930, 4).u16(1940, 0).u32(80, 9), "h1940=1 w80=0"},
+      {Cfg(2, 0x0D00).u16(1930, 1).u16(1940, 1).u32(76, 9), "h1940=0 w76=0"},
+      {Cfg(4, 0x0D00).u32(808, 0x7FC00000), "w808=942130604"} // 0x3827C5AC,
+  };
+  for (const auto &[cfg, spec] : rows) {
+    Bytes image = cfg.sealed();
+    kxldbm::rangeCheck(image.data());
+    EXPECT_EQ(spec, fieldsAt(image, spec));
+  }
 }
 
 } // namespace
