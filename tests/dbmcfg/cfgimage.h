@@ -9,6 +9,7 @@
 #include <algorithm>
 #include <bit>
 #include <cstdint>
+#include <cstdio>
 #include <cstring>
 #include <sstream>
 #include <string>
@@ -48,16 +49,19 @@ inline std::string rtext(const Bytes &image, uint32_t at, size_t most = kFull) {
 }
 
 // The image's fields as `spec` names them, in the same form: "h36=5000
-// w3124=4096 t458=NAME" for a 16-bit word, a 32-bit word and a string ('_'
-// for a blank) at their offsets; so that one comparison shows every field
-// that differs from the expected spec.
+// w3124=4096 f808=0.5 t458=NAME" for a 16-bit word, a 32-bit word, a float
+// and a string ('_' for a blank) at their offsets; so that one comparison
+// shows every field that differs from the expected spec.
 inline std::string fieldsAt(const Bytes &image, const std::string &spec) {
   std::istringstream items(spec);
   std::string item, out;
   while (items >> item) {
     uint32_t at = uint32_t(std::stoul(item.substr(1)));
+    char number[32] = {};
+    std::snprintf(number, sizeof number, "%g", double(rf32(image, at)));
     std::string value = item[0] == 'h'   ? std::to_string(r16(image, at))
                         : item[0] == 'w' ? std::to_string(r32(image, at))
+                        : item[0] == 'f' ? std::string(number)
                                          : rtext(image, at);
     std::replace(value.begin(), value.end(), ' ', '_');
     out += (out.empty() ? "" : " ") + item.substr(0, item.find('=') + 1) + value;

@@ -1,20 +1,23 @@
-// A temporary machine for the installation registry cases, with helpers that
-// lay out copies, instances, configuration files and installer registrations.
+// A temporary machine for the installation registry and for the steps that
+// work on it (services, environment, profile move): helpers that lay out
+// copies, configuration files, services and installer registrations on this
+// machine or another machine of the world, and read the trace.
 #pragma once
 
-#include "tests/support/product_world.h"
 #include "install/ilist.h"
 #include "sim/common/installer.h"
 #include "sim/product/diag.h"
+#include "tests/dbmcfg/cfgimage.h"
+#include "tests/support/product_world.h"
 
-#include <cstdint>
 #include <cstdio>
-#include <fstream>
-#include <sstream>
 #include <string>
 #include <vector>
 
 namespace kxltest {
+
+using dbmtest::Bytes;
+using dbmtest::Cfg;
 
 class InstallWorld : public ProductWorld {
 protected:
@@ -36,26 +39,19 @@ protected:
     setProcessVariable("KXLTRACE", trace_.c_str());
     kxlprod::resetTrace();
   }
-  std::string traceText() const {
-    std::ifstream in(trace_, std::ios::binary);
-    std::stringstream text;
-    text << in.rdbuf();
-    return text.str();
+  bool traced(const std::string &line) const {
+    return kxltestsupport::readHostFile(trace_).find(line) != std::string::npos;
   }
 
-  static void createKey(HKEY root, const std::string &path) {
+  // Creates a key under `root`, with a string value when `name` is given.
+  static void setValue(HKEY root, const std::string &path, const char *name = nullptr,
+                       const std::string &value = "") {
     HKEY key = nullptr;
     ASSERT_EQ(ERROR_SUCCESS,
               RegCreateKeyExA(root, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr));
-    RegCloseKey(key);
-  }
-
-  static void setValue(HKEY root, const std::string &path, const char *name, const std::string &value) {
-    HKEY key = nullptr;
-    ASSERT_EQ(ERROR_SUCCESS,
-              RegCreateKeyExA(root, path.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key, nullptr));
-    RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
-                   static_cast<DWORD>(value.size() + 1));
+    if (name != nullptr)
+      RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE *>(value.c_str()),
+                     static_cast<DWORD>(value.size() + 1));
     RegCloseKey(key);
   }
 
@@ -71,17 +67,10 @@ protected:
     setString(key, "Service Level", serviceLevel);
   }
 
-  // A configuration image of `size` bytes with the node type word at 40 and,
-  // past the word, a recognisable byte at the end.
-  static std::vector<unsigned char> configImage(uint16_t nodeType, size_t size = 16384) {
-    std::vector<unsigned char> image(size, 0);
-    if (size >= 42) {
-      image[40] = static_cast<unsigned char>(nodeType & 0xFF);
-      image[41] = static_cast<unsigned char>(nodeType >> 8);
-    }
-    if (size > 42)
-      image[size - 1] = 0x5A;
-    return image;
+  // A configuration image of `size` bytes with its node type and, at its
+  // end, a recognisable byte.
+  static Bytes configImage(uint16_t nodeType, size_t size = dbmtest::kFull) {
+    return Cfg(nodeType, 0, 0, size).byte(uint32_t(size - 1), 0x5A).sealed();
   }
 
   // Windows Installer knows `code` as installed at `location`, from the keys
@@ -90,6 +79,14 @@ protected:
     setString(kxlsim::installerProductKey(code), "ProductName", "product");
     setString(kxlsim::installerPropertiesKey(code), "InstallLocation", location);
     setDword(kxlsim::installerPropertiesKey(code), "WindowsInstaller", 1);
+  }
+
+  // A path of `machine`'s HKEY_LOCAL_MACHINE ("" the local machine).
+  static std::string at(const std::string &machine, const std::string &path) {
+    return machine.empty() ? path : "SOFTWARE\\ZAV\\KXLSIM\\Machines\\" + machine + "\\" + path;
+  }
+  static std::string serviceKey(const std::string &name, const std::string &machine = "") {
+    return at(machine, "SOFTWARE\\ZAV\\KXLSIM\\Services\\" + name);
   }
 
   // Every element of a list, walked from its head.

@@ -25,11 +25,6 @@ protected:
     EXPECT_FALSE(keyExists(serviceKey("INST1-0")));
   }
 
-  static void addClientComponentAndJava() {
-    setString(copyKey(kCurrentCopy) + "\\COMPONENTS", "KXL Zelquor Client", "1");
-    makeDirectories(std::string(kCurrentPath) + "\\java\\jdk");
-  }
-
   static std::string environmentValue(const char *name) {
     char value[300] = {};
     DWORD length = GetEnvironmentVariableA(name, value, sizeof value);
@@ -39,58 +34,45 @@ protected:
   sqlca ca{};
 };
 
-TEST_F(EnvironmentTest, ServerImageGetsMeasuresNameAndCopyFields) {
-  addTemplate(1);
-  addClientComponentAndJava();
-  ASSERT_EQ(0, create(1, nullptr, 1));
+struct ImageCase {
+  uint16_t nodeType;
+  bool clientAndJava;       // the copy has the client component and a Java kit
+  uint32_t workstationFlag; // 1: the workstation setting is asked for
+  const char *spec;         // the new file's fields; null: the file is the template
+};
 
+class ImageTest : public EnvironmentTest, public ::testing::WithParamInterface<ImageCase> {};
+
+// The template's content is kept (100); the Java kit goes to 3124 and 3128,
+// the processor measure to 808 and the machine name to 1968 for servers only,
+// the bandwidth to 3120 for partitioned instances only.
+TEST_P(ImageTest, TemplateTunedToTheMachine) {
+  const ImageCase &c = GetParam();
+  addTemplate(c.nodeType);
+  if (c.clientAndJava) {
+    setString(copyKey(kCurrentCopy) + "\\COMPONENTS", "KXL Zelquor Client", "1");
+    makeDirectories(std::string(kCurrentPath) + "\\java\\jdk");
+  }
+  ASSERT_EQ(0, create(c.nodeType, nullptr, c.workstationFlag));
   EXPECT_EQ(kInstanceDir, getString(instanceKey(kInstance), "Directory"));
   EXPECT_EQ(kCurrentCopy, getString(instanceKey(kInstance), "Copy"));
-  std::vector<unsigned char> image = newConfig();
-  ASSERT_EQ(16384u, image.size());
-  EXPECT_EQ(1u, sqloLe16(image.data(), 40));
-  EXPECT_EQ(0x22, image[100]); // the template's content is kept
-  EXPECT_EQ(2048u, u32At(image, 3124));
-  EXPECT_EQ("C:\\KXL10\\java\\jdk", textAt(image, 3128, 256));
-  EXPECT_FLOAT_EQ(0.5f, f32At(image, 808));
-  EXPECT_EQ(0u, u32At(image, 3120)); // bandwidth only for partitioned instances
-  EXPECT_EQ("SERVER7", textAt(image, 1968, 9));
-  EXPECT_EQ(1u, sqloLe16(image.data(), 46));
-  EXPECT_TRUE(checksumValid(image));
   EXPECT_EQ(kInstance, environmentValue("KXLINSTANCE"));
   EXPECT_EQ(kProfilePath, environmentValue("KXLINSTPROF"));
-}
-
-TEST_F(EnvironmentTest, ClientImageGetsOnlyTheCopyFields) {
-  addTemplate(2);
-  addClientComponentAndJava();
-  ASSERT_EQ(0, create(2, nullptr, 1));
-  std::vector<unsigned char> image = newConfig();
-  ASSERT_EQ(16384u, image.size());
-  EXPECT_EQ(2048u, u32At(image, 3124));
-  EXPECT_EQ("C:\\KXL10\\java\\jdk", textAt(image, 3128, 256));
-  EXPECT_EQ(0u, u32At(image, 808));
-  EXPECT_EQ("", textAt(image, 1968, 9));
-  EXPECT_EQ(0u, sqloLe16(image.data(), 46));
-  EXPECT_TRUE(checksumValid(image));
-}
-
-TEST_F(EnvironmentTest, ImageWithNothingToWriteStaysAsTheTemplate) {
-  addTemplate(2);
-  ASSERT_EQ(0, create(2));
-  EXPECT_EQ(validImage(2, 0x22), newConfig());
-}
-
-TEST_F(EnvironmentTest, PartitionedImageGetsTheBandwidth) {
-  addTemplate(4);
-  ASSERT_EQ(0, create(4));
-  std::vector<unsigned char> image = newConfig();
-  EXPECT_FLOAT_EQ(12.5f, f32At(image, 3120));
-  EXPECT_FLOAT_EQ(0.5f, f32At(image, 808));
-  EXPECT_TRUE(checksumValid(image));
+  if (c.spec == nullptr)
+    EXPECT_EQ(validImage(c.nodeType, 0x22), newConfig());
+  else
+    expectConfig(c.spec);
   // Without a partition record no partition is set up.
   EXPECT_FALSE(pathExists(std::string(kInstanceDir) + "\\kxlnodes.cfg"));
 }
+
+INSTANTIATE_TEST_SUITE_P(
+    Images, ImageTest,
+    ::testing::Values(
+        ImageCase{1, true, 1,
+                  "h40=1 h100=34 w3124=2048 t3128=C:\\KXL10\\java\\jdk f808=0.5 w3120=0 t1968=SERVER7 h46=1"},
+        ImageCase{2, true, 1, "h40=2 w3124=2048 t3128=C:\\KXL10\\java\\jdk w808=0 t1968= h46=0"},
+        ImageCase{2, false, 0, nullptr}, ImageCase{4, false, 0, "f3120=12.5 f808=0.5"}));
 
 TEST_F(EnvironmentTest, WorkstationNameSkippedWhenTheAssistantCannotTell) {
   addTemplate(1);
@@ -98,33 +80,9 @@ TEST_F(EnvironmentTest, WorkstationNameSkippedWhenTheAssistantCannotTell) {
     SCOPED_TRACE(fault);
     failCalls(fault);
     ASSERT_EQ(0, create(1));
-    std::vector<unsigned char> image = newConfig();
-    EXPECT_EQ("", textAt(image, 1968, 9));
-    EXPECT_FLOAT_EQ(0.5f, f32At(image, 808));
-    EXPECT_TRUE(checksumValid(image));
+    expectConfig("t1968= f808=0.5");
     failCalls("");
     ASSERT_EQ(0, sqlo_instance_drop(kInstance, kInstanceDir));
-  }
-}
-
-TEST_F(EnvironmentTest, CreationFailurePassesItsCodeUpAndLeavesNothing) {
-  addTemplate(1);
-  failCalls("sqlo_instance_create_extended:1");
-  EXPECT_EQ(SQLO_RC_SYSTEM_ERROR, create(1));
-  expectNothingLeft();
-  failCalls("");
-  // No template for the node type: the creation's own code.
-  EXPECT_EQ(SQLO_RC_FILE_NOT_FOUND, create(3));
-  expectNothingLeft();
-}
-
-TEST_F(EnvironmentTest, MeasureFailuresDropTheNewInstance) {
-  addTemplate(4);
-  for (const char *fault : {"sqlocpum:1", "sqloGetCommBandwidth:1"}) {
-    SCOPED_TRACE(fault);
-    failCalls(fault);
-    EXPECT_EQ(SQLO_RC_SYSTEM_ERROR, create(4));
-    expectNothingLeft();
   }
 }
 
@@ -156,15 +114,13 @@ TEST_F(EnvironmentTest, ConfigurationFileFailuresGive5005AndDropTheNewInstance) 
 TEST_F(EnvironmentTest, FailedReCreationPutsTheEarlierInstanceBack) {
   addTemplate(1);
   addOldInstance(1);
-  std::vector<unsigned char> before = newConfig();
+  Bytes before = newConfig();
   failCalls("sqlocpum:1");
   EXPECT_EQ(SQLO_RC_SYSTEM_ERROR, create(1));
   EXPECT_EQ(before, newConfig());
   EXPECT_EQ(kOldCopy, getString(instanceKey(kInstance), "Copy"));
-  EXPECT_EQ("C:\\KXL95\\bin\\kxlsyscs.exe", getString(serviceKey(kInstance), "ImagePath"));
+  EXPECT_EQ(kOldProgram, getString(serviceKey(kInstance), "ImagePath"));
 }
-
-// ---- the workstation name -----------------------------------------------------
 
 struct NameCase {
   const char *assistantName;
@@ -184,10 +140,8 @@ TEST_P(WorkstationNameTest, FormedFromMachineNameAndProfileCount) {
   if (c.globalInstance != nullptr)
     setString(copyKey(kCurrentCopy) + "\\GLOBAL_PROFILE", "KXLINSTANCE", c.globalInstance);
   ASSERT_EQ(0, create(1));
-  std::vector<unsigned char> image = newConfig();
-  EXPECT_EQ(c.expected, textAt(image, 1968, 9));
-  EXPECT_EQ(0, image[1968 + 8]);
-  EXPECT_TRUE(checksumValid(image));
+  expectConfig(std::string("t1968=") + c.expected);
+  EXPECT_EQ(0, newConfig()[1968 + 8]);
 }
 
 INSTANTIATE_TEST_SUITE_P(Names, WorkstationNameTest,
@@ -200,7 +154,55 @@ INSTANTIATE_TEST_SUITE_P(Names, WorkstationNameTest,
                                            NameCase{"ser-ver.x", 0, nullptr, "SER_VER"},
                                            NameCase{"longmachine", 11, nullptr, "LONGMA11"}));
 
-// ---- partition 0 -----------------------------------------------------------------
+// A failed creation, of the instance or of its partition 0, passes its code up
+// and leaves nothing of either; with the fault gone a plain rerun succeeds.
+struct FailureCase {
+  uint16_t nodeType;
+  bool partition;   // a partition record is handed in
+  const char *host; // the record's host name, null: none given
+  const char *fault;
+  int32_t result;
+  int32_t sqlcode; // 0: not looked at
+};
+
+class FailureTest : public EnvironmentTest, public ::testing::WithParamInterface<FailureCase> {};
+
+TEST_P(FailureTest, LeavesNothingAndARerunSucceeds) {
+  const FailureCase &c = GetParam();
+  addTemplate(1);
+  addTemplate(4);
+  PartitionRecord record{};
+  if (c.host != nullptr)
+    std::snprintf(record.hostName, sizeof record.hostName, "%s", c.host);
+  failCalls(c.fault);
+  EXPECT_EQ(c.result, create(c.nodeType, c.partition ? &record : nullptr));
+  EXPECT_TRUE(c.sqlcode == 0 || c.sqlcode == sqlcaCode(ca)) << sqlcaCode(ca);
+  expectNothingLeft();
+  failCalls(nullptr);
+  std::memset(&record, 0, sizeof record);
+  EXPECT_TRUE(c.nodeType == 3 ||
+              create(c.nodeType, c.partition ? &record : nullptr) == 0); // no template for 3
+}
+
+// kxlsystm takes the first two opens and the first write.
+INSTANTIATE_TEST_SUITE_P(
+    Failures, FailureTest,
+    ::testing::Values(FailureCase{1, false, nullptr, "sqlo_instance_create_extended:1", SQLO_RC_SYSTEM_ERROR,
+                                  0},
+                      FailureCase{3, false, nullptr, nullptr, SQLO_RC_FILE_NOT_FOUND, 0},
+                      FailureCase{4, false, nullptr, "sqlocpum:1", SQLO_RC_SYSTEM_ERROR, 0},
+                      FailureCase{4, false, nullptr, "sqloGetCommBandwidth:1", SQLO_RC_SYSTEM_ERROR, 0},
+                      FailureCase{4, true, "nohost", nullptr, UPGRADE_RC_HOST_UNKNOWN, 0},
+                      FailureCase{4, true, nullptr, "sqloPdbCommFncInit:1", UPGRADE_RC_SQLCA, -1042},
+                      FailureCase{4, true, nullptr, "sqloPdbTcpIpGetFullHostName:1", UPGRADE_RC_SQLCA, -1042},
+                      FailureCase{4, true, nullptr, "sqloGetComputerNameA:1", UPGRADE_RC_SQLCA, -1042},
+                      FailureCase{4, true, nullptr, "sqloUpdateServiceFile:1", UPGRADE_RC_SERVICES_FILE, 0},
+                      FailureCase{4, true, nullptr, "sqloPRegValuePE:1", UPGRADE_RC_NO_COPY, 0},
+                      FailureCase{4, true, nullptr, "sqloPRegValuePE:2", UPGRADE_RC_NO_COPY, 0},
+                      FailureCase{4, true, nullptr, "sqlo_instance_addnode:1", SQLO_RC_SYSTEM_ERROR, 0},
+                      FailureCase{4, true, nullptr, "sqloopenp:3", UPGRADE_RC_SQLCA, -1042},
+                      FailureCase{4, true, nullptr, "sqloopenp:4", UPGRADE_RC_SQLCA, -1042},
+                      FailureCase{4, true, nullptr, "sqlowrite:3", UPGRADE_RC_SQLCA, -1042}));
 
 class PartitionZeroTest : public EnvironmentTest {
 protected:
@@ -209,7 +211,6 @@ protected:
     if (IsSkipped())
       return;
     addTemplate(4);
-    std::memset(&record, 0, sizeof record);
   }
 
   std::string nodesFile() const { return readText(std::string(kInstanceDir) + "\\kxlnodes.cfg"); }
@@ -237,7 +238,7 @@ TEST_F(PartitionZeroTest, FilledFromThisMachine) {
 }
 
 TEST_F(PartitionZeroTest, GivenValuesAreKeptAndNoPortsReserved) {
-  setString(std::string(kSimRoot) + "Hosts\\host2", "FullName", "host2.zav.example");
+  setString("SOFTWARE\\ZAV\\KXLSIM\\Hosts\\host2", "FullName", "host2.zav.example");
   std::snprintf(record.hostName, sizeof record.hostName, "host2");
   std::snprintf(record.computerName, sizeof record.computerName, "MACH2");
   std::snprintf(record.portStart, sizeof record.portStart, "60000");
@@ -248,42 +249,6 @@ TEST_F(PartitionZeroTest, GivenValuesAreKeptAndNoPortsReserved) {
   EXPECT_EQ("0 host2 MACH2 0 net2\r\n", nodesFile());
   EXPECT_EQ("60000:60003", profileValue("KXLPORTRANGE"));
   EXPECT_EQ("MACH2", profileValue("KXLNODECOMPUTER"));
-}
-
-TEST_F(PartitionZeroTest, UnresolvableHostGives1922) {
-  std::snprintf(record.hostName, sizeof record.hostName, "nohost");
-  EXPECT_EQ(UPGRADE_RC_HOST_UNKNOWN, create(4, &record));
-  expectNothingLeft();
-}
-
-TEST_F(PartitionZeroTest, EveryFailureRemovesPartitionAndInstance) {
-  struct Case {
-    const char *fault;
-    int32_t result;
-    int32_t sqlcode; // 0: not looked at
-  } cases[] = {
-      {"sqloPdbCommFncInit:1", UPGRADE_RC_SQLCA, -1042},
-      {"sqloPdbTcpIpGetFullHostName:1", UPGRADE_RC_SQLCA, -1042},
-      {"sqloGetComputerNameA:1", UPGRADE_RC_SQLCA, -1042},
-      {"sqloUpdateServiceFile:1", UPGRADE_RC_SERVICES_FILE, 0},
-      {"sqloPRegValuePE:1", UPGRADE_RC_NO_COPY, 0},
-      {"sqloPRegValuePE:2", UPGRADE_RC_NO_COPY, 0},
-      {"sqlo_instance_addnode:1", SQLO_RC_SYSTEM_ERROR, 0},
-      // kxlsystm takes the first two opens and the first write.
-      {"sqloopenp:3", UPGRADE_RC_SQLCA, -1042},
-      {"sqloopenp:4", UPGRADE_RC_SQLCA, -1042},
-      {"sqlowrite:3", UPGRADE_RC_SQLCA, -1042},
-  };
-  for (const Case &c : cases) {
-    SCOPED_TRACE(c.fault);
-    std::memset(&record, 0, sizeof record);
-    failCalls(c.fault);
-    EXPECT_EQ(c.result, create(4, &record));
-    if (c.sqlcode != 0) {
-      EXPECT_EQ(c.sqlcode, sqlcaCode(ca));
-    }
-    expectNothingLeft();
-  }
 }
 
 } // namespace

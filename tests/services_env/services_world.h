@@ -8,25 +8,21 @@
 #include "platform/kxlsys.h"
 #include "upgrade/records.h"
 
-#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <memory>
 #include <string>
-#include <vector>
 
 namespace kxltest {
 
 class ServicesWorld : public InstallWorld {
 protected:
-  static constexpr const char *kCurrentCopy = "KXL10";
-  static constexpr const char *kCurrentPath = "C:\\KXL10";
-  static constexpr const char *kOldCopy = "KXL95";
-  static constexpr const char *kOldPath = "C:\\KXL95";
-  static constexpr const char *kProfilePath = "C:\\PROFILES";
-  static constexpr const char *kInstance = "INST1";
+  static constexpr const char *kCurrentCopy = "KXL10", *kCurrentPath = "C:\\KXL10";
+  static constexpr const char *kOldCopy = "KXL95", *kOldPath = "C:\\KXL95";
+  static constexpr const char *kProfilePath = "C:\\PROFILES", *kInstance = "INST1";
   static constexpr const char *kInstanceDir = "C:\\PROFILES\\INST1";
-  static constexpr const char *kSimRoot = "SOFTWARE\\ZAV\\KXLSIM\\";
+  static constexpr const char *kOldProgram = "C:\\KXL95\\bin\\kxlsyscs.exe";
+  static constexpr const char *kNewProgram = "C:\\KXL10\\bin\\kxlsyscs.exe";
 
   void SetUp() override {
     InstallWorld::SetUp();
@@ -34,45 +30,25 @@ protected:
       return;
     registerCopy(kOldCopy, kOldPath);
     registerCopy(kCurrentCopy, kCurrentPath);
-    setString(kIdentity, "ComputerName", "SERVER7");
-    setString(kIdentity, "FullHostName", "server7.zav.example");
-    setString(kIdentity, "AssistantName", "server7.zav.example");
-    setString(kIdentity, "CpuMeasure", "0.5");
-    setString(kIdentity, "CommBandwidth", "12.5");
+    for (const auto &[name, value] : {std::pair{"ComputerName", "SERVER7"},
+                                      {"FullHostName", "server7.zav.example"},
+                                      {"AssistantName", "server7.zav.example"},
+                                      {"CpuMeasure", "0.5"},
+                                      {"CommBandwidth", "12.5"}})
+      setString(kIdentity, name, value);
     makeDirectories(kProfilePath);
-    writeFile("C:\\windows\\system32\\drivers\\etc\\services", std::vector<unsigned char>{'#', '\n'});
+    writeFile("C:\\windows\\system32\\drivers\\etc\\services", std::string("#\n"));
     ASSERT_EQ(0, sqloSwitchToInstallationName(kCurrentCopy));
   }
 
-  static std::string copyKey(const char *copy) {
-    return std::string("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\") + copy;
-  }
-  static std::string serviceKey(const std::string &service) {
-    return kSimRoot + std::string("Services\\") + service;
-  }
+  static std::string copyKey(const char *copy) { return kCopies + std::string(copy); }
   static std::string instanceKey(const std::string &name) {
-    return kSimRoot + std::string("Instances\\") + name;
+    return "SOFTWARE\\ZAV\\KXLSIM\\Instances\\" + name;
   }
 
-  // A configuration image with its node type, a marker byte and a valid checksum.
-  static std::vector<unsigned char> validImage(uint16_t nodeType, unsigned char marker = 0x11) {
-    std::vector<unsigned char> image = configImage(nodeType);
-    image[100] = marker;
-    setChecksum(image);
-    return image;
-  }
-
-  static void setChecksum(std::vector<unsigned char> &image) {
-    uint32_t sum = 0;
-    for (size_t i = 4; i < image.size(); ++i)
-      sum += image[i];
-    std::memcpy(image.data(), &sum, sizeof sum);
-  }
-
-  static bool checksumValid(const std::vector<unsigned char> &image) {
-    std::vector<unsigned char> copy = image;
-    setChecksum(copy);
-    return copy == image;
+  // A sealed configuration image with its node type and a marker byte at 100.
+  static Bytes validImage(uint16_t nodeType, uint8_t marker) {
+    return Cfg(nodeType, 0, 0).byte(100, marker).sealed();
   }
 
   static void addTemplate(uint16_t nodeType) {
@@ -80,24 +56,19 @@ protected:
     writeFile(std::string(kCurrentPath) + "\\CFG\\" + names[nodeType - 1], validImage(nodeType, 0x22));
   }
 
-  static uint32_t u32At(const std::vector<unsigned char> &image, size_t offset) {
-    return sqloLe32(image.data(), offset);
-  }
-  static float f32At(const std::vector<unsigned char> &image, size_t offset) {
-    uint32_t bits = u32At(image, offset);
-    float value = 0;
-    std::memcpy(&value, &bits, sizeof value);
-    return value;
-  }
-  static std::string textAt(const std::vector<unsigned char> &image, size_t offset, size_t size) {
-    const char *text = reinterpret_cast<const char *>(image.data() + offset);
-    return std::string(text, strnlen(text, size));
-  }
-
-  static std::vector<unsigned char> newConfig() {
-    std::vector<unsigned char> bytes;
+  static Bytes newConfig() {
+    Bytes bytes;
     readWholeFile(std::string(kInstanceDir) + "\\kxlsystm", bytes);
     return bytes;
+  }
+
+  // The instance's configuration file: whole, sealed, and with the fields
+  // `spec` names (see dbmtest::fieldsAt).
+  static void expectConfig(const std::string &spec) {
+    Bytes image = newConfig();
+    ASSERT_EQ(dbmtest::kFull, image.size());
+    EXPECT_EQ(spec, dbmtest::fieldsAt(image, spec));
+    EXPECT_EQ(dbmtest::r32(image, 0), dbmtest::byteSum(image)) << "checksum";
   }
 
   // An instance profile key of the current copy (the creation adds its own).
@@ -118,7 +89,7 @@ protected:
 
   // A stopped service of the older copy's program under the account OLDACCT.
   static void addOldService(const std::string &key, DWORD start) {
-    setString(key, "ImagePath", std::string(kOldPath) + "\\bin\\kxlsyscs.exe");
+    setString(key, "ImagePath", kOldProgram);
     setString(key, "ObjectName", "OLDACCT");
     setDword(key, "Start", start);
     setDword(key, "State", 1);
