@@ -214,19 +214,27 @@ int32_t moveKey(HKEY root, const ProfileKeys &keys, bool force) {
 }
 
 int32_t revertKey(HKEY root, const ProfileKeys &keys, bool force) {
+  size_t createdAt = createdFrom(root, keys.old);
   HKEY oldKey = nullptr;
   DWORD disposition = 0;
   if (createKey(root, keys.old, &oldKey, &disposition) != ERROR_SUCCESS)
     return ErrorTrace{KXL_FN_REVERT_INSTANCE_PROFILE}(kProbeCreateKey, UPGRADE_RC_NO_COPY);
   int32_t rc = 0;
   bool created = disposition != REG_OPENED_EXISTING_KEY;
+  bool copied = true;
   if (!force && created) {
-    if (SHCopyKeyA(root, keys.current, oldKey, 0) != ERROR_SUCCESS)
-      rc = ErrorTrace{KXL_FN_REVERT_INSTANCE_PROFILE}(kProbeCopyKey, UPGRADE_RC_NO_COPY);
-    else
+    copied = SHCopyKeyA(root, keys.current, oldKey, 0) == ERROR_SUCCESS;
+    if (copied)
       SHDeleteKeyA(root, keys.current);
   }
   RegCloseKey(oldKey);
+  // An old key left empty (or half copied) would read as one already put
+  // back: a later undo would keep it and leave the profile under the current
+  // copy.
+  if (!copied) {
+    deleteCreatedKey(root, keys.old, createdAt);
+    rc = ErrorTrace{KXL_FN_REVERT_INSTANCE_PROFILE}(kProbeCopyKey, UPGRADE_RC_NO_COPY);
+  }
   // A forced machine keeps its old key through the upgrade: only the
   // placeholder goes, and an old key that was not there is not invented.
   if (force) {
