@@ -4,7 +4,8 @@
 #include "install/kxlinstance.h"
 #include "install_world.h"
 
-#include <cstring>
+#include <cstdio>
+#include <sstream>
 
 namespace {
 
@@ -13,77 +14,65 @@ using Names = std::vector<std::string>;
 
 class CopyList : public InstallWorld {};
 
-TEST_F(CopyList, PutsTheVersion8InstallationFirst) {
-  registerCopy("AKXL", "C:\\A");
-  registerCopy("KXL95", "C:\\Prog\\KXL95");
-  registerV8("C:\\SQLLIB");
-  InstallCopyList list(false, false);
-  ASSERT_EQ(0u, list.status);
-  EXPECT_EQ(Names({"KXLV8", "AKXL", "KXL95"}), names(list));
-  ASSERT_NE(nullptr, list.v8Copy);
-  EXPECT_EQ(list.v8Copy, elements(list).front());
-  char key[256] = {};
-  ASSERT_EQ(0u, list.v8Copy->GetRegistryKey(key, sizeof key));
-  EXPECT_STREQ("SOFTWARE\\ZAV\\KXL", key);
-  EXPECT_EQ(1, list.v8Copy->IsV8Copy());
-  InstallCopy *other = elements(list)[2];
-  ASSERT_EQ(0u, other->GetRegistryKey(key, sizeof key));
-  EXPECT_STREQ("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95", key);
-  EXPECT_EQ(0, other->IsV8Copy());
-}
-
-TEST_F(CopyList, TakesTheVersion8InstallationOnlyForVersion8) {
-  registerCopy("KXL95", "C:\\Prog\\KXL95");
-  setString("SOFTWARE\\ZAV\\KXL", "KXL Path Name", "C:\\SQLLIB");
-  for (const char *version : {"9", "", "x8"}) {
-    setString("SOFTWARE\\ZAV\\KXL\\CurrentVersion", "Version", version);
+// The list: the version-8 installation first (its copy key is the product
+// root), taken only for a version whose leading number is 8 and failing the
+// whole list when it cannot be read; copies without a path are passed over.
+TEST_F(CopyList, BuiltFromTheRegistrations) {
+  const struct {
+    const char *copies;  // "NAME" registered at C:\NAME; "NAME=" without a path
+    const char *version; // of the version-8 layout, null: none
+    const char *v8Path;  // null: none
+    const char *fault;
+    uint32_t status;
+    const char *names;
+  } rows[] = {
+      {"AKXL KXL95", "8", "C:\\SQLLIB", nullptr, 0, "KXLV8 AKXL KXL95"},
+      {"KXL95", "9", "C:\\SQLLIB", nullptr, 0, "KXL95"},
+      {"KXL95", "", "C:\\SQLLIB", nullptr, 0, "KXL95"},
+      {"KXL95", "x8", "C:\\SQLLIB", nullptr, 0, "KXL95"},
+      {"KXL95", "8.2", "C:\\SQLLIB", nullptr, 0, "KXLV8 KXL95"},
+      {"KXL95", "8", nullptr, nullptr, 1, ""},
+      {"GOOD1 HALF= GOOD2", nullptr, nullptr, nullptr, 0, "GOOD1 GOOD2"},
+      {"", nullptr, nullptr, nullptr, 0, ""},
+      {"", "8", "C:\\SQLLIB", nullptr, 0, "KXLV8"},
+      {"KXL95", nullptr, nullptr, "RegEnumKeyExA:1", 1, ""},
+  };
+  for (const auto &row : rows) {
+    SCOPED_TRACE(std::string(row.copies) + " / " + (row.version != nullptr ? row.version : "-"));
+    SHDeleteKeyA(HKEY_LOCAL_MACHINE, "SOFTWARE\\ZAV\\KXL");
+    std::istringstream copies(row.copies);
+    for (std::string copy; copies >> copy;)
+      if (copy.back() == '=')
+        setString(kCopies + copy.substr(0, copy.size() - 1), "Other", "x");
+      else
+        registerCopy(copy, "C:\\" + copy);
+    if (row.version != nullptr)
+      setString("SOFTWARE\\ZAV\\KXL\\CurrentVersion", "Version", row.version);
+    if (row.v8Path != nullptr)
+      setString("SOFTWARE\\ZAV\\KXL", "KXL Path Name", row.v8Path);
+    failCalls(row.fault);
     InstallCopyList list(false, false);
-    EXPECT_EQ(Names({"KXL95"}), names(list)) << version;
-    EXPECT_EQ(nullptr, list.v8Copy);
+    failCalls(nullptr);
+    EXPECT_EQ(row.status, list.status);
+    std::string listed;
+    for (InstallCopy *copy : elements(list)) {
+      char name[65] = {}, key[256] = {};
+      copy->GetName(name, sizeof name);
+      listed += (listed.empty() ? "" : " ") + std::string(name);
+      ASSERT_EQ(0u, copy->GetRegistryKey(key, sizeof key));
+      bool v8 = listed == KXLI_V8_COPY_NAME;
+      EXPECT_EQ(v8 ? "SOFTWARE\\ZAV\\KXL" : kCopies + std::string(name), key);
+      EXPECT_EQ(v8, copy == list.v8Copy);
+      EXPECT_EQ(v8 ? 1 : 0, copy->IsV8Copy());
+    }
+    EXPECT_EQ(row.names, listed);
+    EXPECT_EQ(listed.starts_with(KXLI_V8_COPY_NAME), list.v8Copy != nullptr);
   }
-  // Only the leading number counts.
-  setString("SOFTWARE\\ZAV\\KXL\\CurrentVersion", "Version", "8.2");
-  InstallCopyList list(false, false);
-  EXPECT_EQ(Names({"KXLV8", "KXL95"}), names(list));
-}
-
-TEST_F(CopyList, FailsWholeWhenTheVersion8InstallationCannotBeRead) {
-  registerCopy("KXL95", "C:\\Prog\\KXL95");
-  setString("SOFTWARE\\ZAV\\KXL\\CurrentVersion", "Version", "8");
-  InstallCopyList list(false, false);
-  EXPECT_EQ(1u, list.status);
-  EXPECT_EQ(0, list.GetCount());
-  EXPECT_EQ(nullptr, list.v8Copy);
-}
-
-TEST_F(CopyList, SkipsCopiesWithoutAPath) {
-  registerCopy("GOOD1", "C:\\G1");
-  createKey(HKEY_LOCAL_MACHINE, std::string(kCopies) + "HALF");
-  setString(std::string(kCopies) + "HALF", "Other", "x");
-  registerCopy("GOOD2", "C:\\G2");
-  InstallCopyList list(false, false);
-  EXPECT_EQ(0u, list.status);
-  EXPECT_EQ(Names({"GOOD1", "GOOD2"}), names(list));
-}
-
-TEST_F(CopyList, IsEmptyButValidWithoutAnyRegistration) {
+  SHDeleteKeyA(HKEY_LOCAL_MACHINE, "SOFTWARE\\ZAV\\KXL");
   InstallCopyList none(false, false);
-  EXPECT_EQ(0u, none.status);
-  EXPECT_EQ(0, none.GetCount());
   InstallCopy *found = nullptr;
   EXPECT_EQ(KXLI_RC_NAME_NOT_FOUND, none.Find("KXL95", &found));
   EXPECT_EQ(nullptr, found);
-  registerV8("C:\\SQLLIB");
-  InstallCopyList v8Only(false, false);
-  EXPECT_EQ(0u, v8Only.status);
-  EXPECT_EQ(Names({"KXLV8"}), names(v8Only));
-}
-
-TEST_F(CopyList, FailsWhenTheCopiesCannotBeEnumerated) {
-  registerCopy("KXL95", "C:\\Prog\\KXL95");
-  failCalls("RegEnumKeyExA:1");
-  InstallCopyList list(false, false);
-  EXPECT_EQ(1u, list.status);
 }
 
 TEST_F(CopyList, FindsCopiesIgnoringCaseAndKeepsTheCallersCursor) {
@@ -139,7 +128,6 @@ TEST_F(Copy, ReportsWhyItIsUnusable) {
   // The default view does not see it.
   InstallCopy defaultView("KXL32", false, false);
   EXPECT_EQ(KXLI_COPY_UNREADABLE, defaultView.GetStatus());
-  createKey(HKEY_LOCAL_MACHINE, view32Key + "\\Components");
   setString(view32Key + "\\COMPONENTS", "KXL Client", "");
   InstallCopy complete("KXL32", true, false);
   EXPECT_EQ(KXLI_COPY_OK, complete.GetStatus());
@@ -160,7 +148,7 @@ TEST_F(Copy, ListsItsComponentsFromTheMachineOrTheUser) {
   EXPECT_EQ(0, machine.IsPerUserCopy());
   EXPECT_EQ(Names({"KXL Client", "KXL Server"}), strings(machine.GetComponents()));
 
-  createKey(HKEY_LOCAL_MACHINE, key + "\\Users");
+  setValue(HKEY_LOCAL_MACHINE, key + "\\Users");
   setValue(HKEY_CURRENT_USER, key + "\\COMPONENTS", "KXL Own Client", "");
   InstallCopy perUser("KXL101", false, false);
   EXPECT_EQ(1, perUser.IsPerUserCopy());
@@ -185,62 +173,37 @@ TEST_F(Copy, StringGettersNeedRoomForTheTerminator) {
   EXPECT_EQ(std::string(64, 'N'), cut);
 }
 
-class Version : public InstallWorld {
-protected:
-  // GetVersion's code and the record, which is handed out in every case.
-  uint32_t read(InstallCopy &copy, CopyVersion &record) {
-    CopyVersion *out = nullptr;
-    uint32_t rc = copy.GetVersion(&out);
-    EXPECT_NE(nullptr, out);
-    if (out != nullptr) {
-      record = *out;
-      delete out;
-    }
-    return rc;
-  }
-  static std::vector<int32_t> numbers(const CopyVersion &record) {
-    return {record.version, record.release, record.modification, record.fixLevel};
-  }
-};
-
-TEST_F(Version, FillsTheRecordFromCurrentVersion) {
-  registerCopy("KXL95", "C:\\K95");
-  setVersion(std::string(kCopies) + "KXL95", "9", "5", "0", "3", "kxl9.5.0.3");
-  InstallCopy copy("KXL95", false, false);
-  CopyVersion record{};
-  ASSERT_EQ(0u, read(copy, record));
-  EXPECT_EQ(std::vector<int32_t>({9, 5, 0, 3}), numbers(record));
-  EXPECT_STREQ("kxl9.5.0.3", record.serviceLevel);
-}
-
-TEST_F(Version, OfTheVersion8InstallationHasNoFixLevel) {
+// The version record from CurrentVersion, handed out in every case: the
+// version-8 installation has no fix level; reading stops at the first missing
+// value with the registry's code; without the key the record is empty.
+TEST_F(Copy, ReadsItsVersionRecord) {
   registerV8("C:\\SQLLIB");
   setVersion("SOFTWARE\\ZAV\\KXL", "8", "2", "1", "7", "");
-  InstallCopy copy(KXLI_V8_COPY_NAME, false, false);
-  CopyVersion record{};
-  ASSERT_EQ(0u, read(copy, record));
-  EXPECT_EQ(std::vector<int32_t>({8, 2, 1, 0}), numbers(record));
-  EXPECT_STREQ("", record.serviceLevel);
-}
-
-TEST_F(Version, StopsAtTheFirstMissingValueWithTheRegistryCode) {
+  registerCopy("KXL95", "C:\\K95");
+  setVersion(std::string(kCopies) + "KXL95", "9", "5", "0", "3", "kxl9.5.0.3");
   registerCopy("KXL97", "C:\\K97");
   setVersion(std::string(kCopies) + "KXL97", "9", "7", "2", "", "kxl9.7");
-  InstallCopy copy("KXL97", false, false);
-  CopyVersion record{};
-  EXPECT_EQ(static_cast<uint32_t>(ERROR_FILE_NOT_FOUND), read(copy, record));
-  EXPECT_EQ(std::vector<int32_t>({9, 7, 2, 0}), numbers(record));
-  EXPECT_STREQ("", record.serviceLevel);
-}
-
-TEST_F(Version, WithoutAVersionKeyGivesAnEmptyRecord) {
-  registerCopy("KXL95", "C:\\K95");
-  InstallCopy copy("KXL95", false, false);
-  CopyVersion record{};
-  record.version = 99;
-  EXPECT_EQ(static_cast<uint32_t>(ERROR_FILE_NOT_FOUND), read(copy, record));
-  EXPECT_EQ(0, record.version);
-  EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, copy.GetVersion(nullptr));
+  registerCopy("KXL98", "C:\\K98");
+  const struct {
+    const char *copy;
+    uint32_t rc;
+    const char *record; // "version.release.modification.fix service"
+  } rows[] = {{"KXL95", 0, "9.5.0.3 kxl9.5.0.3"},
+              {KXLI_V8_COPY_NAME, 0, "8.2.1.0 "},
+              {"KXL97", ERROR_FILE_NOT_FOUND, "9.7.2.0 "},
+              {"KXL98", ERROR_FILE_NOT_FOUND, "0.0.0.0 "}};
+  for (const auto &row : rows) {
+    InstallCopy copy(row.copy, false, false);
+    CopyVersion *out = nullptr;
+    EXPECT_EQ(row.rc, copy.GetVersion(&out)) << row.copy;
+    ASSERT_NE(nullptr, out) << row.copy;
+    char record[128] = {};
+    std::snprintf(record, sizeof record, "%d.%d.%d.%d %s", out->version, out->release, out->modification,
+                  out->fixLevel, out->serviceLevel);
+    EXPECT_STREQ(row.record, record) << row.copy;
+    delete out;
+    EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, copy.GetVersion(nullptr));
+  }
 }
 
 TEST_F(Copy, KeepsItsInstanceListAndRetriesAFailedOne) {

@@ -1,9 +1,13 @@
 // The owning list: stepping, removal at head, tail and cursor, ownership.
+// Each row is a script of list operations and what they answer.
 #include "install/ilist.h"
 
 #include <gtest/gtest.h>
 
-#include <vector>
+#include <map>
+#include <memory>
+#include <sstream>
+#include <string>
 
 namespace {
 
@@ -15,113 +19,85 @@ public:
   int *destroyed;
 };
 
-class ItemList : public ::testing::Test {
-protected:
-  Item *add(int value) {
-    Item *item = new Item(value, &destroyed);
-    EXPECT_EQ(0u, list.Append(item));
-    return item;
+std::string code(uint32_t rc) {
+  return rc == 0                        ? "ok"
+         : rc == KXLI_RC_NAME_NOT_FOUND ? "notfound"
+         : rc == KXLI_RC_NULL_ARGUMENT  ? "null"
+                                        : "?";
+}
+
+std::string valueOf(const Item *item) {
+  return item != nullptr ? std::to_string(item->value) : "-";
+}
+
+// "+N" appends N, "-N" removes the element holding N (or a stranger), "+0x" and
+// "-0x" hand in null, "n" steps, "c" is the cursor, "w" rewinds, "r" walks the
+// rest, "k" counts, "d" counts the destroyed elements, "~" destroys the list.
+std::string run(const std::string &script) {
+  int destroyed = 0, strangers = 0;
+  auto list = std::make_unique<ILIST<Item>>();
+  std::map<int, Item *> items;
+  std::istringstream ops(script);
+  std::string op, out;
+  while (ops >> op) {
+    std::string said;
+    if (op == "+0x" || op == "-0x") {
+      said = code(op[0] == '+' ? list->Append(nullptr) : list->Remove(nullptr));
+    } else if (op[0] == '+') {
+      items[std::stoi(op.substr(1))] = new Item(std::stoi(op.substr(1)), &destroyed);
+      said = code(list->Append(items[std::stoi(op.substr(1))]));
+    } else if (op[0] == '-') {
+      Item stranger(std::stoi(op.substr(1)), &strangers);
+      auto found = items.find(stranger.value);
+      said = code(list->Remove(found != items.end() ? found->second : &stranger));
+    } else if (op == "n") {
+      said = valueOf(list->Next());
+    } else if (op == "c") {
+      said = valueOf(list->Current());
+    } else if (op == "w") {
+      list->Rewind();
+      continue;
+    } else if (op == "r") {
+      said = "<";
+      for (Item *item = list->Next(); item != nullptr; item = list->Next())
+        said += valueOf(item);
+      said += ">";
+    } else if (op == "k") {
+      said = "#" + std::to_string(list->GetCount());
+    } else if (op == "d") {
+      said = "d" + std::to_string(destroyed);
+    } else if (op == "~") {
+      list.reset();
+      continue;
+    }
+    out += (out.empty() ? "" : " ") + said;
   }
-  // Steps to the end from wherever the cursor is.
-  std::vector<int> rest() {
-    std::vector<int> values;
-    for (Item *item = list.Next(); item != nullptr; item = list.Next())
-      values.push_back(item->value);
-    return values;
-  }
-  std::vector<int> all() {
-    list.Rewind();
-    return rest();
-  }
-  int destroyed = 0;
-  ILIST<Item> list;
-};
-
-using Values = std::vector<int>;
-
-TEST_F(ItemList, AFreshListIsWalkedFromItsHeadInAppendOrder) {
-  EXPECT_EQ(nullptr, list.Next());
-  add(1);
-  add(2);
-  add(3);
-  EXPECT_EQ(3, list.GetCount());
-  EXPECT_EQ(nullptr, list.Current());
-  EXPECT_EQ(Values({1, 2, 3}), rest());
-  EXPECT_EQ(nullptr, list.Current());
-  // Past the end the cursor is null again, so the next walk restarts at the head.
-  EXPECT_EQ(Values({1, 2, 3}), rest());
+  return out;
 }
 
-TEST_F(ItemList, RemovingTheHeadUnderTheCursorGoesOnWithTheNewHead) {
-  Item *first = add(1);
-  add(2);
-  add(3);
-  ASSERT_EQ(1, list.Next()->value);
-  EXPECT_EQ(0u, list.Remove(first));
-  EXPECT_EQ(1, destroyed);
-  EXPECT_EQ(2, list.GetCount());
-  EXPECT_EQ(Values({2, 3}), rest());
-}
-
-TEST_F(ItemList, RemovingTheCurrentMiddleElementKeepsTheWalkGoing) {
-  add(1);
-  Item *second = add(2);
-  add(3);
-  list.Next();
-  ASSERT_EQ(second, list.Next());
-  EXPECT_EQ(0u, list.Remove(second));
-  EXPECT_EQ(1, list.Current()->value);
-  EXPECT_EQ(Values({3}), rest());
-  EXPECT_EQ(Values({1, 3}), all());
-}
-
-TEST_F(ItemList, RemovingTheTailMovesItAndLaterAppendsFollowTheNewTail) {
-  add(1);
-  Item *last = add(2);
-  EXPECT_EQ(0u, list.Remove(last));
-  add(4);
-  EXPECT_EQ(Values({1, 4}), all());
-  // Removing the tail while the cursor is on it ends the walk after its predecessor.
-  list.Rewind();
-  list.Next();
-  Item *tail = list.Next();
-  ASSERT_EQ(4, tail->value);
-  EXPECT_EQ(0u, list.Remove(tail));
-  EXPECT_EQ(Values({}), rest());
-}
-
-TEST_F(ItemList, RemovingTheOnlyElementLeavesAnEmptyListThatTakesNewElements) {
-  Item *only = add(7);
-  list.Next();
-  EXPECT_EQ(0u, list.Remove(only));
-  EXPECT_EQ(0, list.GetCount());
-  EXPECT_EQ(nullptr, list.Current());
-  EXPECT_EQ(nullptr, list.Next());
-  add(8);
-  EXPECT_EQ(Values({8}), all());
-}
-
-TEST_F(ItemList, RemovingSomethingNotInTheListChangesNothing) {
-  add(1);
-  int elsewhere = 0;
-  Item stranger(9, &elsewhere);
-  EXPECT_EQ(KXLI_RC_NAME_NOT_FOUND, list.Remove(&stranger));
-  EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, list.Remove(nullptr));
-  EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, list.Append(nullptr));
-  EXPECT_EQ(1, list.GetCount());
-  EXPECT_EQ(0, destroyed);
-}
-
-TEST(ItemListOwnership, DestroyingTheListDestroysEveryElementOnce) {
-  int destroyed = 0;
-  {
-    ILIST<Item> list;
-    for (int i = 0; i < 5; ++i)
-      list.Append(new Item(i, &destroyed));
-    list.Remove(list.Next());
-    EXPECT_EQ(1, destroyed);
-  }
-  EXPECT_EQ(5, destroyed);
+TEST(ItemList, ScriptsOfOperations) {
+  const struct {
+    const char *script, *answers;
+  } rows[] = {
+      // A fresh list is walked from its head in append order; past the end
+      // the cursor is null again, so the next walk restarts at the head.
+      {"n +1 +2 +3 k c r c r", "- ok ok ok #3 - <123> - <123>"},
+      // Removing the head under the cursor goes on with the new head.
+      {"+1 +2 +3 n -1 d k r", "ok ok ok 1 ok d1 #2 <23>"},
+      // Removing the current middle element keeps the walk going.
+      {"+1 +2 +3 n n -2 c r w r", "ok ok ok 1 2 ok 1 <3> <13>"},
+      // Appends after a removed tail follow the new tail; removing the tail
+      // under the cursor ends the walk after its predecessor.
+      {"+1 +2 -2 +4 w r w n n -4 r", "ok ok ok ok <14> 1 4 ok <>"},
+      // The only element removed leaves an empty list that takes new ones.
+      {"+7 n -7 k c n +8 w r", "ok 7 ok #0 - - ok <8>"},
+      // Something not in the list changes nothing.
+      {"+1 -9 -0x +0x k d", "ok notfound null null #1 d0"},
+      // Destroying the list destroys every element once.
+      {"+0 +1 +2 +3 +4 n -0 d ~ d", "ok ok ok ok ok 0 ok d1 d5"},
+  };
+  for (const auto &row : rows)
+    EXPECT_EQ(row.answers, run(row.script)) << row.script;
 }
 
 } // namespace

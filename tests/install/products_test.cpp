@@ -147,7 +147,7 @@ TEST_F(Products, OfACurrentCopyAreListedInTableOrder) {
   EXPECT_EQ(list, again);
   EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, copy.GetInstalledProdList(nullptr));
   // A copy installed for one user keeps its products' components there.
-  createKey(HKEY_LOCAL_MACHINE, std::string(kCopies) + "KXL101\\Users");
+  setValue(HKEY_LOCAL_MACHINE, std::string(kCopies) + "KXL101\\Users");
   setValue(HKEY_CURRENT_USER, productKey, "Own Engine", "");
   InstallCopy perUser("KXL101", false, false);
   ASSERT_EQ(0u, perUser.GetInstalledProdList(&list));
