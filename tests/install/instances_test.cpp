@@ -11,6 +11,9 @@ namespace {
 using kxltest::InstallWorld;
 using Names = std::vector<std::string>;
 
+// Instances of the version-8 installation and two copies: registered under
+// their copy (in any case; none: the version-8 installation), clustered when
+// their profile names a cluster, with or without a configuration file.
 class Instances : public InstallWorld {
 protected:
   void SetUp() override {
@@ -18,6 +21,18 @@ protected:
     registerV8("C:\\SQLLIB");
     registerCopy("KXL95", "C:\\Prog\\KXL95");
     registerCopy("KXL101", "C:\\Prog\\KXL101");
+    for (const auto &[name, directory, copy] : {std::tuple{"INST1", "C:\\Prog\\KXL95\\INST1", "kxl95"},
+                                                {"CLU1", "C:\\Prog\\KXL95\\CLU1", "KXL95"},
+                                                {"NEW1", "C:\\Prog\\KXL101\\NEW1", "KXL101"},
+                                                {"V8INST", "C:\\SQLLIB\\V8INST", ""},
+                                                {"PROF1", "D:\\profiles\\PROF1", "KXL95"},
+                                                {"V8CLU", "C:\\SQLLIB\\V8CLU", ""}})
+      registerInstance(name, directory, copy);
+    setString(std::string(kCopies) + "KXL95\\PROFILES\\CLU1", "KXLCLUSTER", "KXLCLUS");
+    setString(std::string(kCopies) + "KXL95\\PROFILES\\INST1", "KXLPATH", "C:\\x");
+    setString("SOFTWARE\\ZAV\\KXL\\PROFILES\\V8CLU", "KXLCLUSTER", "OLDCLUS");
+    writeFile("C:\\Prog\\KXL95\\INST1\\kxlsystm", configImage(4));
+    makeDirectories("C:\\Prog\\KXL95\\CLU1");
   }
 
   // The instance list of `copyName` in a fresh copy list.
@@ -45,30 +60,30 @@ protected:
 };
 
 TEST_F(Instances, BelongToTheCopyNamedInTheInstanceRegistry) {
-  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "kxl95");
-  registerInstance("INST2", "C:\\Prog\\KXL95\\INST2", "KXL95");
-  registerInstance("NEW1", "C:\\Prog\\KXL101\\NEW1", "KXL101");
-  registerInstance("V8INST", "C:\\SQLLIB\\V8INST", "");
-  EXPECT_EQ(Names({"INST1", "INST2"}), names(*instancesOf("KXL95")));
+  EXPECT_EQ(Names({"CLU1", "INST1", "PROF1"}), names(*instancesOf("KXL95")));
   EXPECT_EQ(Names({"NEW1"}), names(*instancesOf("KXL101")));
-  // Instances without a copy name belong to the version-8 installation only.
-  EXPECT_EQ(Names({"V8INST"}), names(*instancesOf("KXLV8")));
-}
-
-TEST_F(Instances, AreFoundByNameIgnoringCase) {
-  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
+  EXPECT_EQ(Names({"V8CLU", "V8INST"}), names(*instancesOf("KXLV8")));
   IKXLINSTANCELIST *list = instancesOf("KXL95");
   IKXLINSTANCE *found = nullptr;
   ASSERT_EQ(0u, list->Find("inst1", &found));
-  char dir[256] = {};
-  ASSERT_EQ(0u, found->GetInstanceDir(dir, sizeof dir));
-  EXPECT_STREQ("C:\\Prog\\KXL95\\INST1", dir);
+  char text[256] = {};
+  ASSERT_EQ(0u, found->GetInstanceDir(text, sizeof text));
+  EXPECT_STREQ("C:\\Prog\\KXL95\\INST1", text);
   EXPECT_EQ(KXLI_RC_NAME_NOT_FOUND, list->Find("INST", &found));
   EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, list->Find("INST1", nullptr));
+  // Its copy and parent directory; "D:\profiles" needs 12 bytes.
+  IKXLINSTANCE *prof = instance("KXL95", "PROF1");
+  ASSERT_NE(nullptr, prof);
+  ASSERT_EQ(0u, prof->GetCopyName(text, sizeof text));
+  EXPECT_STREQ("KXL95", text);
+  ASSERT_EQ(0u, prof->GetInstanceParentDir(text, sizeof text));
+  EXPECT_STREQ("D:\\profiles", text);
+  EXPECT_EQ(KXLI_RC_BUFFER_TOO_SMALL, prof->GetInstanceParentDir(text, 11));
+  EXPECT_EQ(0u, prof->GetInstanceParentDir(text, 12));
+  EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, prof->GetInstanceParentDir(nullptr, 12));
 }
 
 TEST_F(Instances, ListFailsWhenTheInstanceRegistryFails) {
-  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
   failCalls("ossGetNextInstance:1");
   IKXLINSTANCELIST failed("KXL95");
   EXPECT_EQ(1u, failed.status);
@@ -95,9 +110,6 @@ TEST_F(Instances, ListFailsWhenTheInstanceRegistryFails) {
 // the instance registry serves every copy (a second walk would fail here), and
 // the caller's walk of the copies goes on where it was.
 TEST_F(Instances, ListsOfEveryCopyComeFromOneWalkThatKeepsTheCallersPlace) {
-  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
-  registerInstance("NEW1", "C:\\Prog\\KXL101\\NEW1", "KXL101");
-  registerInstance("V8INST", "C:\\SQLLIB\\V8INST", "");
   InstallCopyList copies(false, false);
   failCalls("ossOpenInstanceList:2");
   std::vector<Names> seen;
@@ -107,11 +119,10 @@ TEST_F(Instances, ListsOfEveryCopyComeFromOneWalkThatKeepsTheCallersPlace) {
     ASSERT_EQ(0u, copy->GetInstanceList(&list));
     seen.push_back(names(*list));
   }
-  EXPECT_EQ(std::vector<Names>({{"V8INST"}, {"NEW1"}, {"INST1"}}), seen);
+  EXPECT_EQ(std::vector<Names>({{"V8CLU", "V8INST"}, {"NEW1"}, {"CLU1", "INST1", "PROF1"}}), seen);
 }
 
 TEST_F(Instances, AFailedWalkKeepsNoListAndTheNextRequestWalksAgain) {
-  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
   InstallCopyList copies(false, false);
   InstallCopy *copy = nullptr;
   ASSERT_EQ(0u, copies.Find("KXL95", &copy));
@@ -120,22 +131,7 @@ TEST_F(Instances, AFailedWalkKeepsNoListAndTheNextRequestWalksAgain) {
   EXPECT_EQ(KXLI_RC_NOT_USABLE, copy->GetInstanceList(&list));
   failCalls("");
   ASSERT_EQ(0u, copy->GetInstanceList(&list));
-  EXPECT_EQ(Names({"INST1"}), names(*list));
-}
-
-TEST_F(Instances, KnowTheirCopyAndParentDirectory) {
-  registerInstance("INST1", "D:\\profiles\\INST1", "KXL95");
-  IKXLINSTANCE *inst = instance("KXL95", "INST1");
-  ASSERT_NE(nullptr, inst);
-  char text[129] = {};
-  ASSERT_EQ(0u, inst->GetCopyName(text, sizeof text));
-  EXPECT_STREQ("KXL95", text);
-  ASSERT_EQ(0u, inst->GetInstanceParentDir(text, sizeof text));
-  EXPECT_STREQ("D:\\profiles", text);
-  // "D:\profiles" needs 12 bytes.
-  EXPECT_EQ(KXLI_RC_BUFFER_TOO_SMALL, inst->GetInstanceParentDir(text, 11));
-  EXPECT_EQ(0u, inst->GetInstanceParentDir(text, 12));
-  EXPECT_EQ(KXLI_RC_NULL_ARGUMENT, inst->GetInstanceParentDir(nullptr, 12));
+  EXPECT_EQ(Names({"CLU1", "INST1", "PROF1"}), names(*list));
 }
 
 TEST_F(Instances, CutItsFieldsAndGuardItsParentDirectory) {
@@ -155,13 +151,9 @@ TEST_F(Instances, CutItsFieldsAndGuardItsParentDirectory) {
   EXPECT_EQ(std::string(255, 'd'), text);
 }
 
-TEST_F(Instances, AreClusteredWhenTheirProfileNamesACluster) {
-  registerInstance("CLU1", "C:\\Prog\\KXL95\\CLU1", "KXL95");
-  registerInstance("PLAIN", "C:\\Prog\\KXL95\\PLAIN", "KXL95");
-  registerInstance("V8CLU", "C:\\SQLLIB\\V8CLU", "");
-  setString(std::string(kCopies) + "KXL95\\PROFILES\\CLU1", "KXLCLUSTER", "KXLCLUS");
-  setString(std::string(kCopies) + "KXL95\\PROFILES\\PLAIN", "KXLPATH", "C:\\x");
-  setString("SOFTWARE\\ZAV\\KXL\\PROFILES\\V8CLU", "KXLCLUSTER", "OLDCLUS");
+// Clustered when the profile names a cluster; the configuration file is kept
+// as a snapshot, and an instance without one is listed all the same.
+TEST_F(Instances, KnowTheirClusterAndKeepASnapshotOfTheirConfiguration) {
   IKXLINSTANCE *clustered = instance("KXL95", "CLU1");
   ASSERT_NE(nullptr, clustered);
   EXPECT_EQ(1, clustered->isClustered);
@@ -169,32 +161,17 @@ TEST_F(Instances, AreClusteredWhenTheirProfileNamesACluster) {
   ASSERT_EQ(0u, clustered->GetClusterName(cluster, sizeof cluster));
   EXPECT_STREQ("KXLCLUS", cluster);
   EXPECT_EQ(KXLI_RC_BUFFER_TOO_SMALL, clustered->GetClusterName(cluster, 7));
+  EXPECT_EQ(0, clustered->GetNodeType());
+  EXPECT_EQ(1, instance("KXLV8", "V8CLU")->isClustered);
 
-  IKXLINSTANCE *plain = instance("KXL95", "PLAIN");
+  IKXLINSTANCE *plain = instance("KXL95", "INST1");
   EXPECT_EQ(0, plain->isClustered);
   EXPECT_EQ(0u, plain->GetClusterName(cluster, sizeof cluster));
   EXPECT_STREQ("", cluster);
-
-  IKXLINSTANCE *v8 = instance("KXLV8", "V8CLU");
-  EXPECT_EQ(1, v8->isClustered);
-}
-
-TEST_F(Instances, KeepASnapshotOfTheirConfigurationFile) {
-  registerInstance("INST1", "C:\\Prog\\KXL95\\INST1", "KXL95");
-  registerInstance("NOCFG", "C:\\Prog\\KXL95\\NOCFG", "KXL95");
-  writeFile("C:\\Prog\\KXL95\\INST1\\kxlsystm", configImage(4));
-  makeDirectories("C:\\Prog\\KXL95\\NOCFG");
-  IKXLINSTANCE *inst = instance("KXL95", "INST1");
-  ASSERT_NE(nullptr, inst);
-  EXPECT_EQ(4, inst->GetNodeType());
-  EXPECT_EQ(0x5A, inst->dbmCfgImage[16383]);
-  // Changing the file does not change the snapshot.
+  EXPECT_EQ(4, plain->GetNodeType());
+  EXPECT_EQ(0x5A, plain->dbmCfgImage[16383]);
   writeFile("C:\\Prog\\KXL95\\INST1\\kxlsystm", configImage(1));
-  EXPECT_EQ(4, inst->GetNodeType());
-  // An instance without the file is listed all the same.
-  IKXLINSTANCE *bare = instance("KXL95", "NOCFG");
-  ASSERT_NE(nullptr, bare);
-  EXPECT_EQ(0, bare->GetNodeType());
+  EXPECT_EQ(4, plain->GetNodeType());
 }
 
 TEST_F(Instances, ReloadTheirConfigurationFromAnyDirectory) {
