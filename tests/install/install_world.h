@@ -34,7 +34,7 @@ protected:
 
   // Trace lines written from now on go to a file of the case's own.
   void startTrace() {
-    trace_ = ::testing::TempDir() + "kxl_install_world_trace.txt";
+    trace_ = world_.scratch("trace.txt"); // the case's own, also beside parallel cases
     std::remove(trace_.c_str());
     setProcessVariable("KXLTRACE", trace_.c_str());
     kxlprod::resetTrace();
