@@ -3,6 +3,7 @@
 // upgrade driver did: its trace, the registry, and the files of a directory tree.
 #pragma once
 
+#include "sim/kxlsim/world_reader.h"
 #include "tests/support/command_world.h"
 
 #include <map>
@@ -13,11 +14,9 @@ namespace drivertest {
 
 inline constexpr const char *kOldInstanceDir = "C:\\Program Files\\ZAV\\KXL95\\INST1";
 inline constexpr const char *kNewInstanceDir = "C:\\Program Files\\ZAV\\KXL101\\INST1";
-inline constexpr const char *kTempDir = "C:\\windows\\temp";
 
 struct DriverFailure {
-  long long probe;
-  long long rc;
+  long long probe, rc;
 };
 
 struct Outcome : kxltest::CommandOutcome {
@@ -29,8 +28,13 @@ struct Outcome : kxltest::CommandOutcome {
 // Relative path -> content of every file below a directory.
 using Tree = std::map<std::string, std::string>;
 
+// The profile key of an instance under a copy.
+inline std::string profileKey(const std::string &copyName, const std::string &instance) {
+  return kxlsim::copyRegistryKey(copyName) + "\\PROFILES\\" + instance;
+}
+
 class DriverTest : public kxltest::CommandWorld {
-protected:
+public:
   // Runs the command with `args`; `faults` is the KXLSIM_FAIL value ("" none),
   // `kill` the KXLSIM_KILL value ("" none).
   Outcome run(const std::vector<std::string> &args, const std::string &faults = "",
@@ -44,10 +48,8 @@ protected:
   // The whole content of a file ("" when it cannot be read).
   std::string fileContent(const std::string &windowsPath) const;
   void removeTree(const std::string &windowsPath) const;
-  // The world's diagnostic log ("" when there is none).
-  std::string diagnosticLog() const;
-  // Entries of the world's temporary directory.
-  std::vector<std::string> tempEntries() const;
+  // A backup folder is in the world's temporary directory.
+  bool hasBackup() const;
 
   // Keeps a copy of the world as it is now, for worldChanges.
   void keepWorld() { kept_ = snapshot(); }
@@ -57,21 +59,16 @@ protected:
   std::string worldChanges() const;
 
   // Registry of the local machine.
-  bool keyExists(const std::string &key) const;
-  std::string stringValue(const std::string &key, const std::string &name) const;
-  DWORD dwordValue(const std::string &key, const std::string &name) const;
+  bool keyExists(const std::string &key) const { return kxlsim::keyExists(kxlsim::localMachine(), key); }
+  std::string stringValue(const std::string &key, const std::string &name) const {
+    return kxlsim::stringValue(kxlsim::localMachine(), key, name);
+  }
+  DWORD dwordValue(const std::string &key, const std::string &name) const {
+    return kxlsim::dwordValue(kxlsim::localMachine(), key, name, 0xFFFFFFFFu);
+  }
 
 private:
   std::string kept_;
 };
-
-// The files that differ between two trees, one name a line ("" when equal).
-std::string treeDifferences(const Tree &before, const Tree &after);
-
-// The profile key of an instance under a copy.
-std::string profileKey(const std::string &copyName, const std::string &instance);
-
-// True when `entries` (of the temporary directory) hold a backup folder.
-bool hasBackup(const std::vector<std::string> &entries);
 
 } // namespace drivertest

@@ -24,7 +24,7 @@ struct CommandOutcome {
 };
 
 class CommandWorld : public ::testing::Test {
-protected:
+public:
   static constexpr const char *kCurrentCopy = "C:\\Program Files\\ZAV\\KXL101";
   static constexpr const char *kOldCopy = "C:\\Program Files\\ZAV\\KXL95";
 
