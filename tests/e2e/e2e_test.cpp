@@ -1,7 +1,8 @@
-// Clustered instances upgraded by the installed command in the cluster world
-// of kxlsim, seen as kxlsim shows and compares the world. The failures of the
-// cluster step are driven the same way, each followed by a plain run that then
-// succeeds.
+// The command's main jobs from the outside, in worlds built by kxlsim and seen
+// as kxlsim shows and compares them: the single-partition instance of the 9.5
+// copy in the demo world, and the clustered instances of the cluster world.
+// The failures of the cluster step are driven the same way, each followed by
+// a plain run that then succeeds.
 #include "sim/kxlsim/show.h"
 #include "tests/support/command_world.h"
 
@@ -30,11 +31,6 @@ struct ClusterUpgrade {
 };
 const ClusterUpgrade kSingle{"CINST1", {"-p", "C:\\Program Files\\ZAV\\KXL101", "CINST1"}};
 const ClusterUpgrade kPartitioned{"CINST2", {"-u", "kxlsvc,Secret1", "CINST2"}};
-
-struct Outcome {
-  int exitCode = -1;
-  std::string out, trace;
-};
 
 std::vector<std::string> lines(const std::string &text) {
   std::vector<std::string> out;
@@ -79,6 +75,78 @@ std::vector<std::string> stepErrors(const std::string &trace) {
   return out;
 }
 
+// Everything the upgrade changes, and nothing else (no backup is left in
+// C:\windows\temp).
+const char kExpectedChanges[] = R"(registry - HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL95\PROFILES\INST1
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\INST1 "Copy": "KXL95" -> "KXL101"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Instances\INST1 "Directory": "C:\Program Files\ZAV\KXL95\INST1" -> "C:\Program Files\ZAV\KXL101\INST1"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\INST1 "DisplayName": "KXL - KXL95 - INST1" -> "KXL - KXL101 - INST1"
+registry ~ HKLM\SOFTWARE\ZAV\KXLSIM\Services\INST1 "ImagePath": "C:\Program Files\ZAV\KXL95\bin\kxlsyscs.exe" -> "C:\Program Files\ZAV\KXL101\bin\kxlsyscs.exe"
+registry + HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\INST1
+file + C:\KXLDBMIG.TXT (440 bytes, fnv 99c1bf416a879d93)
+       + Database check before an instance upgrade
+       + ==========================================
+       + 
+       + The check program examines every database of the instance before the
+       + instance moves to a newer copy of the product. It writes its findings to
+       + the log file named with -l.
+       + 
+       + Exit codes
+       +   0  every database can be upgraded
+       +   1  warnings were found; the upgrade may go on
+       +   2  the instance has no databases
+       +   3  objects were found that must be corrected first
+file + C:\Program Files\ZAV\KXL101\INST1\bin\rsm.cfg (10 bytes, fnv cf1a9f0cdf3562f0)
+       + rsm = on
+file + C:\Program Files\ZAV\KXL101\INST1\cfg\djxclassic2.cfg (13 bytes, fnv 44a60aba95ae67c5)
+       + classic = 2
+file + C:\Program Files\ZAV\KXL101\INST1\cfg\kxldj.ini (28 bytes, fnv 807da70b3e7841df)
+       + [federation]
+       + enabled = no
+file + C:\Program Files\ZAV\KXL101\INST1\kxlmd_config.xml (28 bytes, fnv 7d5c60b04106967e)
+       + <config instance="INST1"/>
+file + C:\Program Files\ZAV\KXL101\INST1\kxlsystm (16384 bytes, fnv 3920934884e75c52)
+file + C:\Program Files\ZAV\KXL101\INST1\security\kxlaudit.cfg (120 bytes, fnv cbc80e32e98b4190)
+       + # audit settings of INST1
+       + active = yes
+       + errortype = normal
+       + admin = both
+       + instance = both
+       + # upgraded for copy KXL101
+file + C:\Program Files\ZAV\KXL101\function\kxludf.dll (42 bytes, fnv d5018ea7f0c59122)
+       + MZ user functions of the KXL95 instances
+file + C:\upgrade.log (62 bytes, fnv 9b1eb0d4870202bd)
+       + Database check of instance "INST1" finished.
+       + Result code: 0
+file + events.jsonl (805 bytes, fnv d398b08fdd4bb417)
+       + {"KXLINSTANCE":"INST1","argc":"7","args":"-h -m -not1 -l C:\\upgrade.log -t C:","cwd":"C:\\","event":"program","program":"kxlckupgrade.exe"}
+       + {"KXLINSTANCE":"INST1","argc":"0","args":"","cwd":"C:\\","event":"program","program":"kxlimaudcfg.exe"}
+       + {"KXLINSTANCE":"INST1","argc":"4","args":"-c C:\\Program Files\\ZAV\\KXL95\\INST1\\SSLClientconfig.ini -s C:\\Program Files\\ZAV\\KXL95\\INST1\\SSLconfig.ini","cwd":"C:\\","event":"program","program":"kxlimsslcfg.exe"}
+       + {"KXLINSTANCE":"INST1","argc":"1","args":"-cleanup","cwd":"C:\\","event":"program","program":"kxlset.exe"}
+       + {"audit_event":"53","category":"0x80000000","errortype":"0","event":"audit","instance":"INST1","sqlcode":"0"}
+       + {"audit_event":"1","category":"0x20000000","data":"INST1","errortype":"0","event":"audit","instance":"INST1","sqlcode":"0"}
+)";
+
+using DemoE2eTest = kxltest::CommandWorld;
+
+// The diagnostic log names the backup folder, whose name differs per run: it
+// is checked for that line and left out of the exact changes.
+TEST_F(DemoE2eTest, SinglePartitionInstanceMovesToTheCurrentCopy) {
+  std::string before = snapshot();
+  kxltest::CommandOutcome upgrade = runInWorld({"INST1"}, {}, "kxliupgrade.exe", "C:\\");
+  EXPECT_EQ(upgrade.exitCode, 0) << upgrade.out << upgrade.err;
+  EXPECT_NE(upgrade.out.find("KXLIUPGRADE"), std::string::npos) << upgrade.out;
+  std::string diff = changesSince(before), kept;
+  bool inLog = false;
+  for (const std::string &line : lines(diff)) {
+    if (!line.empty() && line[0] != ' ')
+      inLog = line.rfind("file + kxldiag.log", 0) == 0;
+    kept += inLog ? "" : line + "\n";
+  }
+  EXPECT_EQ(kept, kExpectedChanges);
+  EXPECT_NE(diff.find("\\INST1 is backed up in C:\\windows\\temp\\KXL"), std::string::npos) << diff;
+}
+
 class ClusterE2eTest : public kxltest::CommandWorld {
 protected:
   void SetUp() override {
@@ -86,12 +154,11 @@ protected:
     resetWorld("cluster");
   }
 
-  Outcome upgrade(const std::vector<std::string> &args, const std::string &faults = "") {
-    std::vector<std::string> settings;
-    if (!faults.empty())
-      settings.push_back("KXLSIM_FAIL=" + faults);
-    kxltest::CommandOutcome run = runInWorld(args, settings);
-    return {run.exitCode, run.out + run.err, run.trace};
+  // The run's output and errors together in `out`.
+  kxltest::CommandOutcome upgrade(const std::vector<std::string> &args, const std::string &faults = "") {
+    kxltest::CommandOutcome run = runInWorld(args, {"KXLSIM_FAIL=" + faults});
+    run.out += run.err;
+    return run;
   }
 
   std::string show() {
@@ -99,10 +166,6 @@ protected:
     kxlsim::showWorld(out);
     return out.str();
   }
-
-public: // for the cases' set-up
-  using CommandWorld::hostPath;
-  using CommandWorld::world;
 };
 
 // CINST1's registry changes on both nodes; its resource keeps group and
@@ -123,7 +186,7 @@ registry + [WINSRV2] HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST
 
 TEST_F(ClusterE2eTest, ClusteredInstanceUpgradesAndASecondRunConvertsNothing) {
   std::string before = snapshot();
-  Outcome first = upgrade(kSingle.args);
+  kxltest::CommandOutcome first = upgrade(kSingle.args);
   EXPECT_EQ(first.exitCode, 0) << first.out;
   EXPECT_EQ(first.out.rfind("KXL1000I", 0), 0u) << first.out;
   std::string diff = changesSince(before);
@@ -135,7 +198,7 @@ TEST_F(ClusterE2eTest, ClusteredInstanceUpgradesAndASecondRunConvertsNothing) {
   EXPECT_TRUE(hasLine(show(), kCinst1Converted));
 
   std::string converted = snapshot();
-  Outcome second = upgrade({"-install", "CINST1"});
+  kxltest::CommandOutcome second = upgrade({"-install", "CINST1"});
   EXPECT_EQ(second.exitCode, 0) << second.out;
   EXPECT_NE(second.trace.find("exit 0x18780509 rc=0"), std::string::npos)
       << "the step ran and converted nothing";
@@ -181,7 +244,7 @@ TEST_F(ClusterE2eTest, ClusteredPartitionedInstanceUpgradesOnEveryNode) {
   world.setString(kxlsim::remoteMachine("WINSRV2"), "Cluster\\ZAV\\KXL\\PROFILES\\CINST2", "KXLINSTPROF",
                   "X:\\OLD");
   std::string before = snapshot();
-  Outcome run = upgrade(kPartitioned.args);
+  kxltest::CommandOutcome run = upgrade(kPartitioned.args);
   EXPECT_EQ(run.exitCode, 0) << run.out;
   EXPECT_EQ(registryChanges(changesSince(before)), kPartitionedChanges);
   std::string cluster = show();
@@ -211,7 +274,7 @@ TEST_F(ClusterE2eTest, ClusterStateThatCannotBeReadFailsTheRunUnchanged) {
   for (const auto &c : cases) {
     SCOPED_TRACE(c.faults);
     std::string before = snapshot();
-    Outcome run = upgrade(kSingle.args, c.faults);
+    kxltest::CommandOutcome run = upgrade(kSingle.args, c.faults);
     EXPECT_NE(run.exitCode, 0) << run.out;
     EXPECT_EQ(run.out.rfind(c.message, 0), 0u) << run.out;
     EXPECT_EQ(registryChanges(changesSince(before)), "");
@@ -228,7 +291,7 @@ TEST_F(ClusterE2eTest, FailedLibraryCompareStillFindsTheInstanceResource) {
   for (int call = 1; call <= 12; ++call) {
     SCOPED_TRACE(call);
     std::string before = snapshot();
-    Outcome run = upgrade(kSingle.args, "sqlomcpi:" + std::to_string(call));
+    kxltest::CommandOutcome run = upgrade(kSingle.args, "sqlomcpi:" + std::to_string(call));
     if (run.exitCode == 0)
       EXPECT_TRUE(hasLine(show(), kCinst1Converted)) << "a completed run converted the resource";
     else
@@ -367,7 +430,7 @@ TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
   if (c.prepare)
     c.prepare(*this);
   std::string before = snapshot();
-  Outcome run = upgrade(c.upgrade->args, c.faults);
+  kxltest::CommandOutcome run = upgrade(c.upgrade->args, c.faults);
   EXPECT_NE(run.trace.find("exit 0x18780509 rc=" + std::to_string(c.result) + "\n"), std::string::npos)
       << run.trace;
   EXPECT_EQ(stepErrors(run.trace), c.errors);
@@ -388,7 +451,7 @@ TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
 
   if (c.repair)
     c.repair(*this);
-  Outcome again = upgrade(c.upgrade->args);
+  kxltest::CommandOutcome again = upgrade(c.upgrade->args);
   EXPECT_EQ(again.exitCode, 0) << again.out;
   cluster = show();
   for (const std::string &line : c.rerun)
