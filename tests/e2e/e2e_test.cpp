@@ -23,14 +23,10 @@ constexpr const char *kCinst1Converted =
 constexpr const char *kCinst1Unchanged =
     "    CINST1         KXL              offline  depends on Disk E:, Disk H:";
 
-// The clustered upgrades of the cluster world, as a scenario and the command
-// line in it, for programs that drive every end-to-end upgrade.
-struct ClusterUpgrade {
-  const char *instance;
-  std::vector<std::string> args;
-};
-const ClusterUpgrade kSingle{"CINST1", {"-p", "C:\\Program Files\\ZAV\\KXL101", "CINST1"}};
-const ClusterUpgrade kPartitioned{"CINST2", {"-u", "kxlsvc,Secret1", "CINST2"}};
+// The clustered upgrades of the cluster world.
+using Args = std::vector<std::string>;
+const Args kSingle{"-p", "C:\\Program Files\\ZAV\\KXL101", "CINST1"};
+const Args kPartitioned{"-u", "kxlsvc,Secret1", "CINST2"};
 
 std::vector<std::string> lines(const std::string &text) {
   std::vector<std::string> out;
@@ -186,7 +182,7 @@ registry + [WINSRV2] HKLM\SOFTWARE\ZAV\KXL\InstalledCopies\KXL101\PROFILES\CINST
 
 TEST_F(ClusterE2eTest, ClusteredInstanceUpgradesAndASecondRunConvertsNothing) {
   std::string before = snapshot();
-  kxltest::CommandOutcome first = upgrade(kSingle.args);
+  kxltest::CommandOutcome first = upgrade(kSingle);
   EXPECT_EQ(first.exitCode, 0) << first.out;
   EXPECT_EQ(first.out.rfind("KXL1000I", 0), 0u) << first.out;
   std::string diff = changesSince(before);
@@ -244,7 +240,7 @@ TEST_F(ClusterE2eTest, ClusteredPartitionedInstanceUpgradesOnEveryNode) {
   world.setString(kxlsim::remoteMachine("WINSRV2"), "Cluster\\ZAV\\KXL\\PROFILES\\CINST2", "KXLINSTPROF",
                   "X:\\OLD");
   std::string before = snapshot();
-  kxltest::CommandOutcome run = upgrade(kPartitioned.args);
+  kxltest::CommandOutcome run = upgrade(kPartitioned);
   EXPECT_EQ(run.exitCode, 0) << run.out;
   EXPECT_EQ(registryChanges(changesSince(before)), kPartitionedChanges);
   std::string cluster = show();
@@ -274,13 +270,13 @@ TEST_F(ClusterE2eTest, ClusterStateThatCannotBeReadFailsTheRunUnchanged) {
   for (const auto &c : cases) {
     SCOPED_TRACE(c.faults);
     std::string before = snapshot();
-    kxltest::CommandOutcome run = upgrade(kSingle.args, c.faults);
+    kxltest::CommandOutcome run = upgrade(kSingle, c.faults);
     EXPECT_NE(run.exitCode, 0) << run.out;
     EXPECT_EQ(run.out.rfind(c.message, 0), 0u) << run.out;
     EXPECT_EQ(registryChanges(changesSince(before)), "");
   }
   std::string before = snapshot();
-  EXPECT_EQ(upgrade(kSingle.args).exitCode, 0);
+  EXPECT_EQ(upgrade(kSingle).exitCode, 0);
   EXPECT_EQ(registryChanges(changesSince(before)), kSingleChanges);
 }
 
@@ -291,7 +287,7 @@ TEST_F(ClusterE2eTest, FailedLibraryCompareStillFindsTheInstanceResource) {
   for (int call = 1; call <= 12; ++call) {
     SCOPED_TRACE(call);
     std::string before = snapshot();
-    kxltest::CommandOutcome run = upgrade(kSingle.args, "sqlomcpi:" + std::to_string(call));
+    kxltest::CommandOutcome run = upgrade(kSingle, "sqlomcpi:" + std::to_string(call));
     if (run.exitCode == 0)
       EXPECT_TRUE(hasLine(show(), kCinst1Converted)) << "a completed run converted the resource";
     else
@@ -303,7 +299,7 @@ TEST_F(ClusterE2eTest, FailedLibraryCompareStillFindsTheInstanceResource) {
 // One way the cluster step can end, and the repair after which a plain run succeeds.
 struct StepCase {
   const char *name;
-  const ClusterUpgrade *upgrade;
+  const Args *args;
   std::function<void(ClusterE2eTest &)> prepare; // may be empty
   std::string faults;
   int result;                      // the step's, and so the run's
@@ -314,23 +310,21 @@ struct StepCase {
   std::vector<std::string> rerun;               // lines of kxlsim show after the plain run
 };
 
-void setDword(ClusterE2eTest &t, const kxlsim::RegTarget &machine, const std::string &key, const char *name,
-              DWORD value) {
-  t.world.setDword(machine, key, name, value);
-}
+using Prepare = std::function<void(ClusterE2eTest &)>;
+const char *const kClusterKey = "SOFTWARE\\ZAV\\KXLSIM\\Cluster";
+const char *const kClusApi = "C:\\windows\\system32\\clusapi.dll";
 
 // CINST1's group owned by the other node, where its service runs.
 void runOnOtherNode(ClusterE2eTest &t, DWORD serviceState) {
   t.world.setString(kxlsim::localMachine(), std::string(kGroups) + "CINST1 Group", "OwnerNode", "WINSRV2");
-  setDword(t, kxlsim::remoteMachine("WINSRV2"), "SOFTWARE\\ZAV\\KXLSIM\\Services\\CINST1", "State",
-           serviceState);
+  t.world.setDword(kxlsim::remoteMachine("WINSRV2"), "SOFTWARE\\ZAV\\KXLSIM\\Services\\CINST1", "State",
+                   serviceState);
 }
 
 void setDependsOn(ClusterE2eTest &t, const std::string &resource, const std::vector<std::string> &names) {
   t.world.setMultiString(kxlsim::localMachine(), kResources + resource, "DependsOn", names);
 }
 
-using Prepare = std::function<void(ClusterE2eTest &)>;
 const std::vector<std::string> kCinst2Unchanged = {
     "    CINST2-0       KXL              offline  depends on Disk F:",
     "    CINST2-1       KXL              offline  depends on Disk G:, CINST2 IP"};
@@ -359,43 +353,28 @@ StepCase singleSucceeds(const char *name, Prepare prepare, const std::string &sh
 
 const std::vector<std::string> kStillOwned = {"probe=47 rc=-1", "probe=50 rc=-1254"};
 
+// clang-format off
 const StepCase kStepCases[] = {
-    singleFails(
-        "ClusterLibraryMissing", "", -1251, {"probe=10 rc=-1251"},
-        [](ClusterE2eTest &t) { fs::remove(t.hostPath("C:\\windows\\system32\\clusapi.dll")); },
-        [](ClusterE2eTest &t) {
-          t.world.writeText("C:\\windows\\system32\\clusapi.dll",
-                            "MZ simulated run-time module clusapi.dll\r\n");
-        }),
+    singleFails("ClusterLibraryMissing", "", -1251, {"probe=10 rc=-1251"},
+                [](ClusterE2eTest &t) { fs::remove(t.hostPath(kClusApi)); },
+                [](ClusterE2eTest &t) { t.world.writeText(kClusApi, "MZ simulated run-time module clusapi.dll\r\n"); }),
     singleFails("EntryPointMissing", "GetProcAddress:37", -1251, {"probe=10 rc=-1251"}),
-    singleFails(
-        "LocalClusterServiceStopped", "", -1252, {"probe=20 rc=-1252"},
-        [](ClusterE2eTest &t) {
-          setDword(t, kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", 3);
-        },
-        [](ClusterE2eTest &t) {
-          setDword(t, kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Cluster", "NodeState", 19);
-        }),
+    singleFails("LocalClusterServiceStopped", "", -1252, {"probe=20 rc=-1252"},
+                [](ClusterE2eTest &t) { t.world.setDword(kxlsim::localMachine(), kClusterKey, "NodeState", 3); },
+                [](ClusterE2eTest &t) { t.world.setDword(kxlsim::localMachine(), kClusterKey, "NodeState", 19); }),
     singleFails("TypeRegistrationRefused", "CreateClusterResourceType:1", -1252, {"probe=20 rc=-1252"}),
     singleFails("PutBackWithItsDependencies", "CreateClusterResource:1", -1252, {"probe=70 rc=-1252"}),
     // From here on the undo puts back what the step had changed: each
     // resource as it was, and the type it registered.
-    singleFails("NewResourceWithoutAllDependencies", "AddClusterResourceDependency:1", -1252,
-                {"probe=80 rc=-1252"}),
-    singleFails("PutBackWithoutAllDependencies", "CreateClusterResource:1,AddClusterResourceDependency:1",
-                -1253, {"probe=65 rc=-1253"}),
-    singleFails("ResourceGone", "CreateClusterResource:1,CreateClusterResource:2", -1253,
-                {"probe=60 rc=-1253"}),
-    singleFails(
-        "OnlineOnTheOtherNode", "", -1254, kStillOwned, [](ClusterE2eTest &t) { runOnOtherNode(t, 4); },
-        [](ClusterE2eTest &t) { runOnOtherNode(t, 1); },
-        {"    CINST1         KXL              online   depends on Disk E:, Disk H:"}),
-    singleFails(
-        "AnotherResourceDependsOnIt", "", -1254, kStillOwned,
-        [](ClusterE2eTest &t) {
-          kxlsim::addClusterResource(t.world, {"CINST1 App", "Generic Service", "CINST1 Group", {"CINST1"}});
-        },
-        [](ClusterE2eTest &t) { setDependsOn(t, "CINST1 App", {}); }),
+    singleFails("NewResourceWithoutAllDependencies", "AddClusterResourceDependency:1", -1252, {"probe=80 rc=-1252"}),
+    singleFails("PutBackWithoutAllDependencies", "CreateClusterResource:1,AddClusterResourceDependency:1", -1253, {"probe=65 rc=-1253"}),
+    singleFails("ResourceGone", "CreateClusterResource:1,CreateClusterResource:2", -1253, {"probe=60 rc=-1253"}),
+    singleFails("OnlineOnTheOtherNode", "", -1254, kStillOwned, [](ClusterE2eTest &t) { runOnOtherNode(t, 4); },
+                [](ClusterE2eTest &t) { runOnOtherNode(t, 1); },
+                {"    CINST1         KXL              online   depends on Disk E:, Disk H:"}),
+    singleFails("AnotherResourceDependsOnIt", "", -1254, kStillOwned,
+                [](ClusterE2eTest &t) { kxlsim::addClusterResource(t.world, {"CINST1 App", "Generic Service", "CINST1 Group", {"CINST1"}}); },
+                [](ClusterE2eTest &t) { setDependsOn(t, "CINST1 App", {}); }),
     partitionedFails("LaterPartitionNotDeleted", "DeleteClusterResource:2", -1254, kStillOwned),
     // A state the step cannot read ends it; nothing is taken for a value.
     singleFails("TypeCannotBeLookedUp", "ClusterResourceTypeOpenEnum:1", -1252, {"probe=20 rc=-1252"}),
@@ -404,20 +383,16 @@ const StepCase kStepCases[] = {
     // step's first is the third.
     partitionedFails("NodesFileUnreadable", "sqloReadKxlnodes:3", -1252, {"probe=35 rc=-1252"}),
     // Not failures: a name in another letter case, a dependency that is gone.
-    singleSucceeds(
-        "NameInAnotherCase",
-        [](ClusterE2eTest &t) {
-          SHDeleteKeyA(HKEY_LOCAL_MACHINE, (std::string(kResources) + "CINST1").c_str());
-          kxlsim::addClusterResource(t.world, {"cinst1", "KXL", "CINST1 Group", {"Disk E:", "Disk H:"}});
-        },
-        "    cinst1         KXL Server       offline  depends on Disk E:, Disk H:"),
-    singleSucceeds(
-        "DependencyGone",
-        [](ClusterE2eTest &t) {
-          setDependsOn(t, "CINST1", {"Disk E:", "Disk Z:", "Disk H:"});
-        },
-        kCinst1Converted),
+    singleSucceeds("NameInAnotherCase",
+                   [](ClusterE2eTest &t) {
+                     SHDeleteKeyA(HKEY_LOCAL_MACHINE, (std::string(kResources) + "CINST1").c_str());
+                     kxlsim::addClusterResource(t.world, {"cinst1", "KXL", "CINST1 Group", {"Disk E:", "Disk H:"}});
+                   },
+                   "    cinst1         KXL Server       offline  depends on Disk E:, Disk H:"),
+    singleSucceeds("DependencyGone", [](ClusterE2eTest &t) { setDependsOn(t, "CINST1", {"Disk E:", "Disk Z:", "Disk H:"}); },
+                   kCinst1Converted),
 };
+// clang-format on
 
 void PrintTo(const StepCase &c, std::ostream *out) {
   *out << c.name;
@@ -430,7 +405,7 @@ TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
   if (c.prepare)
     c.prepare(*this);
   std::string before = snapshot();
-  kxltest::CommandOutcome run = upgrade(c.upgrade->args, c.faults);
+  kxltest::CommandOutcome run = upgrade(*c.args, c.faults);
   EXPECT_NE(run.trace.find("exit 0x18780509 rc=" + std::to_string(c.result) + "\n"), std::string::npos)
       << run.trace;
   EXPECT_EQ(stepErrors(run.trace), c.errors);
@@ -451,7 +426,7 @@ TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
 
   if (c.repair)
     c.repair(*this);
-  kxltest::CommandOutcome again = upgrade(c.upgrade->args);
+  kxltest::CommandOutcome again = upgrade(*c.args);
   EXPECT_EQ(again.exitCode, 0) << again.out;
   cluster = show();
   for (const std::string &line : c.rerun)
