@@ -1,4 +1,6 @@
-// Checks of caller, instance and copies that stop the run before the driver.
+// Runs that stop before the driver: command-line errors, and the checks of
+// caller, instance and copies. Each prints its catalog text (or the fallback
+// line without catalogs), ends with its code and leaves the world as it was.
 #include "expected_texts.h"
 #include "scenario_fixture.h"
 
@@ -10,55 +12,135 @@ namespace {
 using kxlsim::localMachine;
 using kxltest::RunResult;
 using kxltest::RunSetup;
+using kxltest::ScenarioTest;
 
-class CheckScenario : public kxltest::ScenarioTest {
-protected:
-  void setCopyLevel(const std::string &copy, int version, int release) {
-    std::string key = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\" + copy + "\\CurrentVersion";
-    world.setString(localMachine(), key, "Version", std::to_string(version));
-    world.setString(localMachine(), key, "Release", std::to_string(release));
-  }
-  void setToolExit(DWORD code) { kxlsim::setToolExitCode(world, "kxlckupgrade", code); }
+constexpr const char *kIdentity = ScenarioTest::kIdentity;
+
+void setCopyLevel(ScenarioTest &t, const std::string &copy, int version, int release) {
+  std::string key = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\" + copy + "\\CurrentVersion";
+  t.world.setString(localMachine(), key, "Version", std::to_string(version));
+  t.world.setString(localMachine(), key, "Release", std::to_string(release));
+}
+void setToolExit(ScenarioTest &t, DWORD code) {
+  kxlsim::setToolExitCode(t.world, "kxlckupgrade", code);
+}
+void notAdmin(ScenarioTest &t) {
+  t.world.setDword(localMachine(), kIdentity, "LocalAdmin", 0x01);
+  t.world.setString(localMachine(), kIdentity, "AuthId", "JDOE");
+}
+void reserved(ScenarioTest &t) {
+  t.world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\GLOBAL_PROFILE",
+                    "KXLRESERVEDINST", "inst1");
+}
+
+const std::string k1918 =
+    "KXL1918E  The installed copies of the product, or the copy this command belongs to, cannot be found.\n";
+const std::string k1069 =
+    "KXL1069E  The database check program \"kxlckupgrade\" ended with exit code \"7\". The instance was not "
+    "upgraded.\n";
+
+struct Refusal {
+  std::vector<std::string> args;
+  long long result;
+  std::string out;
+  void (*setup)(ScenarioTest &) = nullptr;
+  const char *faults = "";
+  bool catalogs = true;
+  bool checkToolRan = false; // its files are left; the registry is as it was
 };
 
-TEST_F(CheckScenario, UnknownInstanceNamesItself) {
-  RunResult r = run({"nosuch"});
-  EXPECT_EQ(r.out, kxltest::unknownInstanceText("NOSUCH"));
-  EXPECT_EQ(r.result, 1951);
-  EXPECT_EQ(changes(r), "");
+// clang-format off
+const Refusal kRefusals[] = {
+    {{}, -1946, kxltest::kUsageText},
+    {{"INST1", "-?"}, -1946, kxltest::kUsageText},
+    {{"/x", "INST1"}, -1946, kxltest::kUsageText},
+    {{"INST1", "-a"}, -1946, kxltest::kUsageText},
+    {{"INST1", "INST2"}, -1946, kxltest::kUsageText},
+    {{"NINECHARS"}, -1916, "KXL1916E  The instance name is not valid. An instance name has 1 to 8 characters.\n"},
+    {{"-p", "C:\\nowhere", "INST1"}, -1920, "KXL1920E  The instance profile path given with -p is not an existing directory.\n"},
+    {{"-u", std::string(31, 'u'), "INST1"}, -1921, "KXL1921E  The account name given with -u is not valid, or the password could not be read.\n"},
+    {{"-j", "FULL_TEXT", "INST1"}, -1934, "KXL1934E  The value of -j is not valid. Give TEXT_SEARCH, optionally followed by a service "
+                                          "name or a port number, or by a service name and a port number.\n"},
+    {{"-j", "TEXT_SEARCH,1023", "INST1"}, -1701, "KXL1701E  The text search port must lie between 1024 and 65535, and the text search "
+                                                 "service name may have at most 14 characters.\n"},
+    {{"kxldas00"}, -1954, kxltest::kAdminServerText},
+    {{}, -1946, "KXLIMIGR:syntax error, RC = -1946\n", nullptr, "", false},
+    {{"NINECHARS"}, -1916, "KXLIMIGR:processing complete, RC = -1916\n", nullptr, "", false},
+    {{"-j", "TEXT_SEARCH,99999", "INST1"}, -1701, "KXLIMIGR:processing complete, RC = -1701\n", nullptr, "", false},
+    {{"KXLDAS00"}, -1954, "KXLIMIGR:processing complete, RC = -1954\n", nullptr, "", false},
+    // Quiet mode prints nothing; installer mode ends with 1 or 2.
+    {{"-q", "NOSUCH"}, 1951, ""},
+    {{"-install", "NOSUCH"}, 1, kxltest::unknownInstanceText("NOSUCH")},
+    {{"-install", "-x", "NOSUCH"}, 2, kxltest::kUsageText},
+    {{"nosuch"}, 1951, kxltest::unknownInstanceText("NOSUCH")},
+    // The level check of the instance's copy comes first, so an instance of
+    // the current copy is reported as such only by a current copy below 9.7.
+    {{"NEWINST"}, 1950, kxltest::alreadyUpgradedText("NEWINST"), [](ScenarioTest &t) {
+       setCopyLevel(t, "KXL101", 9, 6);
+       t.addInstance("NEWINST", "KXL101", std::string(ScenarioTest::kCurrentCopy) + "\\NEWINST", 10, 1); }},
+    // Copy versions outside the upgrade range; a current copy below 9 is refused to installers too.
+    {{"INST1"}, -1949, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL95", 9, 7); }},
+    {{"INST1"}, -1949, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL95", 10, 1); }},
+    {{"INST1"}, -1949, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL101", 8, 2); }},
+    {{"-install", "INST1"}, 2, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL101", 8, 2); }},
+    {{"INST1"}, -1139, kxltest::kReservedText, reserved},
+    {{"INST2", "-u", "a,b"}, -1069, k1069, [](ScenarioTest &t) { reserved(t); setToolExit(t, 7); }, "", true, true}, // only the reserved name
+    {{"INST1"}, -1, kxltest::notAdminText("JDOE"), notAdmin},
+    {{"INST1"}, -1, "KXLIMIGR:processing complete, SQLCODE=-1092\n", notAdmin, "", false},
+    // A partitioned instance needs an account name and a password.
+    {{"INST2"}, -1946, kxltest::kUsageText},
+    {{"-u", "kxlsvc", "INST2"}, -1946, kxltest::kUsageText},
+    // An active instance is refused before the check tool; for a partitioned
+    // one, the second partition runs on the other machine.
+    {{"INST1"}, -1953, kxltest::kActiveText,
+     [](ScenarioTest &t) { t.world.setDword(localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1", "State", 4); }},
+    {{"-u", "kxlsvc,secret", "INST2"}, -1953, kxltest::kActiveText,
+     [](ScenarioTest &t) { t.world.setDword(kxlsim::remoteMachine("WINSRV2"), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1", "State", 4); }},
+    {{"INST1"}, -1069, k1069, [](ScenarioTest &t) { setToolExit(t, 7); }, "", true, true},
+    {{"INST1"}, -1069, "KXLIMIGR:processing complete, RC = -1069\n", [](ScenarioTest &t) { setToolExit(t, 7); }, "", false, true},
+    // A failed read of which installation is current, or a switch between the
+    // installations that fails either way, ends the run before anything
+    // changes: profile reads in the wrong installation would otherwise take
+    // the old copy for the current one.
+    {{"INST1"}, -1918, k1918, nullptr, "sqloGetCurrentInstallationName:2"}, // global profile check
+    {{"INST1"}, -1918, k1918, nullptr, "sqloGetCurrentInstallationName:4"}, // binding the instance
+    {{"INST1"}, -1918, k1918, nullptr, "sqloGetCurrentInstallationName:5"}, // database check
+    {{"INST1"}, -1918, k1918, nullptr, "sqloSwitchToInstallationName:1"},
+    {{"INST1"}, -1918, k1918, nullptr, "sqloSwitchToInstallationName:2"},
+    {{"INST1"}, -1918, k1918, nullptr, "sqloSwitchToInstallationName:3"},
+    {{"INST1"}, -1918, k1918, nullptr, "sqloSwitchToInstallationName:4"},
+    {{"INST1"}, -1918, k1918, nullptr, "sqloPRegProfilePE:5"},
+    {{"INST1"}, -1918, k1918, nullptr, "sqloSwitchToInstallationName:6", true, true}, // the switch back after the check
+};
+// clang-format on
+
+class RefusalScenario : public ScenarioTest, public ::testing::WithParamInterface<Refusal> {};
+
+TEST_P(RefusalScenario, PrintsItsTextAndChangesNothing) {
+  const Refusal &row = GetParam();
+  if (row.setup != nullptr)
+    row.setup(*this);
+  if (!row.catalogs)
+    removeCatalogs();
+  RunSetup setup;
+  setup.faults = row.faults;
+  RunResult r = run(row.args, setup);
+  EXPECT_EQ(r.result, row.result);
+  EXPECT_EQ(r.exitCode, row.result & 0xFF);
+  EXPECT_EQ(r.out, row.out);
+  std::string changed = changes(r);
+  if (row.checkToolRan) {
+    EXPECT_EQ(changed.find("registry"), std::string::npos) << changed;
+    EXPECT_TRUE(kxltest::eventsOf(r, "audit").empty()) << "nothing was upgraded";
+  } else {
+    EXPECT_EQ(changed, "");
+    EXPECT_TRUE(r.events.empty()) << "the database check never ran";
+  }
 }
 
-// The level check of the instance's copy comes first, so an instance of the
-// current copy is reported as such only by a current copy below 9.7.
-TEST_F(CheckScenario, InstanceOfTheCurrentCopyIsLeftAlone) {
-  setCopyLevel("KXL101", 9, 6);
-  addInstance("NEWINST", "KXL101", std::string(kCurrentCopy) + "\\NEWINST", 10, 1);
-  RunResult r = run({"NEWINST"});
-  EXPECT_EQ(r.out, kxltest::alreadyUpgradedText("NEWINST"));
-  EXPECT_EQ(r.result, 1950);
-  EXPECT_EQ(changes(r), "");
-}
+INSTANTIATE_TEST_SUITE_P(Rows, RefusalScenario, ::testing::ValuesIn(kRefusals));
 
-TEST_F(CheckScenario, CopyVersionsOutsideTheUpgradeRangeAreRefused) {
-  setCopyLevel("KXL95", 9, 7);
-  RunResult r97 = run({"INST1"});
-  EXPECT_EQ(r97.out, kxltest::badVersionText("INST1"));
-  EXPECT_EQ(r97.result, -1949);
-  EXPECT_EQ(changes(r97), "");
-
-  setCopyLevel("KXL95", 10, 1);
-  EXPECT_EQ(run({"INST1"}).result, -1949);
-
-  setCopyLevel("KXL95", 9, 5);
-  setCopyLevel("KXL101", 8, 2);
-  RunResult current = run({"INST1"});
-  EXPECT_EQ(current.out, kxltest::badVersionText("INST1"));
-  EXPECT_EQ(current.result, -1949);
-  RunResult installer = run({"-install", "INST1"});
-  EXPECT_EQ(installer.out, kxltest::badVersionText("INST1"))
-      << "a current copy below 9 is refused to installers too";
-  EXPECT_EQ(installer.result, 2);
-}
+using CheckScenario = ScenarioTest;
 
 // A copy's version that cannot be read is never taken for version 0, which
 // would let an instance of a newer copy through or refuse the current copy.
@@ -79,54 +161,8 @@ TEST_F(CheckScenario, CopyVersionThatCannotBeReadEndsTheRunUnchanged) {
   EXPECT_EQ(run({"INST1"}).result, 0);
 }
 
-TEST_F(CheckScenario, InstanceReservedByTheGlobalProfileIsRefused) {
-  world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\GLOBAL_PROFILE",
-                  "KXLRESERVEDINST", "inst1");
-  RunResult r = run({"INST1"});
-  EXPECT_EQ(r.out, kxltest::kReservedText);
-  EXPECT_EQ(r.result, -1139);
-  EXPECT_EQ(changes(r), "");
-  setToolExit(7);
-  EXPECT_EQ(run({"INST2", "-u", "a,b"}).result, -1069) << "only the reserved name is refused";
-}
-
-TEST_F(CheckScenario, NonAdministratorIsNamedAndNothingChanges) {
-  world.setDword(localMachine(), kIdentity, "LocalAdmin", 0x01);
-  world.setString(localMachine(), kIdentity, "AuthId", "JDOE");
-  RunResult r = run({"INST1"});
-  EXPECT_EQ(r.out, kxltest::notAdminText("JDOE"));
-  EXPECT_EQ(r.result, -1);
-  EXPECT_EQ(changes(r), "");
-  EXPECT_TRUE(r.events.empty()) << "the database check never ran";
-
-  removeCatalogs();
-  EXPECT_EQ(run({"INST1"}).out, "KXLIMIGR:processing complete, SQLCODE=-1092\n");
-}
-
-TEST_F(CheckScenario, PartitionedInstanceNeedsAccountNameAndPassword) {
-  EXPECT_EQ(run({"INST2"}).out, kxltest::kUsageText);
-  RunResult nameOnly = run({"-u", "kxlsvc", "INST2"});
-  EXPECT_EQ(nameOnly.out, kxltest::kUsageText);
-  EXPECT_EQ(nameOnly.result, -1946);
-  EXPECT_EQ(changes(nameOnly), "");
-}
-
-TEST_F(CheckScenario, ActiveInstanceIsRefusedBeforeTheCheckTool) {
-  world.setDword(localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1", "State", 4);
-  RunResult single = run({"INST1"});
-  EXPECT_EQ(single.out, kxltest::kActiveText);
-  EXPECT_EQ(single.result, -1953);
-  EXPECT_EQ(changes(single), "");
-
-  // Only the second partition runs, on the other machine.
-  world.setDword(kxlsim::remoteMachine("WINSRV2"), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1", "State", 4);
-  RunResult partitioned = run({"-u", "kxlsvc,secret", "INST2"});
-  EXPECT_EQ(partitioned.result, -1953);
-  EXPECT_EQ(changes(partitioned), "");
-}
-
 TEST_F(CheckScenario, CheckToolProblemsNameTheLogFile) {
-  setToolExit(3);
+  setToolExit(*this, 3);
   RunSetup inDir;
   inDir.cwd = "C:\\work\\check";
   RunResult r = run({"INST1"}, inDir);
@@ -143,18 +179,8 @@ TEST_F(CheckScenario, CheckToolProblemsNameTheLogFile) {
   EXPECT_TRUE(kxltest::eventsOf(r, "audit").empty()) << "the run stopped before the upgrade";
 }
 
-TEST_F(CheckScenario, CheckToolFailureNamesToolAndExitCode) {
-  setToolExit(7);
-  RunResult r = run({"INST1"});
-  EXPECT_EQ(r.result, -1069);
-  EXPECT_EQ(r.out, "KXL1069E  The database check program \"kxlckupgrade\" ended with exit code \"7\". The "
-                   "instance was not upgraded.\n");
-  removeCatalogs();
-  EXPECT_EQ(run({"INST1"}).out, "KXLIMIGR:processing complete, RC = -1069\n");
-}
-
 TEST_F(CheckScenario, MessageFileFallsBackToEnglish) {
-  setToolExit(7);
+  setToolExit(*this, 7);
   world.setString(localMachine(), kIdentity, "Language", "fr_FR");
   RunSetup inDir;
   inDir.cwd = "C:\\work";
@@ -167,43 +193,6 @@ TEST_F(CheckScenario, MessageFileFallsBackToEnglish) {
   run({"INST1"}, inDir);
   EXPECT_EQ(kxltestsupport::readHostFile(copied),
             kxltestsupport::readHostFile(std::string(KXL_MESSAGE_SOURCES) + "/de_DE/KXLDBMIG.TXT"));
-}
-
-// A failed read of which installation is current, or a switch between the
-// installations that fails either way, ends the run before anything changes:
-// profile reads in the wrong installation would otherwise take the old copy
-// for the current one.
-TEST_F(CheckScenario, InstallationThatCannotBeNamedOrSwitchedEndsTheRunUnchanged) {
-  struct Case {
-    const char *faults;
-    bool checkToolRan; // the switch back after the database check failed
-  } cases[] = {
-      {"sqloGetCurrentInstallationName:2", false}, // global profile check
-      {"sqloGetCurrentInstallationName:4", false}, // binding the instance
-      {"sqloGetCurrentInstallationName:5", false}, // database check
-      {"sqloSwitchToInstallationName:1", false},
-      {"sqloSwitchToInstallationName:2", false},
-      {"sqloSwitchToInstallationName:3", false},
-      {"sqloSwitchToInstallationName:4", false},
-      {"sqloPRegProfilePE:5", false},
-      {"sqloSwitchToInstallationName:6", true},
-  };
-  for (const Case &c : cases) {
-    SCOPED_TRACE(c.faults);
-    RunSetup setup;
-    setup.faults = c.faults;
-    RunResult r = run({"INST1"}, setup);
-    EXPECT_EQ(r.result, -1918);
-    EXPECT_EQ(r.out, "KXL1918E  The installed copies of the product, or the copy this command belongs to, "
-                     "cannot be found.\n");
-    std::string changed = changes(r);
-    if (c.checkToolRan)
-      EXPECT_EQ(changed.find("registry"), std::string::npos) << changed;
-    else
-      EXPECT_EQ(changed, "");
-    EXPECT_TRUE(kxltest::eventsOf(r, "audit").empty()) << "nothing was upgraded";
-  }
-  EXPECT_EQ(run({"INST1"}).result, 0);
 }
 
 // The node type decides which services the instance gets; an instance whose
@@ -249,7 +238,7 @@ TEST_F(CheckScenario, InstanceWithoutAReadableNodeTypeIsRefusedNamingTheFile) {
 // the copy of its explanation must be whole paths there, or the run stops
 // before the tool starts.
 TEST_F(CheckScenario, CurrentDirectoryTooLongForTheCheckIsRefused) {
-  setToolExit(7);
+  setToolExit(*this, 7);
   auto directoryOf = [](std::size_t length) {
     std::string path = "C:";
     while (path.size() < length) {
@@ -280,8 +269,27 @@ TEST_F(CheckScenario, CurrentDirectoryTooLongForTheCheckIsRefused) {
                      "changed.\n");
     EXPECT_EQ(changes(r), "");
   }
-  setToolExit(0);
+  setToolExit(*this, 0);
   EXPECT_EQ(run({"INST1"}).result, 0);
+}
+
+TEST_F(CheckScenario, LegacyNameEndsWithItsWarningButNotAfterUsageErrors) {
+  installCommandAs("kxlimigr.exe");
+  RunSetup legacy;
+  legacy.program = "kxlimigr.exe";
+  RunResult r = run({"nosuch"}, legacy);
+  EXPECT_EQ(r.out, kxltest::unknownInstanceText("NOSUCH") + "\n\n" + kxltest::kLegacyText);
+  EXPECT_EQ(r.result, 1951);
+
+  RunResult quiet = run({"-q", "nosuch"}, legacy);
+  EXPECT_EQ(quiet.out, "\n\n" + kxltest::kLegacyText) << "the warning is printed in quiet mode too";
+
+  RunResult usage = run({"-?"}, legacy);
+  EXPECT_EQ(usage.out, kxltest::kUsageText) << "the name is not known yet when the command line fails";
+
+  removeCatalogs();
+  RunResult plain = run({"nosuch"}, legacy);
+  EXPECT_EQ(plain.out, "KXLIMIGR:processing complete, RC = 1951\n\n\nKXLIMIGR:syntax warning, RC = 1392\n");
 }
 
 } // namespace

@@ -22,7 +22,7 @@ struct RunSetup {
 };
 
 class ScenarioTest : public CommandWorld {
-protected:
+public:
   static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
 
   // Installs the command with the stand-in driver in place of the real one.
