@@ -13,8 +13,89 @@ using kxltest::eventsOf;
 using kxltest::field;
 using kxltest::RunResult;
 using kxltest::RunSetup;
+using kxltest::ScenarioTest;
+using Fields = std::vector<std::pair<std::string, std::string>>;
 
-class OutcomeScenario : public kxltest::ScenarioTest {
+const std::string kVersionKey = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\CurrentVersion";
+const std::string kProfileKey = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1";
+const Fields kKeptPath = {{"flags", "0x0001"}, {"profile", "C:\\\\Program Files\\\\ZAV\\\\KXL95"}};
+
+void profiles(ScenarioTest &t) {
+  t.world.makeDirectory("C:\\profiles");
+}
+void clustered(ScenarioTest &t) {
+  profiles(t);
+  t.world.setString(localMachine(), kProfileKey, "KXLCLUSTER", "KXLCLUS");
+}
+void checkSays(ScenarioTest &t, DWORD code) {
+  kxlsim::setToolExitCode(t.world, "kxlckupgrade", code);
+}
+void odbcSource(ScenarioTest &t, const char *driver) {
+  kxlsim::addOdbcDataSource(t.world, localMachine(), "Sales", driver);
+}
+
+// A run that reaches the driver: the driver says `driver` (KXLTEST_DRIVER),
+// the run ends with `result` and prints `out`, the driver was handed `handed`.
+struct Reached {
+  std::vector<std::string> args;
+  std::string driver;
+  long long result;
+  std::string out;
+  Fields handed = {};
+  void (*setup)(ScenarioTest &) = nullptr;
+  bool catalogs = true;
+  int checkRuns = -1; // runs of the database check (-1: not counted)
+};
+
+// clang-format off
+const Reached kReached[] = {
+    {{"inst1"}, "", 0, kxltest::kSuccessText, {{"profile", "C:\\\\Program Files\\\\ZAV\\\\KXL101"}, {"flags", "0x0005"},
+     {"copy_path", "C:\\\\Program Files\\\\ZAV\\\\KXL95"}, {"node_type", "1"}, {"kxlinstance", "INST1"}}},
+    {{"INST1"}, "", 0, "KXLIUPGRADE: processing completed successfully.\n", {}, nullptr, false},
+    // -p naming the instance's own profile path, with a trailing backslash: no move.
+    {{"-p", "C:\\Program Files\\ZAV\\KXL95\\", "INST1"}, "", 0, kxltest::kSuccessText, kKeptPath},
+    {{"-p", "C:\\profiles\\", "INST1"}, "", 0, kxltest::kSuccessText, {{"flags", "0x0005"}, {"profile", "C:\\\\profiles"}}, profiles},
+    // A clustered instance keeps its path.
+    {{"INST1"}, "", 0, kxltest::kSuccessText, kKeptPath, clustered},
+    {{"-p", "C:\\profiles", "INST1"}, "", 0, kxltest::kSuccessText, kKeptPath, clustered},
+    {{"SHARED"}, "", 0, kxltest::kSuccessText, {{"profile", "\\\\\\\\FILER\\\\KXLPROF"}, {"flags", "0x0001"}}, [](ScenarioTest &t) {
+       t.addShare("FILER", "KXLPROF");
+       t.addInstance("SHARED", "KXL95", "\\\\FILER\\KXLPROF\\SHARED", 9, 5); }},
+    // 9.6 passes; installers skip the level check of the instance's copy, and the database check.
+    {{"INST1"}, "", 0, kxltest::kSuccessText, {}, [](ScenarioTest &t) { t.world.setString(localMachine(), kVersionKey, "Release", "6"); }},
+    {{"-install", "INST1"}, "", 0, kxltest::kSuccessText, {}, [](ScenarioTest &t) { t.world.setString(localMachine(), kVersionKey, "Release", "7"); }, true, 0},
+    // Installer mode goes on with an instance of the current copy.
+    {{"-install", "NEWINST"}, "", 0, kxltest::kSuccessText, {{"flags", "0x0009"}},
+     [](ScenarioTest &t) { t.addInstance("NEWINST", "KXL101", std::string(ScenarioTest::kCurrentCopy) + "\\NEWINST", 10, 1); }},
+    {{"-u", "kxlsvc,secret", "INST2"}, "", 0, kxltest::kSuccessText, {{"partitioned", "1"}, {"node_type", "4"}, {"ports", "60000:60003"}}},
+    // A port range of one port: the last lies four above it.
+    {{"INST1"}, "", 0, kxltest::kSuccessText, {{"ports", "50000:50004"}},
+     [](ScenarioTest &t) { t.world.setString(localMachine(), kProfileKey, "KXLPORTRANGE", "50000"); }},
+    // Exit codes of the database check that let the upgrade go on.
+    {{"INST1"}, "", 0, kxltest::kSuccessText, {}, [](ScenarioTest &t) { checkSays(t, 0); }, true, 1},
+    {{"INST1"}, "", 0, kxltest::kSuccessText, {}, [](ScenarioTest &t) { checkSays(t, 2); }, true, 1},
+    {{"INST1"}, "", 0, kxltest::kCheckWarningText + kxltest::kSuccessText, {}, [](ScenarioTest &t) { checkSays(t, 1); }},
+    {{"INST1"}, "", 0, "KXLIMIGR:kxlckupgrade warning, RC = 1225\nKXLIUPGRADE: processing completed successfully.\n", {},
+     [](ScenarioTest &t) { checkSays(t, 1); }, false},
+    // The driver's results as reported.
+    {{"INST1"}, "rc=-1969", -1969, "KXL1969E  The instance directory could not be backed up or copied. The instance was not changed.\n"},
+    {{"INST1"}, "rc=1231,old=4,new=1", 1231, "KXL1231W  The instance INST1 of type PARTITIONED cannot be upgraded: the editions "
+                                             "installed in this copy host instances of type STANDALONE only.\n"},
+    {{"INST1"}, "rc=-1,sqlcode=-5005", -1, "SQL5005N  A database manager configuration file cannot be read or written.\n"},
+    {{"-install", "INST1"}, "rc=1231", 1, "KXL1231W  The instance INST1 of type  cannot be upgraded: the editions installed in "
+                                          "this copy host instances of type  only.\n"},
+    {{"-install", "INST1"}, "rc=-1969", 2, "KXL1969E  The instance directory could not be backed up or copied. The instance was not changed.\n"},
+    // Warnings after a success keep the result 0.
+    {{"INST1"}, "reason=17", 0, "KXL1273W  The instance was upgraded, but the text search service could not be configured. "
+                                "Reason code: 17.\nKXLIMIGR:processing completed, RC = 1273\n"},
+    {{"INST1"}, "extra=1225", 0, kxltest::kSuccessText + kxltest::kCheckWarningText},
+    // ODBC data sources of the product's driver ask for recataloguing; others do not.
+    {{"INST1"}, "", 0, kxltest::kSuccessText, {}, [](ScenarioTest &t) { odbcSource(t, "Other Vendor Driver"); }},
+    {{"INST1"}, "", 0, kxltest::kSuccessText + kxltest::kOdbcText, {}, [](ScenarioTest &t) { odbcSource(t, "zav kxl odbc driver - KXL95"); }},
+};
+// clang-format on
+
+class OutcomeScenario : public ScenarioTest {
 protected:
   void SetUp() override {
     ScenarioTest::SetUp();
@@ -33,137 +114,25 @@ protected:
   static bool has(const std::string &line, const std::string &name, const std::string &value) {
     return line.find(field(name, value)) != std::string::npos;
   }
-  // The driver was handed each field with its value.
-  static void expectHanded(const RunResult &r, std::vector<std::pair<std::string, std::string>> fields) {
-    for (const auto &[name, value] : fields)
-      EXPECT_TRUE(has(handedOver(r), name, value)) << handedOver(r);
-  }
 };
 
-TEST_F(OutcomeScenario, SuccessMovesTheProfileUnderTheCurrentCopy) {
-  RunResult r = run({"inst1"});
-  EXPECT_EQ(r.out, kxltest::kSuccessText);
-  EXPECT_EQ(r.result, 0);
-  expectHanded(r, {{"profile", "C:\\\\Program Files\\\\ZAV\\\\KXL101"},
-                   {"flags", "0x0005"},
-                   {"copy_path", "C:\\\\Program Files\\\\ZAV\\\\KXL95"},
-                   {"node_type", "1"},
-                   {"kxlinstance", "INST1"}});
+class ReachedScenario : public OutcomeScenario, public ::testing::WithParamInterface<Reached> {};
 
-  removeCatalogs();
-  EXPECT_EQ(run({"INST1"}).out, "KXLIUPGRADE: processing completed successfully.\n");
+TEST_P(ReachedScenario, DriverIsHandedTheRunAndItsResultReported) {
+  const Reached &row = GetParam();
+  if (row.setup != nullptr)
+    row.setup(*this);
+  if (!row.catalogs)
+    removeCatalogs();
+  RunResult r = run(row.args, driverSays(row.driver));
+  EXPECT_EQ(r.result, row.result);
+  EXPECT_EQ(r.out, row.out);
+  for (const auto &[name, value] : row.handed)
+    EXPECT_TRUE(has(handedOver(r), name, value)) << handedOver(r);
+  EXPECT_TRUE(row.checkRuns < 0 || eventsOf(r, "program").size() == static_cast<std::size_t>(row.checkRuns));
 }
 
-TEST_F(OutcomeScenario, ProfilePathRules) {
-  // -p naming the instance's own profile path, with a trailing backslash: no move.
-  const std::vector<std::pair<std::string, std::string>> kept = {
-      {"flags", "0x0001"}, {"profile", "C:\\\\Program Files\\\\ZAV\\\\KXL95"}};
-  expectHanded(run({"-p", std::string(kOldCopy) + "\\", "INST1"}), kept);
-
-  world.makeDirectory("C:\\profiles");
-  expectHanded(run({"-p", "C:\\profiles\\", "INST1"}), {{"flags", "0x0005"}, {"profile", "C:\\\\profiles"}});
-
-  // A clustered instance keeps its path.
-  world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1", "KXLCLUSTER",
-                  "KXLCLUS");
-  for (const std::vector<std::string> &args :
-       {std::vector<std::string>{"INST1"}, std::vector<std::string>{"-p", "C:\\profiles", "INST1"}})
-    expectHanded(run(args), kept);
-}
-
-TEST_F(OutcomeScenario, InstanceOnANetworkShareKeepsItsPath) {
-  addShare("FILER", "KXLPROF");
-  addInstance("SHARED", "KXL95", "\\\\FILER\\KXLPROF\\SHARED", 9, 5);
-  RunResult r = run({"SHARED"});
-  EXPECT_EQ(r.out, kxltest::kSuccessText);
-  expectHanded(r, {{"profile", "\\\\\\\\FILER\\\\KXLPROF"}, {"flags", "0x0001"}});
-}
-
-TEST_F(OutcomeScenario, VersionsThatMayBeUpgraded) {
-  world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\CurrentVersion", "Release",
-                  "6");
-  EXPECT_EQ(run({"INST1"}).out, kxltest::kSuccessText) << "9.6 passes";
-  world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\CurrentVersion", "Release",
-                  "7");
-  RunResult installer = run({"-install", "INST1"});
-  EXPECT_EQ(installer.out, kxltest::kSuccessText) << "installers skip the level check of the instance's copy";
-  EXPECT_EQ(installer.result, 0);
-  EXPECT_TRUE(eventsOf(installer, "program").empty()) << "and the database check";
-}
-
-TEST_F(OutcomeScenario, InstallerModeGoesOnWithAnInstanceOfTheCurrentCopy) {
-  addInstance("NEWINST", "KXL101", std::string(kCurrentCopy) + "\\NEWINST", 10, 1);
-  RunResult r = run({"-install", "NEWINST"});
-  EXPECT_EQ(r.out, kxltest::kSuccessText);
-  EXPECT_EQ(r.result, 0);
-  expectHanded(r, {{"flags", "0x0009"}});
-}
-
-TEST_F(OutcomeScenario, PartitionedInstanceWithAccountReachesTheDriver) {
-  RunResult r = run({"-u", "kxlsvc,secret", "INST2"});
-  EXPECT_EQ(r.out, kxltest::kSuccessText);
-  expectHanded(r, {{"partitioned", "1"}, {"node_type", "4"}, {"ports", "60000:60003"}});
-  // A port range of one port: the last lies four above it.
-  world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1",
-                  "KXLPORTRANGE", "50000");
-  EXPECT_TRUE(has(handedOver(run({"INST1"})), "ports", "50000:50004"));
-}
-
-TEST_F(OutcomeScenario, CheckToolExitCodesThatLetTheUpgradeGoOn) {
-  for (DWORD code : {0u, 2u}) {
-    kxlsim::setToolExitCode(world, "kxlckupgrade", code);
-    RunResult r = run({"INST1"});
-    EXPECT_EQ(r.out, kxltest::kSuccessText) << code;
-    EXPECT_EQ(eventsOf(r, "program").size(), 1u) << code;
-  }
-  kxlsim::setToolExitCode(world, "kxlckupgrade", 1);
-  EXPECT_EQ(run({"INST1"}).out, kxltest::kCheckWarningText + kxltest::kSuccessText);
-  removeCatalogs();
-  EXPECT_EQ(run({"INST1"}).out, "KXLIMIGR:kxlckupgrade warning, RC = 1225\n"
-                                "KXLIUPGRADE: processing completed successfully.\n");
-}
-
-TEST_F(OutcomeScenario, DriverResultsAreReported) {
-  RunResult failed = run({"INST1"}, driverSays("rc=-1969"));
-  EXPECT_EQ(failed.result, -1969);
-  EXPECT_EQ(failed.out, "KXL1969E  The instance directory could not be backed up or copied. The instance was "
-                        "not changed.\n");
-
-  RunResult edition = run({"INST1"}, driverSays("rc=1231,old=4,new=1"));
-  EXPECT_EQ(edition.result, 1231);
-  EXPECT_EQ(edition.out, "KXL1231W  The instance INST1 of type PARTITIONED cannot be upgraded: the editions "
-                         "installed in this copy host instances of type STANDALONE only.\n");
-
-  RunResult status = run({"INST1"}, driverSays("rc=-1,sqlcode=-5005"));
-  EXPECT_EQ(status.result, -1);
-  EXPECT_EQ(status.out, "SQL5005N  A database manager configuration file cannot be read or written.\n");
-
-  RunResult installer = run({"-install", "INST1"}, driverSays("rc=1231"));
-  EXPECT_EQ(installer.result, 1);
-  EXPECT_EQ(run({"-install", "INST1"}, driverSays("rc=-1969")).result, 2);
-}
-
-TEST_F(OutcomeScenario, WarningsAfterASuccessKeepExitCodeZero) {
-  RunResult textSearch = run({"INST1"}, driverSays("reason=17"));
-  EXPECT_EQ(textSearch.result, 0);
-  EXPECT_EQ(textSearch.out, "KXL1273W  The instance was upgraded, but the text search service could not be "
-                            "configured. Reason code: 17.\n"
-                            "KXLIMIGR:processing completed, RC = 1273\n");
-
-  RunResult extra = run({"INST1"}, driverSays("extra=1225"));
-  EXPECT_EQ(extra.out, kxltest::kSuccessText + kxltest::kCheckWarningText);
-  EXPECT_EQ(extra.result, 0);
-}
-
-TEST_F(OutcomeScenario, OdbcSourcesOfTheProductDriverAskForRecataloguing) {
-  EXPECT_EQ(run({"INST1"}).out, kxltest::kSuccessText) << "no data sources";
-  kxlsim::addOdbcDataSource(world, localMachine(), "Reports", "Other Vendor Driver");
-  EXPECT_EQ(run({"INST1"}).out, kxltest::kSuccessText) << "only other drivers";
-  kxlsim::addOdbcDataSource(world, localMachine(), "Sales", "zav kxl odbc driver - KXL95");
-  RunResult r = run({"INST1"});
-  EXPECT_EQ(r.out, kxltest::kSuccessText + kxltest::kOdbcText);
-  EXPECT_EQ(r.result, 0);
-}
+INSTANTIATE_TEST_SUITE_P(Rows, ReachedScenario, ::testing::ValuesIn(kReached));
 
 TEST_F(OutcomeScenario, MachineWithoutOdbcCompletesNormally) {
   kxlsim::addOdbcDataSource(world, localMachine(), "Sales", "ZAV KXL ODBC DRIVER - KXL95");
