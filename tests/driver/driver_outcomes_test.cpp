@@ -8,13 +8,6 @@
 namespace drivertest {
 namespace {
 
-uint32_t littleEndian(const std::string &bytes, std::size_t at, std::size_t count) {
-  uint32_t value = 0;
-  for (std::size_t i = count; i-- > 0;)
-    value = value << 8 | static_cast<unsigned char>(bytes[at + i]);
-  return value;
-}
-
 class DriverOutcomeTest : public DriverTest {
 protected:
   // Leaves the current copy with `keep` (product codes) of its products, and
@@ -30,26 +23,50 @@ protected:
     kxlsim::registerInstalledProduct(world, {code, productCode, "product"}, std::string(kCurrentCopy) + "\\",
                                      "10.1.0.0");
   }
-
-  // 1231 at `probe`, the message naming the instance's type and the type the
-  // copy's last-ranked product hosts; nothing copied.
-  void expectEditionMismatch(const Outcome &outcome, long long probe, const std::string &tokens) {
-    expectFailure(outcome, probe, 1231);
-    EXPECT_NE(outcome.out.find(tokens), std::string::npos) << outcome.out;
-    EXPECT_FALSE(exists(kNewInstanceDir));
-  }
 };
 
-TEST_F(DriverOutcomeTest, CopyWithoutServerEditionCannotHostAStandaloneInstance) {
-  // The client packages host no instance (-1): the second type has no word.
-  setProducts({"cli", "zqc"});
-  Outcome outcome = run({"INST1"});
-  expectEditionMismatch(outcome, 17, "type STANDALONE cannot");
-  EXPECT_NE(outcome.out.find("type  only"), std::string::npos) << outcome.out;
-  EXPECT_EQ(outcome.exitCode, 1231 & 0xFF);
-  EXPECT_TRUE(keyExists(profileKey("KXL95", "INST1")));
-  setProducts({});
-  expectEditionMismatch(run({"INST1"}), 17, "type STANDALONE cannot");
+// 1231 at `probe`, the message naming the instance's type and the type the
+// copy's last-ranked product hosts; nothing copied, the profile where it was.
+TEST_F(DriverOutcomeTest, EditionThatCannotHostTheInstanceIsRefused) {
+  const struct {
+    std::vector<std::string> keep;
+    const char *code, *productCode;
+    std::vector<std::string> args;
+    long long probe;
+    const char *instanceType, *hostedType;
+  } cases[] = {
+      // The client packages host no instance (-1): the second type has no word.
+      {{"cli", "zqc"}, "", "", {"INST1"}, 17, "STANDALONE", ""},
+      {{}, "", "", {"INST1"}, 17, "STANDALONE", ""},
+      // The Talven edition hosts node type 3.
+      {{},
+       "tlv",
+       "{6E1C2A45-9F3B-4D21-8A10-5B2C7D0E9A01}",
+       {"-install", "-u", "KXLADMIN,secret", "INST2"},
+       12,
+       "PARTITIONED",
+       "SERVER"},
+      {{}, "sol", "{6E1C2A46-9F3B-4D21-8A10-5B2C7D0E9A01}", {"INST1"}, 17, "STANDALONE", "SERVER"},
+  };
+  for (const auto &c : cases) {
+    SCOPED_TRACE(std::string(c.code) + " " + c.args.back());
+    resetWorld();
+    setProducts(c.keep, c.code, c.productCode);
+    Outcome outcome = run(c.args);
+    expectFailure(outcome, c.probe, 1231);
+    EXPECT_EQ(outcome.exitCode, c.args.front() == "-install" ? 1 : (1231 & 0xFF));
+    EXPECT_NE(outcome.out.find(std::string("type ") + c.instanceType + " cannot"), std::string::npos)
+        << outcome.out;
+    EXPECT_NE(outcome.out.find(std::string("type ") + c.hostedType + " only"), std::string::npos)
+        << outcome.out;
+    EXPECT_FALSE(exists(kNewInstanceDir));
+    EXPECT_TRUE(keyExists(profileKey("KXL95", c.args.back())));
+  }
+  // The Solent edition hosts server instances.
+  Outcome server = run({"V8INST"});
+  ASSERT_TRUE(server.driverRan) << server.out << server.err;
+  for (const DriverFailure &failure : server.failures)
+    EXPECT_NE(failure.probe, 15);
 }
 
 // A refusal is a run that did not upgrade: audited as a failure with its code,
@@ -86,99 +103,82 @@ TEST_F(DriverOutcomeTest, OdbcScanEndsWhateverTheDriverManagerAnswers) {
   }
 }
 
-TEST_F(DriverOutcomeTest, PartitionedInstanceNeedsAPartitionedEdition) {
-  setProducts({}, "tlv", "{6E1C2A45-9F3B-4D21-8A10-5B2C7D0E9A01}");
-  Outcome outcome = run({"-install", "-u", "KXLADMIN,secret", "INST2"});
-  // The Talven edition hosts node type 3.
-  expectEditionMismatch(outcome, 12, "type PARTITIONED cannot");
-  EXPECT_NE(outcome.out.find("type SERVER only"), std::string::npos) << outcome.out;
-}
-
-TEST_F(DriverOutcomeTest, SolentEditionHostsServerButNotStandaloneInstances) {
-  setProducts({}, "sol", "{6E1C2A46-9F3B-4D21-8A10-5B2C7D0E9A01}");
-  Outcome standalone = run({"INST1"});
-  expectEditionMismatch(standalone, 17, "type STANDALONE cannot");
-  EXPECT_NE(standalone.out.find("type SERVER only"), std::string::npos) << standalone.out;
-  Outcome server = run({"V8INST"});
-  ASSERT_TRUE(server.driverRan) << server.out << server.err;
-  for (const DriverFailure &failure : server.failures)
-    EXPECT_NE(failure.probe, 15);
-}
-
-TEST_F(DriverOutcomeTest, MissingOptionalFilesAndCleanupFailureDoNotFailTheUpgrade) {
-  // Without the four carried files, and without their cfg and bin folders, the
-  // copies report a missing file or a missing folder, which both count as done.
-  for (const char *carried : {"\\cfg", "\\bin", "\\kxlmd_config.xml"})
-    removeTree(std::string(kOldInstanceDir) + carried);
-  kxlsim::setToolExitCode(world, "kxlset", 9);
-  Outcome outcome = run({"INST1"});
-  EXPECT_TRUE(outcome.failures.empty()) << outcome.trace;
-  EXPECT_EQ(outcome.driverResult, 0) << outcome.out << outcome.err;
-  EXPECT_EQ(outcome.exitCode, 0);
-  EXPECT_FALSE(exists(std::string(kNewInstanceDir) + "\\cfg\\kxldj.ini"));
-}
-
-// The backup, the audit settings' copy and the run's record go; a removal that
-// fails once is retried, a lasting failure is named in the log, never undone.
-TEST_F(DriverOutcomeTest, LeftoversOfACompletedUpgradeAreRemovedOrNamed) {
+// A completed upgrade stays completed: optional files that are missing, a
+// clean-up tool that fails or cannot start, an audit that fails. Its
+// leftovers (the backup, the audit settings' copy, the run's record) go; a
+// removal that fails once is retried, a lasting failure is named in the log,
+// never undone. A rerun finds the instance on the current copy.
+TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
   const std::string auditCopy = std::string(kNewInstanceDir) + "\\security\\kxlauditcopy.cfg";
   const std::string record = std::string(kCurrentCopy) + "\\CFG\\kxliupgrade-INST1.run";
-  struct Case {
+  using Setup = void (*)(DriverOutcomeTest &);
+  const Setup audited = [](DriverOutcomeTest &t) {
+    t.world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
+                      "active = yes\ninstance = both\n");
+  };
+  const struct {
+    std::vector<std::string> args;
     const char *fault;
     bool backupKept;
     std::string fileKept; // "" none
+    Setup setup;
+    const char *shown, *logged; // in the output and the diagnostic log
   } cases[] = {
-      {"FindNextFileA:93", false, ""}, // the last listing of the backup's removal
-      {"sqlodeletedir:1", false, ""},  {"sqlodeletedir:1,sqlodeletedir:2", true, ""},
-      {"sqlodelete:1", false, ""},     {"sqlodelete:1,sqlodelete:2", false, auditCopy},
-      {"DeleteFileA:8", false, ""},    {"DeleteFileA:8,DeleteFileA:9", false, record},
+      // Without the four carried files, and without their cfg and bin folders,
+      // the copies report a missing file or folder, which both count as done.
+      {{"INST1"},
+       "",
+       false,
+       "",
+       [](DriverOutcomeTest &t) {
+         for (const char *carried : {"\\cfg", "\\bin", "\\kxlmd_config.xml"})
+           t.removeTree(std::string(kOldInstanceDir) + carried);
+         kxlsim::setToolExitCode(t.world, "kxlset", 9);
+       },
+       "",
+       ""},
+      // Installer mode: the audit, SSL and clean-up tools are the run's programs.
+      {{"-install", "INST1"}, "sqloexec2:3", false, "", nullptr, "", ""},
+      {{"INST1"}, "FindNextFileA:93", false, "", nullptr, "", ""}, // the last listing of the backup's removal
+      {{"INST1"}, "sqlodeletedir:1", false, "", nullptr, "", ""},
+      {{"INST1"}, "sqlodeletedir:1,sqlodeletedir:2", true, "", nullptr, "", "could not be removed"},
+      {{"INST1"}, "sqlodelete:1", false, "", nullptr, "", ""},
+      {{"INST1"}, "sqlodelete:1,sqlodelete:2", false, auditCopy, nullptr, "", "could not be removed"},
+      {{"INST1"}, "DeleteFileA:8", false, "", nullptr, "", ""},
+      {{"INST1"}, "DeleteFileA:8,DeleteFileA:9", false, record, nullptr, "", "could not be removed"},
+      // The audit comes after the instance has moved: its failure is shown and logged.
+      {{"INST1"}, "logEvent:1", false, "", audited, "1042", "audit record was not written"},
+      {{"INST1"},
+       "sqlexAuditGetInstanceSettings:1",
+       false,
+       "",
+       audited,
+       "1042",
+       "audit record was not written"},
   };
-  for (const Case &c : cases) {
+  for (const auto &c : cases) {
     SCOPED_TRACE(c.fault);
     resetWorld();
-    Outcome outcome = run({"INST1"}, c.fault);
+    if (c.setup != nullptr)
+      c.setup(*this);
+    Outcome outcome = run(c.args, c.fault);
     EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
+    EXPECT_EQ(outcome.driverResult, 0);
     EXPECT_TRUE(outcome.failures.empty()) << outcome.trace;
+    EXPECT_TRUE(keyExists(profileKey("KXL101", "INST1")));
     EXPECT_EQ(stringValue("SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1", "Copy"), "KXL101");
     EXPECT_EQ(hasBackup(), c.backupKept);
     for (const std::string &file : {auditCopy, record})
       EXPECT_EQ(exists(file), file == c.fileKept) << file;
-    bool named = c.backupKept || !c.fileKept.empty();
+    EXPECT_NE(outcome.out.find("KXL1000I"), std::string::npos) << outcome.out;
+    EXPECT_NE(outcome.out.find(c.shown), std::string::npos) << outcome.out;
+    EXPECT_NE(outcome.diagnostics.find(c.logged), std::string::npos) << outcome.diagnostics;
+    bool named = std::string(c.logged) == "could not be removed";
     EXPECT_EQ(outcome.diagnostics.find("could not be removed") != std::string::npos, named)
         << outcome.diagnostics;
-    if (!c.fileKept.empty()) {
-      std::string name = c.fileKept.substr(c.fileKept.rfind('\\'));
-      EXPECT_NE(outcome.diagnostics.find(name), std::string::npos) << outcome.diagnostics;
-    }
+    EXPECT_NE(outcome.diagnostics.find(c.fileKept.substr(c.fileKept.rfind('\\') + 1)), std::string::npos);
     EXPECT_EQ(run({"-q", "INST1"}).exitCode, -1949 & 0xFF) << "a rerun finds it on the current copy";
     EXPECT_FALSE(exists(record));
-  }
-}
-
-TEST_F(DriverOutcomeTest, CleanupRunThatCannotStartDoesNotChangeTheResult) {
-  // Installer mode: the audit, SSL and clean-up tools are the run's programs.
-  Outcome outcome = run({"-install", "INST1"}, "sqloexec2:3");
-  EXPECT_TRUE(outcome.failures.empty()) << outcome.trace;
-  EXPECT_EQ(outcome.driverResult, 0) << outcome.out << outcome.err;
-}
-
-// The audit comes after the instance has moved, so its failure is shown and
-// logged but cannot make the completed upgrade a failure.
-TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompletedWhenItsAuditFails) {
-  for (const char *fault : {"logEvent:1", "sqlexAuditGetInstanceSettings:1"}) {
-    SCOPED_TRACE(fault);
-    resetWorld();
-    world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
-                    "active = yes\ninstance = both\n");
-    Outcome outcome = run({"INST1"}, fault);
-    EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
-    EXPECT_EQ(outcome.driverResult, 0);
-    EXPECT_TRUE(keyExists(profileKey("KXL101", "INST1")));
-    EXPECT_NE(outcome.out.find("KXL1000I"), std::string::npos) << outcome.out;
-    EXPECT_NE(outcome.out.find("1042"), std::string::npos) << "the audit failure is shown: " << outcome.out;
-    EXPECT_NE(outcome.diagnostics.find("audit record was not written"), std::string::npos)
-        << outcome.diagnostics;
-    EXPECT_EQ(run({"-q", "INST1"}).exitCode, -1949 & 0xFF) << "a rerun finds it on the current copy";
   }
 }
 
@@ -209,8 +209,8 @@ TEST_F(DriverOutcomeTest, QuotedProfilePathKeepsItsQuotes) {
   // kxlsystm converted to the current layout: release word and level.
   std::string image = fileContent("C:\\Quoted Profiles\\INST1\\kxlsystm");
   ASSERT_EQ(image.size(), 16384u);
-  EXPECT_EQ(littleEndian(image, 16, 2), 0x0D00u);
-  EXPECT_EQ(littleEndian(image, 20, 4), 10100u);
+  EXPECT_EQ(image.substr(16, 2), std::string("\0\x0D", 2));
+  EXPECT_EQ(image.substr(20, 4), std::string("\x74\x27\0\0", 4)); // 10100
   EXPECT_FALSE(exists("C:\\Quoted Profiles\\INST1\\security\\kxlauditcopy.cfg"));
   EXPECT_TRUE(exists("C:\\Quoted Profiles\\INST1\\security\\kxlaudit.cfg"));
   EXPECT_FALSE(exists(kNewInstanceDir));
