@@ -28,6 +28,7 @@ protected:
 // 1231 at `probe`, the message naming the instance's type and the type the
 // copy's last-ranked product hosts; nothing copied, the profile where it was.
 TEST_F(DriverOutcomeTest, EditionThatCannotHostTheInstanceIsRefused) {
+  // clang-format off
   const struct {
     std::vector<std::string> keep;
     const char *code, *productCode;
@@ -39,15 +40,10 @@ TEST_F(DriverOutcomeTest, EditionThatCannotHostTheInstanceIsRefused) {
       {{"cli", "zqc"}, "", "", {"INST1"}, 17, "STANDALONE", ""},
       {{}, "", "", {"INST1"}, 17, "STANDALONE", ""},
       // The Talven edition hosts node type 3.
-      {{},
-       "tlv",
-       "{6E1C2A45-9F3B-4D21-8A10-5B2C7D0E9A01}",
-       {"-install", "-u", "KXLADMIN,secret", "INST2"},
-       12,
-       "PARTITIONED",
-       "SERVER"},
+      {{}, "tlv", "{6E1C2A45-9F3B-4D21-8A10-5B2C7D0E9A01}", {"-install", "-u", "KXLADMIN,secret", "INST2"}, 12, "PARTITIONED", "SERVER"},
       {{}, "sol", "{6E1C2A46-9F3B-4D21-8A10-5B2C7D0E9A01}", {"INST1"}, 17, "STANDALONE", "SERVER"},
   };
+  // clang-format on
   for (const auto &c : cases) {
     SCOPED_TRACE(std::string(c.code) + " " + c.args.back());
     resetWorld();
@@ -116,6 +112,7 @@ TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
     t.world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
                       "active = yes\ninstance = both\n");
   };
+  // clang-format off
   const struct {
     std::vector<std::string> args;
     const char *fault;
@@ -126,17 +123,10 @@ TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
   } cases[] = {
       // Without the four carried files, and without their cfg and bin folders,
       // the copies report a missing file or folder, which both count as done.
-      {{"INST1"},
-       "",
-       false,
-       "",
-       [](DriverOutcomeTest &t) {
+      {{"INST1"}, "", false, "", [](DriverOutcomeTest &t) {
          for (const char *carried : {"\\cfg", "\\bin", "\\kxlmd_config.xml"})
            t.removeTree(std::string(kOldInstanceDir) + carried);
-         kxlsim::setToolExitCode(t.world, "kxlset", 9);
-       },
-       "",
-       ""},
+         kxlsim::setToolExitCode(t.world, "kxlset", 9); }, "", ""},
       // Installer mode: the audit, SSL and clean-up tools are the run's programs.
       {{"-install", "INST1"}, "sqloexec2:3", false, "", nullptr, "", ""},
       {{"INST1"}, "FindNextFileA:93", false, "", nullptr, "", ""}, // the last listing of the backup's removal
@@ -148,14 +138,9 @@ TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
       {{"INST1"}, "DeleteFileA:8,DeleteFileA:9", false, record, nullptr, "", "could not be removed"},
       // The audit comes after the instance has moved: its failure is shown and logged.
       {{"INST1"}, "logEvent:1", false, "", audited, "1042", "audit record was not written"},
-      {{"INST1"},
-       "sqlexAuditGetInstanceSettings:1",
-       false,
-       "",
-       audited,
-       "1042",
-       "audit record was not written"},
+      {{"INST1"}, "sqlexAuditGetInstanceSettings:1", false, "", audited, "1042", "audit record was not written"},
   };
+  // clang-format on
   for (const auto &c : cases) {
     SCOPED_TRACE(c.fault);
     resetWorld();

@@ -39,6 +39,40 @@ const std::string k1069 =
     "KXL1069E  The database check program \"kxlckupgrade\" ended with exit code \"7\". The instance was not "
     "upgraded.\n";
 
+const std::string kSystm = std::string(ScenarioTest::kOldCopy) + "\\INST1\\kxlsystm";
+const std::string k1926 = "KXL1926E  The node type of the instance cannot be read from its database manager "
+                          "configuration file \"" +
+                          kSystm + "\". The instance was not changed.\n";
+const std::string k1927 =
+    "KXL1927E  The current directory is too long to hold the files of the database check. "
+    "Run the command from a directory with a shorter path. The instance was not changed.\n";
+
+// kxlsystm cut to `size` bytes (0: empty), or with the node type `type`.
+template <std::size_t size, uint8_t type = 1> void systm(ScenarioTest &t) {
+  std::vector<uint8_t> image;
+  ASSERT_TRUE(kxlsim::readFileHead(kSystm, 1 << 20, image));
+  image.resize(std::min(image.size(), size));
+  if (image.size() > 41)
+    image[40] = type, image[41] = 0;
+  t.world.writeFile(kSystm, image);
+}
+
+// A release that cannot be read.
+template <const char *copy> void unreadableRelease(ScenarioTest &t) {
+  t.world.setString(localMachine(),
+                    std::string("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\") + copy + "\\CurrentVersion",
+                    "Release", std::string(300, '7'));
+}
+constexpr char kOld[] = "KXL95", kCurrent[] = "KXL101";
+
+// A directory of `length` characters on drive C:.
+std::string directoryOf(std::size_t length) {
+  std::string path = "C:";
+  while (path.size() < length)
+    path += "\\" + std::string(std::min<std::size_t>(length - path.size() - 1, 100), 'd');
+  return path;
+}
+
 struct Refusal {
   std::vector<std::string> args;
   long long result;
@@ -47,6 +81,7 @@ struct Refusal {
   const char *faults = "";
   bool catalogs = true;
   bool checkToolRan = false; // its files are left; the registry is as it was
+  std::string cwd = "C:\\";
 };
 
 // clang-format off
@@ -111,6 +146,25 @@ const Refusal kRefusals[] = {
     {{"INST1"}, -1918, k1918, nullptr, "sqloSwitchToInstallationName:4"},
     {{"INST1"}, -1918, k1918, nullptr, "sqloPRegProfilePE:5"},
     {{"INST1"}, -1918, k1918, nullptr, "sqloSwitchToInstallationName:6", true, true}, // the switch back after the check
+    // A copy's version that cannot be read is never taken for version 0, which
+    // would let an instance of a newer copy through or refuse the current copy.
+    {{"INST1"}, -1918, k1918, unreadableRelease<kOld>},
+    {{"INST1"}, -1918, k1918, unreadableRelease<kCurrent>},
+    // The node type decides which services the instance gets; an instance
+    // whose kxlsystm gives none is refused before anything changes.
+    {{"INST1"}, -1926, k1926, systm<0>},
+    {{"INST1"}, -1926, k1926, systm<41>}, // cut before the node type
+    {{"INST1"}, -1926, k1926, systm<1 << 20, 0>},
+    {{"INST1"}, -1926, k1926, systm<1 << 20, 6>},
+    {{"INST1"}, -1926, k1926, nullptr, "sqloopenp:4"},
+    {{"INST1"}, -1926, k1926, nullptr, "sqloread:5"},
+    // The check tool works in the current directory: its log-file argument and
+    // the copy of its explanation must be whole paths there, or the run stops
+    // before the tool starts.
+    {{"INST1"}, -1069, k1069, [](ScenarioTest &t) { setToolExit(t, 7); }, "", true, true, directoryOf(246)},
+    {{"INST1"}, -1927, k1927, nullptr, "", true, false, directoryOf(247)},
+    {{"INST1"}, -1927, k1927, nullptr, "", true, false, directoryOf(254)},
+    {{"INST1"}, -1927, k1927, nullptr, "", true, false, directoryOf(300)},
 };
 // clang-format on
 
@@ -124,6 +178,7 @@ TEST_P(RefusalScenario, PrintsItsTextAndChangesNothing) {
     removeCatalogs();
   RunSetup setup;
   setup.faults = row.faults;
+  setup.cwd = row.cwd;
   RunResult r = run(row.args, setup);
   EXPECT_EQ(r.result, row.result);
   EXPECT_EQ(r.exitCode, row.result & 0xFF);
@@ -141,25 +196,6 @@ TEST_P(RefusalScenario, PrintsItsTextAndChangesNothing) {
 INSTANTIATE_TEST_SUITE_P(Rows, RefusalScenario, ::testing::ValuesIn(kRefusals));
 
 using CheckScenario = ScenarioTest;
-
-// A copy's version that cannot be read is never taken for version 0, which
-// would let an instance of a newer copy through or refuse the current copy.
-TEST_F(CheckScenario, CopyVersionThatCannotBeReadEndsTheRunUnchanged) {
-  struct Case {
-    const char *copy;
-    const char *release;
-  } cases[] = {{"KXL95", "5"}, {"KXL101", "1"}};
-  for (const Case &c : cases) {
-    SCOPED_TRACE(c.copy);
-    std::string key = std::string("SOFTWARE\\ZAV\\KXL\\InstalledCopies\\") + c.copy + "\\CurrentVersion";
-    world.setString(localMachine(), key, "Release", std::string(300, '7'));
-    RunResult r = run({"INST1"});
-    EXPECT_EQ(r.result, -1918);
-    EXPECT_EQ(changes(r), "");
-    world.setString(localMachine(), key, "Release", c.release);
-  }
-  EXPECT_EQ(run({"INST1"}).result, 0);
-}
 
 TEST_F(CheckScenario, CheckToolProblemsNameTheLogFile) {
   setToolExit(*this, 3);
@@ -193,84 +229,6 @@ TEST_F(CheckScenario, MessageFileFallsBackToEnglish) {
   run({"INST1"}, inDir);
   EXPECT_EQ(kxltestsupport::readHostFile(copied),
             kxltestsupport::readHostFile(std::string(KXL_MESSAGE_SOURCES) + "/de_DE/KXLDBMIG.TXT"));
-}
-
-// The node type decides which services the instance gets; an instance whose
-// kxlsystm gives none is refused before anything changes, naming the file.
-TEST_F(CheckScenario, InstanceWithoutAReadableNodeTypeIsRefusedNamingTheFile) {
-  const std::string file = std::string(kOldCopy) + "\\INST1\\kxlsystm";
-  std::vector<uint8_t> image;
-  ASSERT_TRUE(kxlsim::readFileHead(file, 1 << 20, image));
-  auto withNodeType = [&](uint8_t type) {
-    std::vector<uint8_t> changed = image;
-    changed[40] = type;
-    changed[41] = 0;
-    return changed;
-  };
-  struct Case {
-    const char *what;
-    std::vector<uint8_t> content;
-    const char *faults;
-  } cases[] = {
-      {"empty file", {}, ""},
-      {"cut before the node type", std::vector<uint8_t>(image.begin(), image.begin() + 41), ""},
-      {"node type 0", withNodeType(0), ""},
-      {"node type 6", withNodeType(6), ""},
-      {"failed open", image, "sqloopenp:4"},
-      {"failed read", image, "sqloread:5"},
-  };
-  for (const Case &c : cases) {
-    SCOPED_TRACE(c.what);
-    world.writeFile(file, c.content);
-    RunSetup setup;
-    setup.faults = c.faults;
-    RunResult r = run({"INST1"}, setup);
-    EXPECT_EQ(r.result, -1926);
-    EXPECT_EQ(r.out, "KXL1926E  The node type of the instance cannot be read from its database manager "
-                     "configuration file \"" +
-                         file + "\". The instance was not changed.\n");
-    EXPECT_EQ(changes(r), "");
-  }
-  EXPECT_EQ(run({"INST1"}).result, 0) << "the file as it was upgrades";
-}
-
-// The check tool works in the current directory: its log-file argument and
-// the copy of its explanation must be whole paths there, or the run stops
-// before the tool starts.
-TEST_F(CheckScenario, CurrentDirectoryTooLongForTheCheckIsRefused) {
-  setToolExit(*this, 7);
-  auto directoryOf = [](std::size_t length) {
-    std::string path = "C:";
-    while (path.size() < length) {
-      std::size_t part = std::min<std::size_t>(length - path.size() - 1, 100);
-      path += "\\" + std::string(part, 'd');
-    }
-    return path;
-  };
-  struct Case {
-    std::size_t length;
-    bool refused;
-  } cases[] = {{246, false}, {247, true}, {250, true}, {254, true}, {300, true}};
-  for (const Case &c : cases) {
-    SCOPED_TRACE(c.length);
-    RunSetup setup;
-    setup.cwd = directoryOf(c.length);
-    ASSERT_EQ(setup.cwd.size(), c.length);
-    RunResult r = run({"INST1"}, setup);
-    if (!c.refused) {
-      EXPECT_EQ(r.result, -1069);
-      ASSERT_EQ(kxltest::eventsOf(r, "program").size(), 1u);
-      EXPECT_NE(kxltest::eventsOf(r, "program")[0].find("\\\\upgrade.log -t "), std::string::npos);
-      continue;
-    }
-    EXPECT_EQ(r.result, -1927);
-    EXPECT_EQ(r.out, "KXL1927E  The current directory is too long to hold the files of the database check. "
-                     "Run the command from a directory with a shorter path. The instance was not "
-                     "changed.\n");
-    EXPECT_EQ(changes(r), "");
-  }
-  setToolExit(*this, 0);
-  EXPECT_EQ(run({"INST1"}).result, 0);
 }
 
 TEST_F(CheckScenario, LegacyNameEndsWithItsWarningButNotAfterUsageErrors) {
