@@ -6,6 +6,7 @@
 #include "sim/kxlsim/show.h"
 #include "tests/support/command_world.h"
 
+#include <algorithm>
 #include <filesystem>
 #include <functional>
 #include <sstream>
@@ -37,38 +38,21 @@ std::vector<std::string> lines(const std::string &text) {
 }
 
 bool hasLine(const std::string &text, const std::string &line) {
-  for (const std::string &candidate : lines(text))
-    if (candidate == line)
-      return true;
-  return false;
+  std::vector<std::string> all = lines(text);
+  return std::find(all.begin(), all.end(), line) != all.end();
+}
+
+// The lines of `text` that `keep` holds for, each ended with a newline.
+template <typename Keep> std::string linesWhere(const std::string &text, Keep keep) {
+  std::string out;
+  for (const std::string &line : lines(text))
+    out += keep(line) ? line + "\n" : "";
+  return out;
 }
 
 // The registry lines of a diff.
 std::string registryChanges(const std::string &diff) {
-  std::string out;
-  for (const std::string &line : lines(diff))
-    if (line.rfind("registry ", 0) == 0)
-      out += line + "\n";
-  return out;
-}
-
-// The lines of a diff that change a service, its account aside (the one
-// given with -u is written as given).
-std::string serviceChanges(const std::string &diff) {
-  std::string out;
-  for (const std::string &line : lines(diff))
-    if (line.find("\\Services\\") != std::string::npos && line.find("\"ObjectName\"") == std::string::npos)
-      out += line + "\n";
-  return out;
-}
-
-// The step's error lines, "probe=N rc=M" each.
-std::vector<std::string> stepErrors(const std::string &trace) {
-  std::vector<std::string> out;
-  for (const std::string &line : lines(trace))
-    if (line.rfind("error 0x18780509 ", 0) == 0)
-      out.push_back(line.substr(17));
-  return out;
+  return linesWhere(diff, [](const std::string &line) { return line.rfind("registry ", 0) == 0; });
 }
 
 // Everything the upgrade changes, and nothing else (no backup is left in
@@ -132,14 +116,15 @@ TEST_F(DemoE2eTest, SinglePartitionInstanceMovesToTheCurrentCopy) {
   kxltest::CommandOutcome upgrade = runInWorld({"INST1"}, {}, "kxliupgrade.exe", "C:\\");
   EXPECT_EQ(upgrade.exitCode, 0) << upgrade.out << upgrade.err;
   EXPECT_NE(upgrade.out.find("KXLIUPGRADE"), std::string::npos) << upgrade.out;
-  std::string diff = changesSince(before), kept;
+  std::string diff = changesSince(before);
   bool inLog = false;
-  for (const std::string &line : lines(diff)) {
-    if (!line.empty() && line[0] != ' ')
-      inLog = line.rfind("file + kxldiag.log", 0) == 0;
-    kept += inLog ? "" : line + "\n";
-  }
-  EXPECT_EQ(kept, kExpectedChanges);
+  EXPECT_EQ(linesWhere(diff,
+                       [&](const std::string &line) {
+                         inLog =
+                             line.rfind("file + kxldiag.log", 0) == 0 || (inLog && line.rfind(" ", 0) == 0);
+                         return !inLog;
+                       }),
+            kExpectedChanges);
   EXPECT_NE(diff.find("\\INST1 is backed up in C:\\windows\\temp\\KXL"), std::string::npos) << diff;
 }
 
@@ -408,12 +393,23 @@ TEST_P(ClusterStepCase, EndsAsTheStepsLifecycleSaysAndAPlainRunThenSucceeds) {
   kxltest::CommandOutcome run = upgrade(*c.args, c.faults);
   EXPECT_NE(run.trace.find("exit 0x18780509 rc=" + std::to_string(c.result) + "\n"), std::string::npos)
       << run.trace;
-  EXPECT_EQ(stepErrors(run.trace), c.errors);
+  std::string errors;
+  for (const std::string &error : c.errors)
+    errors += "error 0x18780509 " + error + "\n";
+  EXPECT_EQ(
+      linesWhere(run.trace, [](const std::string &line) { return line.rfind("error 0x18780509 ", 0) == 0; }),
+      errors);
   EXPECT_EQ(run.out.find("SQLCODE=0"), std::string::npos) << run.out;
   if (c.result != 0) {
     EXPECT_NE(run.trace.find("error 0x18780502 probe=200 rc=" + std::to_string(c.result)), std::string::npos);
     EXPECT_EQ(run.out.rfind("KXL" + std::to_string(-c.result) + "E", 0), 0u) << run.out;
-    EXPECT_EQ(serviceChanges(changesSince(before)), "") << "every node's services are back";
+    // Every node's services are back, the account given with -u aside (written as given).
+    EXPECT_EQ(linesWhere(changesSince(before),
+                         [](const std::string &line) {
+                           return line.find("\\Services\\") != std::string::npos &&
+                                  line.find("\"ObjectName\"") == std::string::npos;
+                         }),
+              "");
   } else {
     EXPECT_EQ(run.exitCode, 0) << run.out;
   }
