@@ -5,6 +5,7 @@
 #include "scenario_fixture.h"
 
 #include <cstdio>
+#include <filesystem>
 
 namespace {
 
@@ -59,7 +60,7 @@ const Reached kReached[] = {
     {{"INST1"}, "", 0, kxltest::kSuccessText, kKeptPath, clustered},
     {{"-p", "C:\\profiles", "INST1"}, "", 0, kxltest::kSuccessText, kKeptPath, clustered},
     {{"SHARED"}, "", 0, kxltest::kSuccessText, {{"profile", "\\\\\\\\FILER\\\\KXLPROF"}, {"flags", "0x0001"}}, [](ScenarioTest &t) {
-       t.addShare("FILER", "KXLPROF");
+       std::filesystem::create_directories(t.root() + "/unc/FILER/KXLPROF");
        t.addInstance("SHARED", "KXL95", "\\\\FILER\\KXLPROF\\SHARED", 9, 5); }},
     // 9.6 passes; installers skip the level check of the instance's copy, and the database check.
     {{"INST1"}, "", 0, kxltest::kSuccessText, {}, [](ScenarioTest &t) { t.world.setString(localMachine(), kVersionKey, "Release", "6"); }},
@@ -99,7 +100,7 @@ class OutcomeScenario : public ScenarioTest {
 protected:
   void SetUp() override {
     ScenarioTest::SetUp();
-    useStandInDriver();
+    installCommandAs("kxliupgrade.exe");
   }
   static RunSetup driverSays(const std::string &settings) {
     RunSetup setup;

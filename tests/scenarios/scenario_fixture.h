@@ -25,17 +25,20 @@ class ScenarioTest : public CommandWorld {
 public:
   static constexpr const char *kIdentity = "SOFTWARE\\ZAV\\KXLSIM\\Identity";
 
-  // Installs the command with the stand-in driver in place of the real one.
-  void useStandInDriver();
-  // Installs the current command under another name in the current copy's bin.
+  // Installs the command (the one with the stand-in driver for
+  // "kxliupgrade.exe") under `program` in the current copy's bin.
   void installCommandAs(const std::string &program);
   // Removes the message catalogs of every copy.
   void removeCatalogs();
   // Registers an instance of `copy` (at version.release) in `directory`.
   void addInstance(const std::string &name, const std::string &copy, const std::string &directory,
-                   int version, int release);
-  // Makes \\server\share reachable.
-  void addShare(const std::string &server, const std::string &share);
+                   int version, int release) {
+    kxlsim::InstanceSpec spec;
+    spec.name = name, spec.copy = copy, spec.directory = directory, spec.version = version,
+    spec.release = release;
+    kxlsim::addInstance(world, spec);
+    ASSERT_TRUE(world.ok());
+  }
 
   RunResult run(const std::vector<std::string> &args, const RunSetup &setup = RunSetup());
   // What the run changed in the world, as kxlsim diff shows it ("" for nothing).
