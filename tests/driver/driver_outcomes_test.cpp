@@ -47,9 +47,17 @@ TEST_F(DriverOutcomeTest, EditionThatCannotHostTheInstanceIsRefused) {
   for (const auto &c : cases) {
     SCOPED_TRACE(std::string(c.code) + " " + c.args.back());
     resetWorld();
+    world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
+                    "active = yes\nadmin = failure\ninstance = failure\n");
     setProducts(c.keep, c.code, c.productCode);
     Outcome outcome = run(c.args);
     expectFailure(outcome, c.probe, 1231);
+    // A refusal is a run that did not upgrade: audited as a failure with its
+    // code, in the instance's own audit settings (only failures are recorded).
+    std::vector<std::string> audits = kxltest::eventsOf(outcome, "audit");
+    EXPECT_EQ(audits.size(), c.args.back() == "INST1" ? 2u : 0u) << outcome.out;
+    for (const std::string &audit : audits)
+      EXPECT_NE(audit.find("\"sqlcode\":\"1231\""), std::string::npos) << audit;
     EXPECT_EQ(outcome.exitCode, c.args.front() == "-install" ? 1 : (1231 & 0xFF));
     EXPECT_NE(outcome.out.find(std::string("type ") + c.instanceType + " cannot"), std::string::npos)
         << outcome.out;
@@ -65,50 +73,25 @@ TEST_F(DriverOutcomeTest, EditionThatCannotHostTheInstanceIsRefused) {
     EXPECT_NE(failure.probe, 15);
 }
 
-// A refusal is a run that did not upgrade: audited as a failure with its code,
-// in the instance's own audit settings (only failures are recorded here).
-TEST_F(DriverOutcomeTest, RefusedUpgradeIsAuditedAsAFailureWithItsCode) {
-  world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
-                  "active = yes\nadmin = failure\ninstance = failure\n");
-  setProducts({"cli", "zqc"});
-  Outcome refused = run({"INST1"});
-  ASSERT_EQ(refused.driverResult, 1231) << refused.out;
-  std::vector<std::string> audits = kxltest::eventsOf(refused, "audit");
-  ASSERT_EQ(audits.size(), 2u) << refused.out;
-  for (const std::string &audit : audits)
-    EXPECT_NE(audit.find("\"sqlcode\":\"1231\""), std::string::npos) << audit;
+// A driver manager that answers something unexpected to every call (logged).
+template <const char *function, DWORD answer> void odbcAnswers(DriverTest &t) {
+  kxlsim::addOdbcDataSource(t.world, kxlsim::localMachine(), "Sales", "ZAV KXL ODBC DRIVER - KXL95");
+  t.world.setDword(kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Odbc", function, answer);
 }
-
-// A driver manager that answers something unexpected to every call cannot
-// keep the run from ending: the upgrade is reported and the answer logged.
-TEST_F(DriverOutcomeTest, OdbcScanEndsWhateverTheDriverManagerAnswers) {
-  const std::string answers = "SOFTWARE\\ZAV\\KXLSIM\\Odbc";
-  struct Case {
-    const char *function;
-    DWORD answer;
-  } cases[] = {{"SQLDataSources", 5}, {"SQLDataSources", 2}, {"SQLAllocEnv", 5}, {"SQLAllocEnv", 0xFFFFFFFE}};
-  for (const Case &c : cases) {
-    SCOPED_TRACE(std::string(c.function) + " " + std::to_string(c.answer));
-    resetWorld();
-    kxlsim::addOdbcDataSource(world, kxlsim::localMachine(), "Sales", "ZAV KXL ODBC DRIVER - KXL95");
-    world.setDword(kxlsim::localMachine(), answers, c.function, c.answer);
-    Outcome outcome = run({"INST1"});
-    EXPECT_EQ(outcome.exitCode, 0) << outcome.out << outcome.err;
-    EXPECT_EQ(outcome.out, "KXL1000I  KXLIUPGRADE finished: the instance now belongs to this copy.\n");
-    EXPECT_NE(outcome.diagnostics.find("ODBC data sources could not be listed"), std::string::npos);
-  }
-}
+constexpr char kDataSources[] = "SQLDataSources", kAllocEnv[] = "SQLAllocEnv";
+constexpr const char *kUnlisted = "ODBC data sources could not be listed";
 
 // A completed upgrade stays completed: optional files that are missing, a
-// clean-up tool that fails or cannot start, an audit that fails. Its
+// clean-up tool that fails or cannot start, an audit that fails, an ODBC
+// scan that cannot list the data sources. Its
 // leftovers (the backup, the audit settings' copy, the run's record) go; a
 // removal that fails once is retried, a lasting failure is named in the log,
 // never undone. A rerun finds the instance on the current copy.
 TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
   const std::string auditCopy = std::string(kNewInstanceDir) + "\\security\\kxlauditcopy.cfg";
   const std::string record = std::string(kCurrentCopy) + "\\CFG\\kxliupgrade-INST1.run";
-  using Setup = void (*)(DriverOutcomeTest &);
-  const Setup audited = [](DriverOutcomeTest &t) {
+  using Setup = void (*)(DriverTest &);
+  const Setup audited = [](DriverTest &t) {
     t.world.writeText(std::string(kOldInstanceDir) + "\\security\\kxlaudit.cfg",
                       "active = yes\ninstance = both\n");
   };
@@ -123,7 +106,7 @@ TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
   } cases[] = {
       // Without the four carried files, and without their cfg and bin folders,
       // the copies report a missing file or folder, which both count as done.
-      {{"INST1"}, "", false, "", [](DriverOutcomeTest &t) {
+      {{"INST1"}, "", false, "", [](DriverTest &t) {
          for (const char *carried : {"\\cfg", "\\bin", "\\kxlmd_config.xml"})
            t.removeTree(std::string(kOldInstanceDir) + carried);
          kxlsim::setToolExitCode(t.world, "kxlset", 9); }, "", ""},
@@ -139,6 +122,10 @@ TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
       // The audit comes after the instance has moved: its failure is shown and logged.
       {{"INST1"}, "logEvent:1", false, "", audited, "1042", "audit record was not written"},
       {{"INST1"}, "sqlexAuditGetInstanceSettings:1", false, "", audited, "1042", "audit record was not written"},
+      {{"INST1"}, "", false, "", odbcAnswers<kDataSources, 5>, "", kUnlisted},
+      {{"INST1"}, "", false, "", odbcAnswers<kDataSources, 2>, "", kUnlisted},
+      {{"INST1"}, "", false, "", odbcAnswers<kAllocEnv, 5>, "", kUnlisted},
+      {{"INST1"}, "", false, "", odbcAnswers<kAllocEnv, 0xFFFFFFFE>, "", kUnlisted},
   };
   // clang-format on
   for (const auto &c : cases) {
@@ -156,6 +143,7 @@ TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
     for (const std::string &file : {auditCopy, record})
       EXPECT_EQ(exists(file), file == c.fileKept) << file;
     EXPECT_NE(outcome.out.find("KXL1000I"), std::string::npos) << outcome.out;
+    EXPECT_EQ(outcome.out.find("KXL1917W"), std::string::npos) << outcome.out;
     EXPECT_NE(outcome.out.find(c.shown), std::string::npos) << outcome.out;
     EXPECT_NE(outcome.diagnostics.find(c.logged), std::string::npos) << outcome.diagnostics;
     bool named = std::string(c.logged) == "could not be removed";
