@@ -82,7 +82,12 @@ struct Refusal {
   bool catalogs = true;
   bool checkToolRan = false; // its files are left; the registry is as it was
   std::string cwd = "C:\\";
+  const char *program = "kxliupgrade.exe"; // under the legacy name, the command warns at its end
 };
+
+void legacyName(ScenarioTest &t) {
+  t.installCommandAs("kxlimigr.exe");
+}
 
 // clang-format off
 const Refusal kRefusals[] = {
@@ -119,7 +124,7 @@ const Refusal kRefusals[] = {
     {{"INST1"}, -1949, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL101", 8, 2); }},
     {{"-install", "INST1"}, 2, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL101", 8, 2); }},
     {{"INST1"}, -1139, kxltest::kReservedText, reserved},
-    {{"INST2", "-u", "a,b"}, -1069, k1069, [](ScenarioTest &t) { reserved(t); setToolExit(t, 7); }, "", true, true}, // only the reserved name
+    {{"-u", "a,b", "INST2"}, -1069, k1069, [](ScenarioTest &t) { reserved(t); setToolExit(t, 7); }, "", true, true}, // only the reserved name
     {{"INST1"}, -1, kxltest::notAdminText("JDOE"), notAdmin},
     {{"INST1"}, -1, "KXLIMIGR:processing complete, SQLCODE=-1092\n", notAdmin, "", false},
     // A partitioned instance needs an account name and a password.
@@ -165,6 +170,17 @@ const Refusal kRefusals[] = {
     {{"INST1"}, -1927, k1927, nullptr, "", true, false, directoryOf(247)},
     {{"INST1"}, -1927, k1927, nullptr, "", true, false, directoryOf(254)},
     {{"INST1"}, -1927, k1927, nullptr, "", true, false, directoryOf(300)},
+    // The check tool's findings name its log file, in the current directory.
+    {{"INST1"}, -1205, "KXL1205E  The database check found objects that must be corrected before the instance can be upgraded. "
+                       "The details are in the log file \"\"C:\\work\\check\\upgrade.log\"\".\n",
+     [](ScenarioTest &t) { setToolExit(t, 3); }, "", true, true, "C:\\work\\check"},
+    // The legacy name's warning ends every run, in quiet mode too, but not a
+    // command line that fails before the name is known.
+    {{"nosuch"}, 1951, kxltest::unknownInstanceText("NOSUCH") + "\n\n" + kxltest::kLegacyText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
+    {{"-q", "nosuch"}, 1951, "\n\n" + kxltest::kLegacyText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
+    {{"-?"}, -1946, kxltest::kUsageText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
+    {{"nosuch"}, 1951, "KXLIMIGR:processing complete, RC = 1951\n\n\nKXLIMIGR:syntax warning, RC = 1392\n", legacyName, "", false, false,
+     "C:\\", "kxlimigr.exe"},
 };
 // clang-format on
 
@@ -179,6 +195,7 @@ TEST_P(RefusalScenario, PrintsItsTextAndChangesNothing) {
   RunSetup setup;
   setup.faults = row.faults;
   setup.cwd = row.cwd;
+  setup.program = row.program;
   RunResult r = run(row.args, setup);
   EXPECT_EQ(r.result, row.result);
   EXPECT_EQ(r.exitCode, row.result & 0xFF);
@@ -187,6 +204,14 @@ TEST_P(RefusalScenario, PrintsItsTextAndChangesNothing) {
   if (row.checkToolRan) {
     EXPECT_EQ(changed.find("registry"), std::string::npos) << changed;
     EXPECT_TRUE(kxltest::eventsOf(r, "audit").empty()) << "nothing was upgraded";
+    // The tool ran once for the instance, with its log file in the current directory.
+    std::string dir = row.cwd.substr(0, row.cwd.find_last_not_of('\\') + 1), escaped;
+    for (char c : dir + "\\upgrade.log -t " + dir)
+      escaped += c == '\\' ? "\\\\" : std::string(1, c);
+    std::vector<std::string> tool = kxltest::eventsOf(r, "program");
+    ASSERT_EQ(tool.size(), 1u);
+    EXPECT_NE(tool[0].find(kxltest::field("KXLINSTANCE", row.args.back())), std::string::npos) << tool[0];
+    EXPECT_NE(tool[0].find("-h -m -not1 -l " + escaped + "\""), std::string::npos) << tool[0];
   } else {
     EXPECT_EQ(changed, "");
     EXPECT_TRUE(r.events.empty()) << "the database check never ran";
@@ -196,24 +221,6 @@ TEST_P(RefusalScenario, PrintsItsTextAndChangesNothing) {
 INSTANTIATE_TEST_SUITE_P(Rows, RefusalScenario, ::testing::ValuesIn(kRefusals));
 
 using CheckScenario = ScenarioTest;
-
-TEST_F(CheckScenario, CheckToolProblemsNameTheLogFile) {
-  setToolExit(*this, 3);
-  RunSetup inDir;
-  inDir.cwd = "C:\\work\\check";
-  RunResult r = run({"INST1"}, inDir);
-  EXPECT_EQ(r.result, -1205);
-  EXPECT_EQ(r.out,
-            "KXL1205E  The database check found objects that must be corrected before the instance can "
-            "be upgraded. The details are in the log file \"\"C:\\work\\check\\upgrade.log\"\".\n");
-  ASSERT_EQ(kxltest::eventsOf(r, "program").size(), 1u);
-  std::string tool = kxltest::eventsOf(r, "program")[0];
-  EXPECT_NE(tool.find(kxltest::field("KXLINSTANCE", "INST1")), std::string::npos) << tool;
-  EXPECT_NE(tool.find("-h -m -not1 -l C:\\\\work\\\\check\\\\upgrade.log -t C:\\\\work\\\\check\""),
-            std::string::npos)
-      << tool;
-  EXPECT_TRUE(kxltest::eventsOf(r, "audit").empty()) << "the run stopped before the upgrade";
-}
 
 TEST_F(CheckScenario, MessageFileFallsBackToEnglish) {
   setToolExit(*this, 7);
@@ -229,25 +236,6 @@ TEST_F(CheckScenario, MessageFileFallsBackToEnglish) {
   run({"INST1"}, inDir);
   EXPECT_EQ(kxltestsupport::readHostFile(copied),
             kxltestsupport::readHostFile(std::string(KXL_MESSAGE_SOURCES) + "/de_DE/KXLDBMIG.TXT"));
-}
-
-TEST_F(CheckScenario, LegacyNameEndsWithItsWarningButNotAfterUsageErrors) {
-  installCommandAs("kxlimigr.exe");
-  RunSetup legacy;
-  legacy.program = "kxlimigr.exe";
-  RunResult r = run({"nosuch"}, legacy);
-  EXPECT_EQ(r.out, kxltest::unknownInstanceText("NOSUCH") + "\n\n" + kxltest::kLegacyText);
-  EXPECT_EQ(r.result, 1951);
-
-  RunResult quiet = run({"-q", "nosuch"}, legacy);
-  EXPECT_EQ(quiet.out, "\n\n" + kxltest::kLegacyText) << "the warning is printed in quiet mode too";
-
-  RunResult usage = run({"-?"}, legacy);
-  EXPECT_EQ(usage.out, kxltest::kUsageText) << "the name is not known yet when the command line fails";
-
-  removeCatalogs();
-  RunResult plain = run({"nosuch"}, legacy);
-  EXPECT_EQ(plain.out, "KXLIMIGR:processing complete, RC = 1951\n\n\nKXLIMIGR:syntax warning, RC = 1392\n");
 }
 
 } // namespace
