@@ -1,7 +1,6 @@
 // Runs that stop before the driver: command-line errors, and the checks of
 // caller, instance and copies. Each prints its catalog text (or the fallback
 // line without catalogs), ends with its code and leaves the world as it was.
-#include "expected_texts.h"
 #include "scenario_fixture.h"
 
 #include "sim/kxlsim/world_reader.h"
@@ -14,6 +13,35 @@ using kxltest::RunResult;
 using kxltest::RunSetup;
 using kxltest::ScenarioTest;
 
+// The en_US catalog texts as the user sees them.
+const std::string kUsageText =
+    "KXL1946E  Usage: KXLIUPGRADE [-q] [-a AuthType] [-p InstProfPath]\n"
+    "                  [-u AccountName[,Password]] [-install] [-forcecn]\n"
+    "                  [-j TEXT_SEARCH[,ServiceName][,PortNumber]] [-?] InstName\n"
+    "\n"
+    "  -q        quiet: print no final message\n"
+    "  -a        authentication type of the upgraded instance: SERVER, CLIENT,\n"
+    "            SERVER_ENCRYPT, DCS, DCE, DCS_ENCRYPT, DCE_SERVER_ENCRYPT,\n"
+    "            KERBEROS or KERBEROS_SERVER_ENCRYPT\n"
+    "  -p        instance profile path to hold the instance after the upgrade\n"
+    "  -u        account the instance's services run under; required for a\n"
+    "            partitioned instance\n"
+    "  -install  run on behalf of an installer\n"
+    "  -forcecn  on the machines of other partitions, register the instance under\n"
+    "            this copy without moving their profiles\n"
+    "  -j        configure the text search service of the instance\n"
+    "  -?        show this text\n"
+    "  InstName  the instance to upgrade to this copy\n";
+
+std::string unknownInstanceText(const std::string &name) {
+  return "KXL1951W  The instance \"" + name + "\" does not belong to any installed copy of the product.\n";
+}
+const std::string kBadVersionText =
+    "KXL1949E  The instance \"INST1\" cannot be upgraded by this command: the versions of its "
+    "copy and of this copy do not allow it.\n";
+const std::string kActiveText =
+    "KXL1953E  The instance is active. Stop all of its services and run the command again.\n";
+const std::string kLegacyText = "KXL1392W  The command KXLIMIGR is deprecated. Use KXLIUPGRADE instead.\n";
 constexpr const char *kIdentity = ScenarioTest::kIdentity;
 
 void setCopyLevel(ScenarioTest &t, const std::string &copy, int version, int release) {
@@ -91,11 +119,11 @@ void legacyName(ScenarioTest &t) {
 
 // clang-format off
 const Refusal kRefusals[] = {
-    {{}, -1946, kxltest::kUsageText},
-    {{"INST1", "-?"}, -1946, kxltest::kUsageText},
-    {{"/x", "INST1"}, -1946, kxltest::kUsageText},
-    {{"INST1", "-a"}, -1946, kxltest::kUsageText},
-    {{"INST1", "INST2"}, -1946, kxltest::kUsageText},
+    {{}, -1946, kUsageText},
+    {{"INST1", "-?"}, -1946, kUsageText},
+    {{"/x", "INST1"}, -1946, kUsageText},
+    {{"INST1", "-a"}, -1946, kUsageText},
+    {{"INST1", "INST2"}, -1946, kUsageText},
     {{"NINECHARS"}, -1916, "KXL1916E  The instance name is not valid. An instance name has 1 to 8 characters.\n"},
     {{"-p", "C:\\nowhere", "INST1"}, -1920, "KXL1920E  The instance profile path given with -p is not an existing directory.\n"},
     {{"-u", std::string(31, 'u'), "INST1"}, -1921, "KXL1921E  The account name given with -u is not valid, or the password could not be read.\n"},
@@ -103,38 +131,38 @@ const Refusal kRefusals[] = {
                                           "name or a port number, or by a service name and a port number.\n"},
     {{"-j", "TEXT_SEARCH,1023", "INST1"}, -1701, "KXL1701E  The text search port must lie between 1024 and 65535, and the text search "
                                                  "service name may have at most 14 characters.\n"},
-    {{"kxldas00"}, -1954, kxltest::kAdminServerText},
+    {{"kxldas00"}, -1954, "KXL1954E  The administration server instance cannot be upgraded with this command.\n"},
     {{}, -1946, "KXLIMIGR:syntax error, RC = -1946\n", nullptr, "", false},
     {{"NINECHARS"}, -1916, "KXLIMIGR:processing complete, RC = -1916\n", nullptr, "", false},
     {{"-j", "TEXT_SEARCH,99999", "INST1"}, -1701, "KXLIMIGR:processing complete, RC = -1701\n", nullptr, "", false},
     {{"KXLDAS00"}, -1954, "KXLIMIGR:processing complete, RC = -1954\n", nullptr, "", false},
     // Quiet mode prints nothing; installer mode ends with 1 or 2.
     {{"-q", "NOSUCH"}, 1951, ""},
-    {{"-install", "NOSUCH"}, 1, kxltest::unknownInstanceText("NOSUCH")},
-    {{"-install", "-x", "NOSUCH"}, 2, kxltest::kUsageText},
-    {{"nosuch"}, 1951, kxltest::unknownInstanceText("NOSUCH")},
+    {{"-install", "NOSUCH"}, 1, unknownInstanceText("NOSUCH")},
+    {{"-install", "-x", "NOSUCH"}, 2, kUsageText},
+    {{"nosuch"}, 1951, unknownInstanceText("NOSUCH")},
     // The level check of the instance's copy comes first, so an instance of
     // the current copy is reported as such only by a current copy below 9.7.
-    {{"NEWINST"}, 1950, kxltest::alreadyUpgradedText("NEWINST"), [](ScenarioTest &t) {
+    {{"NEWINST"}, 1950, "KXL1950W  The instance \"NEWINST\" already belongs to this copy. Nothing was changed.\n", [](ScenarioTest &t) {
        setCopyLevel(t, "KXL101", 9, 6);
        t.addInstance("NEWINST", "KXL101", std::string(ScenarioTest::kCurrentCopy) + "\\NEWINST", 10, 1); }},
     // Copy versions outside the upgrade range; a current copy below 9 is refused to installers too.
-    {{"INST1"}, -1949, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL95", 9, 7); }},
-    {{"INST1"}, -1949, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL95", 10, 1); }},
-    {{"INST1"}, -1949, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL101", 8, 2); }},
-    {{"-install", "INST1"}, 2, kxltest::badVersionText("INST1"), [](ScenarioTest &t) { setCopyLevel(t, "KXL101", 8, 2); }},
-    {{"INST1"}, -1139, kxltest::kReservedText, reserved},
+    {{"INST1"}, -1949, kBadVersionText, [](ScenarioTest &t) { setCopyLevel(t, "KXL95", 9, 7); }},
+    {{"INST1"}, -1949, kBadVersionText, [](ScenarioTest &t) { setCopyLevel(t, "KXL95", 10, 1); }},
+    {{"INST1"}, -1949, kBadVersionText, [](ScenarioTest &t) { setCopyLevel(t, "KXL101", 8, 2); }},
+    {{"-install", "INST1"}, 2, kBadVersionText, [](ScenarioTest &t) { setCopyLevel(t, "KXL101", 8, 2); }},
+    {{"INST1"}, -1139, "KXL1139E  The instance is reserved by the global profile of its copy and cannot be upgraded.\n", reserved},
     {{"-u", "a,b", "INST2"}, -1069, k1069, [](ScenarioTest &t) { reserved(t); setToolExit(t, 7); }, "", true, true}, // only the reserved name
-    {{"INST1"}, -1, kxltest::notAdminText("JDOE"), notAdmin},
+    {{"INST1"}, -1, "SQL1092N  The user \"JDOE\" is not a local administrator of this machine and may not upgrade instances.\n", notAdmin},
     {{"INST1"}, -1, "KXLIMIGR:processing complete, SQLCODE=-1092\n", notAdmin, "", false},
     // A partitioned instance needs an account name and a password.
-    {{"INST2"}, -1946, kxltest::kUsageText},
-    {{"-u", "kxlsvc", "INST2"}, -1946, kxltest::kUsageText},
+    {{"INST2"}, -1946, kUsageText},
+    {{"-u", "kxlsvc", "INST2"}, -1946, kUsageText},
     // An active instance is refused before the check tool; for a partitioned
     // one, the second partition runs on the other machine.
-    {{"INST1"}, -1953, kxltest::kActiveText,
+    {{"INST1"}, -1953, kActiveText,
      [](ScenarioTest &t) { t.world.setDword(localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST1", "State", 4); }},
-    {{"-u", "kxlsvc,secret", "INST2"}, -1953, kxltest::kActiveText,
+    {{"-u", "kxlsvc,secret", "INST2"}, -1953, kActiveText,
      [](ScenarioTest &t) { t.world.setDword(kxlsim::remoteMachine("WINSRV2"), "SOFTWARE\\ZAV\\KXLSIM\\Services\\INST2-1", "State", 4); }},
     {{"INST1"}, -1069, k1069, [](ScenarioTest &t) { setToolExit(t, 7); }, "", true, true},
     {{"INST1"}, -1069, "KXLIMIGR:processing complete, RC = -1069\n", [](ScenarioTest &t) { setToolExit(t, 7); }, "", false, true},
@@ -176,9 +204,9 @@ const Refusal kRefusals[] = {
      [](ScenarioTest &t) { setToolExit(t, 3); }, "", true, true, "C:\\work\\check"},
     // The legacy name's warning ends every run, in quiet mode too, but not a
     // command line that fails before the name is known.
-    {{"nosuch"}, 1951, kxltest::unknownInstanceText("NOSUCH") + "\n\n" + kxltest::kLegacyText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
-    {{"-q", "nosuch"}, 1951, "\n\n" + kxltest::kLegacyText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
-    {{"-?"}, -1946, kxltest::kUsageText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
+    {{"nosuch"}, 1951, unknownInstanceText("NOSUCH") + "\n\n" + kLegacyText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
+    {{"-q", "nosuch"}, 1951, "\n\n" + kLegacyText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
+    {{"-?"}, -1946, kUsageText, legacyName, "", true, false, "C:\\", "kxlimigr.exe"},
     {{"nosuch"}, 1951, "KXLIMIGR:processing complete, RC = 1951\n\n\nKXLIMIGR:syntax warning, RC = 1392\n", legacyName, "", false, false,
      "C:\\", "kxlimigr.exe"},
 };
