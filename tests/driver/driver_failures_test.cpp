@@ -8,11 +8,9 @@ namespace drivertest {
 namespace {
 
 // Codes of the product library that the driver passes on unchanged.
-constexpr long long kAccessDenied = static_cast<int32_t>(0x870F0003u);
-constexpr long long kExecFailed = static_cast<int32_t>(0x870F0140u);
-constexpr long long kPathNotFound = static_cast<int32_t>(0x870F0011u);
-constexpr long long kIoError = static_cast<int32_t>(0x870F0004u);
-constexpr long long kPathTestFailed = static_cast<int32_t>(0x90000002u);
+constexpr long long kAccessDenied = int32_t(0x870F0003u), kExecFailed = int32_t(0x870F0140u),
+                    kPathNotFound = int32_t(0x870F0011u), kIoError = int32_t(0x870F0004u),
+                    kPathTestFailed = int32_t(0x90000002u);
 
 constexpr const char *kRestoredNotice = "KXL1971I";
 constexpr const char *kNotRestored = "KXL1972E";
@@ -48,9 +46,9 @@ enum class Notice {
 
 using Step = void (*)(DriverTest &);
 void flipFirstByte(DriverTest &t) {
+  // A damaged checksum: the saved configuration is unconvertible.
   std::string image = t.fileContent(kSystm);
-  image[0] =
-      static_cast<char>(image[0] ^ 0xFF); // a damaged checksum: the saved configuration is unconvertible
+  image[0] = static_cast<char>(image[0] ^ 0xFF);
   t.world.writeText(kSystm, image);
 }
 void nodesFile(DriverTest &t, const char *content) {
@@ -284,16 +282,16 @@ TEST_P(KilledRunTest, NextRunLeavesTheUpgradedInstance) {
   EXPECT_EQ(hasBackup(), c.recordEdit != nullptr);
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Kills, KilledRunTest,
-    ::testing::Values(KilledRunCase{"BackupCopyPutBack", "sqlocopydir:1", nullptr},
-                      KilledRunCase{"ProfileMovePutBack", "SHCopyKeyA:1", nullptr},
-                      KilledRunCase{"RecreationFinished", "sqlo_instance_create_extended:1", nullptr},
-                      KilledRunCase{"SslToolFinished", "sqloexec2:3", nullptr},
-                      KilledRunCase{"RegistryWriteFinished", "hivewrite:4", nullptr},
-                      KilledRunCase{"DamagedRecordSetAside", "sqlocopydir:1", "oldCopy=KXL95\nbroken line"},
-                      KilledRunCase{"RecordOfAGoneCopySetAside", "sqlocopydir:1", "oldCopy=KXL77"}),
-    [](const ::testing::TestParamInfo<KilledRunCase> &info) { return info.param.what; });
+// clang-format off
+const KilledRunCase kKills[] = {
+    {"BackupCopyPutBack", "sqlocopydir:1", nullptr},       {"ProfileMovePutBack", "SHCopyKeyA:1", nullptr},
+    {"RecreationFinished", "sqlo_instance_create_extended:1", nullptr},
+    {"SslToolFinished", "sqloexec2:3", nullptr},           {"RegistryWriteFinished", "hivewrite:4", nullptr},
+    {"DamagedRecordSetAside", "sqlocopydir:1", "oldCopy=KXL95\nbroken line"},
+    {"RecordOfAGoneCopySetAside", "sqlocopydir:1", "oldCopy=KXL77"}};
+// clang-format on
+INSTANTIATE_TEST_SUITE_P(Kills, KilledRunTest, ::testing::ValuesIn(kKills),
+                         [](const ::testing::TestParamInfo<KilledRunCase> &info) { return info.param.what; });
 
 } // namespace
 } // namespace drivertest
