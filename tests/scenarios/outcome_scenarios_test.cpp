@@ -14,6 +14,7 @@ using kxltest::field;
 using kxltest::RunResult;
 using kxltest::RunSetup;
 using kxltest::ScenarioTest;
+
 // The en_US catalog texts as the user sees them.
 const std::string kSuccessText = "KXL1000I  KXLIUPGRADE finished: the instance now belongs to this copy.\n";
 const std::string kCheckWarningText =
@@ -100,30 +101,29 @@ const Reached kReached[] = {
 };
 // clang-format on
 
-class OutcomeScenario : public ScenarioTest {
+RunSetup driverSays(const std::string &settings) {
+  RunSetup setup;
+  setup.driver = settings;
+  return setup;
+}
+// The one "fake_driver" event of the run.
+std::string handedOver(const RunResult &r) {
+  std::vector<std::string> found = eventsOf(r, "fake_driver");
+  return found.size() == 1 ? found[0] : "<" + std::to_string(found.size()) + " driver calls>";
+}
+bool has(const std::string &line, const std::string &name, const std::string &value) {
+  return line.find(field(name, value)) != std::string::npos;
+}
+
+class OutcomeScenario : public ScenarioTest, public ::testing::WithParamInterface<Reached> {
 protected:
   void SetUp() override {
     ScenarioTest::SetUp();
     installCommandAs("kxliupgrade.exe");
   }
-  static RunSetup driverSays(const std::string &settings) {
-    RunSetup setup;
-    setup.driver = settings;
-    return setup;
-  }
-  // The one "fake_driver" event of the run.
-  static std::string handedOver(const RunResult &r) {
-    std::vector<std::string> found = eventsOf(r, "fake_driver");
-    return found.size() == 1 ? found[0] : "<" + std::to_string(found.size()) + " driver calls>";
-  }
-  static bool has(const std::string &line, const std::string &name, const std::string &value) {
-    return line.find(field(name, value)) != std::string::npos;
-  }
 };
 
-class ReachedScenario : public OutcomeScenario, public ::testing::WithParamInterface<Reached> {};
-
-TEST_P(ReachedScenario, DriverIsHandedTheRunAndItsResultReported) {
+TEST_P(OutcomeScenario, DriverIsHandedTheRunAndItsResultReported) {
   const Reached &row = GetParam();
   if (row.setup != nullptr)
     row.setup(*this);
@@ -137,7 +137,7 @@ TEST_P(ReachedScenario, DriverIsHandedTheRunAndItsResultReported) {
   EXPECT_TRUE(row.checkRuns < 0 || eventsOf(r, "program").size() == static_cast<std::size_t>(row.checkRuns));
 }
 
-INSTANTIATE_TEST_SUITE_P(Rows, ReachedScenario, ::testing::ValuesIn(kReached));
+INSTANTIATE_TEST_SUITE_P(Rows, OutcomeScenario, ::testing::ValuesIn(kReached));
 
 TEST_F(OutcomeScenario, MachineWithoutOdbcCompletesNormally) {
   kxlsim::addOdbcDataSource(world, localMachine(), "Sales", "ZAV KXL ODBC DRIVER - KXL95");
