@@ -30,15 +30,14 @@ TEST(EditionCheck, EditionsAllowedPerNodeType) {
   }
 }
 
-// The strings of an argument block, up to its empty string.
-std::vector<std::string> blockStrings(const char *block, std::size_t size) {
+// The strings of an argument block, up to its empty string, and what follows it.
+std::vector<std::string> blockStrings(const char *block, std::size_t size, std::string *rest = nullptr) {
   std::vector<std::string> strings;
   std::size_t at = 0;
-  while (at < size && block[at] != '\0') {
-    std::string text(block + at);
-    strings.push_back(text);
-    at += text.size() + 1;
-  }
+  for (; at < size && block[at] != '\0'; at += strings.back().size() + 1)
+    strings.emplace_back(block + at);
+  if (rest != nullptr)
+    *rest = std::string(block + at, size - at);
   return strings;
 }
 
@@ -48,13 +47,9 @@ TEST(SslArguments, BlockHoldsToolFlagsAndQuotedFiles) {
   std::vector<std::string> expected = {"C:\\K\\bin\\kxlimsslcfg.exe", "-c",
                                        "\"C:\\K\\INST1\\SSLClientconfig.ini\"", "-s",
                                        "\"C:\\K\\INST1\\SSLconfig.ini\""};
-  EXPECT_EQ(blockStrings(block.data(), block.size()), expected);
-  // Zero filled behind the last string, so the block ends with an empty one.
-  std::size_t used = 0;
-  for (const std::string &text : expected)
-    used += text.size() + 1;
-  for (std::size_t i = used; i < block.size(); ++i)
-    ASSERT_EQ(block[i], '\0') << i;
+  std::string rest;
+  EXPECT_EQ(blockStrings(block.data(), block.size(), &rest), expected);
+  EXPECT_EQ(rest, std::string(rest.size(), '\0')) << "zero filled behind the last string";
 }
 
 TEST(SslArguments, LongPathsAreRefusedWithoutWritingPastTheBlock) {

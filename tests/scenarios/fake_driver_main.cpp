@@ -8,25 +8,19 @@
 
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
 #include <string>
 
 namespace {
 
-long driverSetting(const char *name) {
-  const char *settings = std::getenv("KXLTEST_DRIVER");
-  if (settings == nullptr)
-    return 0;
-  std::string key = std::string(name) + "=";
-  for (const char *at = settings; (at = std::strstr(at, key.c_str())) != nullptr; ++at)
-    if (at == settings || at[-1] == ',')
-      return std::strtol(at + key.size(), nullptr, 10);
-  return 0;
+std::string environment(const char *name, const char *unset) {
+  const char *value = std::getenv(name);
+  return value != nullptr ? value : unset;
 }
 
-std::string environmentInstance() {
-  const char *value = std::getenv("KXLINSTANCE");
-  return value != nullptr ? value : "<unset>";
+long driverSetting(const char *name) {
+  std::string settings = "," + environment("KXLTEST_DRIVER", ""), key = std::string(",") + name + "=";
+  std::size_t at = settings.find(key);
+  return at == std::string::npos ? 0 : std::strtol(settings.c_str() + at + key.size(), nullptr, 10);
 }
 
 int fakeDriver(UpgradeContext &context, UpgradeOptions &options) {
@@ -39,7 +33,7 @@ int fakeDriver(UpgradeContext &context, UpgradeOptions &options) {
                                       {"partitioned", std::to_string(options.partitionedInstance)},
                                       {"copy_path", context.copyPath},
                                       {"ports", std::string(context.var159Head) + ":" + context.var159Tail},
-                                      {"kxlinstance", environmentInstance()}});
+                                      {"kxlinstance", environment("KXLINSTANCE", "<unset>")}});
   options.partitionRecord.textSearchReasonCode = static_cast<int32_t>(driverSetting("reason"));
   options.partitionRecord.extraMessage = static_cast<int32_t>(driverSetting("extra"));
   options.oldInstanceType = static_cast<uint32_t>(driverSetting("old"));
@@ -53,6 +47,6 @@ int fakeDriver(UpgradeContext &context, UpgradeOptions &options) {
 
 int main(int argc, char **argv) {
   int rc = runUpgrade(argc, argv, fakeDriver);
-  kxlsim::appendEvent("fake_exit", {{"kxlinstance", environmentInstance()}});
+  kxlsim::appendEvent("fake_exit", {{"kxlinstance", environment("KXLINSTANCE", "<unset>")}});
   return rc;
 }
