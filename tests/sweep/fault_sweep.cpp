@@ -14,7 +14,6 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <iostream>
@@ -115,9 +114,7 @@ bool isIgnoredLeftover(const std::string &difference) {
     return false;
   std::string path = difference.substr(7, difference.find(" (") - 7);
   return std::any_of(std::begin(kIgnoredLeftovers), std::end(kIgnoredLeftovers), [&](const auto &ignored) {
-    std::size_t length = std::strlen(ignored.end);
-    return path.find(ignored.folder) != std::string::npos && path.size() >= length &&
-           path.compare(path.size() - length, length, ignored.end) == 0;
+    return path.find(ignored.folder) != std::string::npos && path.ends_with(ignored.end);
   });
 }
 
@@ -148,8 +145,7 @@ Run runKxlsim(const std::vector<std::string> &args) {
 // The command in `world`, started from the world's folder (current directory C:\).
 Run upgrade(const std::string &world, const Scenario &scenario, std::vector<std::string> settings) {
   std::string trace = scratch->file("trace");
-  settings.push_back("KXLSIM_ROOT=" + world);
-  settings.push_back("KXLTRACE=" + trace);
+  settings.insert(settings.end(), {"KXLSIM_ROOT=" + world, "KXLTRACE=" + trace});
   Run run = runProgram(world + "/" + kCommand, scenario.args, settings, world);
   run.trace = readHostFile(trace);
   fs::remove(trace);
@@ -188,13 +184,10 @@ bool linkPrograms(const std::string &world, const std::string &store) {
 
 // "file + PATH (...)", "file - PATH", "file ~ PATH ..." of a log file.
 bool isLogFile(const std::string &head) {
-  if (head.rfind("file ", 0) != 0 || head.size() < 7)
-    return false;
-  std::string path = head.substr(7);
-  return std::any_of(std::begin(kLogFiles), std::end(kLogFiles), [&](const char *log) {
-    std::size_t length = std::strlen(log);
-    return path.compare(0, length, log) == 0 && (path.size() == length || path[length] == ' ');
-  });
+  std::string path =
+      head.starts_with("file ") ? head.substr(std::min<std::size_t>(7, head.size())) + " " : "";
+  return std::any_of(std::begin(kLogFiles), std::end(kLogFiles),
+                     [&](const char *log) { return path.starts_with(std::string(log) + " "); });
 }
 
 struct Comparison {
