@@ -70,19 +70,6 @@ Tree DriverTest::tree(const std::string &windowsPath) const {
   return files;
 }
 
-bool DriverTest::exists(const std::string &windowsPath) const {
-  return fs::exists(hostPath(windowsPath));
-}
-
-std::string DriverTest::fileContent(const std::string &windowsPath) const {
-  return kxltestsupport::readHostFile(hostPath(windowsPath));
-}
-
-void DriverTest::removeTree(const std::string &windowsPath) const {
-  std::error_code ignored;
-  fs::remove_all(hostPath(windowsPath), ignored);
-}
-
 bool DriverTest::hasBackup() const {
   std::error_code ec;
   for (auto it = fs::directory_iterator(hostPath("C:\\windows\\temp"), ec);

@@ -6,6 +6,7 @@
 #include "sim/kxlsim/world_reader.h"
 #include "tests/support/command_world.h"
 
+#include <filesystem>
 #include <map>
 #include <string>
 #include <vector>
@@ -44,10 +45,15 @@ public:
   static void expectFailure(const Outcome &outcome, long long probe, long long rc);
 
   Tree tree(const std::string &windowsPath) const;
-  bool exists(const std::string &windowsPath) const;
+  bool exists(const std::string &windowsPath) const { return std::filesystem::exists(hostPath(windowsPath)); }
   // The whole content of a file ("" when it cannot be read).
-  std::string fileContent(const std::string &windowsPath) const;
-  void removeTree(const std::string &windowsPath) const;
+  std::string fileContent(const std::string &windowsPath) const {
+    return kxltestsupport::readHostFile(hostPath(windowsPath));
+  }
+  void removeTree(const std::string &windowsPath) const {
+    std::error_code ignored;
+    std::filesystem::remove_all(hostPath(windowsPath), ignored);
+  }
   // A backup folder is in the world's temporary directory.
   bool hasBackup() const;
 

@@ -73,10 +73,14 @@ TEST_F(DriverOutcomeTest, EditionThatCannotHostTheInstanceIsRefused) {
     EXPECT_NE(failure.probe, 15);
 }
 
-// A driver manager that answers something unexpected to every call (logged).
+// A driver manager that answers something unexpected to every call, or none
+// at all (no answers given), with a data source of the product's driver.
 template <const char *function, DWORD answer> void odbcAnswers(DriverTest &t) {
   kxlsim::addOdbcDataSource(t.world, kxlsim::localMachine(), "Sales", "ZAV KXL ODBC DRIVER - KXL95");
-  t.world.setDword(kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Odbc", function, answer);
+  if (answer != 0)
+    t.world.setDword(kxlsim::localMachine(), "SOFTWARE\\ZAV\\KXLSIM\\Odbc", function, answer);
+  else
+    t.removeTree("C:\\windows\\system32\\odbc32.dll");
 }
 constexpr char kDataSources[] = "SQLDataSources", kAllocEnv[] = "SQLAllocEnv";
 constexpr const char *kUnlisted = "ODBC data sources could not be listed";
@@ -126,6 +130,7 @@ TEST_F(DriverOutcomeTest, CompletedUpgradeStaysCompleted) {
       {{"INST1"}, "", false, "", odbcAnswers<kDataSources, 2>, "", kUnlisted},
       {{"INST1"}, "", false, "", odbcAnswers<kAllocEnv, 5>, "", kUnlisted},
       {{"INST1"}, "", false, "", odbcAnswers<kAllocEnv, 0xFFFFFFFE>, "", kUnlisted},
+      {{"INST1"}, "", false, "", odbcAnswers<kAllocEnv, 0>, "", kUnlisted},
   };
   // clang-format on
   for (const auto &c : cases) {
