@@ -211,20 +211,17 @@ TEST_F(ClusterE2eTest, ClusteredPartitionedInstanceUpgradesOnEveryNode) {
 // re-created service the system account). Each ends the run with the world as
 // it was; the first is refused before anything changes, the others undone.
 TEST_F(ClusterE2eTest, ClusterStateThatCannotBeReadFailsTheRunUnchanged) {
-  const struct {
-    const char *faults;
-    const char *message;
-  } cases[] = {
-      {"RegOpenKeyExA:27", "KXL1918E"},         {"RegQueryValueExA:13", "KXL1918E"},
-      {"RegOpenKeyExA:187", "KXL1918E"},        {"RegQueryValueExA:114", "KXL1918E"},
-      {"ossSnprintf:6", "KXLIMIGR:processing"}, {"RegQueryValueExA:138", "KXLIMIGR:processing"},
-  };
-  for (const auto &c : cases) {
-    SCOPED_TRACE(c.faults);
+  for (const auto &[faults, message] : {std::pair("RegOpenKeyExA:27", "KXL1918E"),
+                                        {"RegQueryValueExA:13", "KXL1918E"},
+                                        {"RegOpenKeyExA:187", "KXL1918E"},
+                                        {"RegQueryValueExA:114", "KXL1918E"},
+                                        {"ossSnprintf:6", "KXLIMIGR:processing"},
+                                        {"RegQueryValueExA:138", "KXLIMIGR:processing"}}) {
+    SCOPED_TRACE(faults);
     std::string before = snapshot();
-    kxltest::CommandOutcome run = upgrade(kSingle, c.faults);
+    kxltest::CommandOutcome run = upgrade(kSingle, faults);
     EXPECT_NE(run.exitCode, 0) << run.out;
-    EXPECT_EQ(run.out.rfind(c.message, 0), 0u) << run.out;
+    EXPECT_EQ(run.out.rfind(message, 0), 0u) << run.out;
     EXPECT_EQ(registryChanges(changesSince(before)), "");
   }
   std::string before = snapshot();
