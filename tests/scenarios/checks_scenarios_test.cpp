@@ -216,10 +216,7 @@ class RefusalScenario : public ScenarioTest, public ::testing::WithParamInterfac
 
 TEST_P(RefusalScenario, PrintsItsTextAndChangesNothing) {
   const Refusal &row = GetParam();
-  if (row.setup != nullptr)
-    row.setup(*this);
-  if (!row.catalogs)
-    removeCatalogs();
+  prepare(row.setup, row.catalogs);
   RunSetup setup;
   setup.faults = row.faults;
   setup.cwd = row.cwd;

@@ -124,10 +124,7 @@ protected:
 
 TEST_P(OutcomeScenario, DriverIsHandedTheRunAndItsResultReported) {
   const Reached &row = GetParam();
-  if (row.setup != nullptr)
-    row.setup(*this);
-  if (!row.catalogs)
-    removeCatalogs();
+  prepare(row.setup, row.catalogs);
   RunResult r = run(row.args, driverSays(row.driver));
   EXPECT_EQ(r.result, row.result);
   EXPECT_EQ(r.out, row.out);

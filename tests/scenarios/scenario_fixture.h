@@ -30,6 +30,13 @@ public:
   void installCommandAs(const std::string &program);
   // Removes the message catalogs of every copy.
   void removeCatalogs();
+  // A row's world: `setup` run (when given), the catalogs removed unless `catalogs`.
+  void prepare(void (*setup)(ScenarioTest &), bool catalogs) {
+    if (setup != nullptr)
+      setup(*this);
+    if (!catalogs)
+      removeCatalogs();
+  }
   // Registers an instance of `copy` (at version.release) in `directory`.
   void addInstance(const std::string &name, const std::string &copy, const std::string &directory,
                    int version, int release) {
