@@ -38,11 +38,8 @@ const Args kInPlace = {"-p", DriverTest::kOldCopy, "INST1"};
 const Args kNewPath = {"-p", kProfiles, "INST1"};
 const Args kSingle = {"INST1"}, kInstall = {"-install", "INST1"};
 
-enum class Notice {
-  kNone,     // the run failed before anything needed restoring
-  kRestored, // the message says the instance was restored, never that it was not
-  kAny,
-};
+// kNone: failed before anything needed restoring; kRestored: the message says so.
+enum class Notice { kNone, kRestored, kAny };
 
 using Step = void (*)(DriverTest &);
 void flipFirstByte(DriverTest &t) {
@@ -233,7 +230,7 @@ TEST_F(DriverFailureTest, FailedRestoreKeepsTheBackupAndSaysWhere) {
         std::pair(kSingle, "sqleInitApplicationEnvironment:1,sqloChangeNTServiceConfig:2")}) {
     SCOPED_TRACE(faults);
     resetWorld();
-    Tree before = tree(kOldInstanceDir);
+    std::map<std::string, std::string> before = tree(kOldInstanceDir);
     Outcome outcome = run(args, faults);
     ASSERT_EQ(outcome.failures.size(), 1u) << outcome.trace;
     EXPECT_EQ(outcome.out.find(kRestoredNotice), std::string::npos) << outcome.out;

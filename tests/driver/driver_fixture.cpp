@@ -59,8 +59,8 @@ std::string DriverTest::worldChanges() const {
   return changes;
 }
 
-Tree DriverTest::tree(const std::string &windowsPath) const {
-  Tree files;
+std::map<std::string, std::string> DriverTest::tree(const std::string &windowsPath) const {
+  std::map<std::string, std::string> files;
   fs::path base = hostPath(windowsPath);
   std::error_code ec;
   for (auto it = fs::recursive_directory_iterator(base, ec); !ec && it != fs::recursive_directory_iterator();

@@ -26,9 +26,6 @@ struct Outcome : kxltest::CommandOutcome {
   std::vector<DriverFailure> failures; // the driver's error trace lines
 };
 
-// Relative path -> content of every file below a directory.
-using Tree = std::map<std::string, std::string>;
-
 // The profile key of an instance under a copy.
 inline std::string profileKey(const std::string &copyName, const std::string &instance) {
   return kxlsim::copyRegistryKey(copyName) + "\\PROFILES\\" + instance;
@@ -44,7 +41,8 @@ public:
   // The driver failed once, at `probe`, with `rc`, and returned it.
   static void expectFailure(const Outcome &outcome, long long probe, long long rc);
 
-  Tree tree(const std::string &windowsPath) const;
+  // Relative path -> content of every file below a directory.
+  std::map<std::string, std::string> tree(const std::string &windowsPath) const;
   bool exists(const std::string &windowsPath) const { return std::filesystem::exists(hostPath(windowsPath)); }
   // The whole content of a file ("" when it cannot be read).
   std::string fileContent(const std::string &windowsPath) const {

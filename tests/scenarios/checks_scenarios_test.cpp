@@ -42,7 +42,6 @@ const std::string kBadVersionText =
 const std::string kActiveText =
     "KXL1953E  The instance is active. Stop all of its services and run the command again.\n";
 const std::string kLegacyText = "KXL1392W  The command KXLIMIGR is deprecated. Use KXLIUPGRADE instead.\n";
-constexpr const char *kIdentity = ScenarioTest::kIdentity;
 
 void setCopyLevel(ScenarioTest &t, const std::string &copy, int version, int release) {
   std::string key = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\" + copy + "\\CurrentVersion";
@@ -53,8 +52,8 @@ void setToolExit(ScenarioTest &t, DWORD code) {
   kxlsim::setToolExitCode(t.world, "kxlckupgrade", code);
 }
 void notAdmin(ScenarioTest &t) {
-  t.world.setDword(localMachine(), kIdentity, "LocalAdmin", 0x01);
-  t.world.setString(localMachine(), kIdentity, "AuthId", "JDOE");
+  t.world.setDword(localMachine(), t.kIdentity, "LocalAdmin", 0x01);
+  t.world.setString(localMachine(), t.kIdentity, "AuthId", "JDOE");
 }
 void reserved(ScenarioTest &t) {
   t.world.setString(localMachine(), "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\GLOBAL_PROFILE",

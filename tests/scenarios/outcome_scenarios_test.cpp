@@ -29,7 +29,7 @@ void profiles(ScenarioTest &t) {
   t.world.makeDirectory("C:\\profiles");
 }
 void clustered(ScenarioTest &t) {
-  profiles(t);
+  t.world.makeDirectory("C:\\profiles");
   t.world.setString(localMachine(), kProfileKey, "KXLCLUSTER", "KXLCLUS");
 }
 void checkSays(ScenarioTest &t, DWORD code) {
