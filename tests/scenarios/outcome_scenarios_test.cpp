@@ -25,9 +25,6 @@ const std::string kVersionKey = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\Cur
 const std::string kProfileKey = "SOFTWARE\\ZAV\\KXL\\InstalledCopies\\KXL95\\PROFILES\\INST1";
 const Fields kKeptPath = {{"flags", "0x0001"}, {"profile", "C:\\\\Program Files\\\\ZAV\\\\KXL95"}};
 
-void profiles(ScenarioTest &t) {
-  t.world.makeDirectory("C:\\profiles");
-}
 void clustered(ScenarioTest &t) {
   t.world.makeDirectory("C:\\profiles");
   t.world.setString(localMachine(), kProfileKey, "KXLCLUSTER", "KXLCLUS");
@@ -59,7 +56,8 @@ const Reached kReached[] = {
     {{"INST1"}, "", 0, "KXLIUPGRADE: processing completed successfully.\n", {}, nullptr, false},
     // -p naming the instance's own profile path, with a trailing backslash: no move.
     {{"-p", "C:\\Program Files\\ZAV\\KXL95\\", "INST1"}, "", 0, kSuccessText, kKeptPath},
-    {{"-p", "C:\\profiles\\", "INST1"}, "", 0, kSuccessText, {{"flags", "0x0005"}, {"profile", "C:\\\\profiles"}}, profiles},
+    {{"-p", "C:\\profiles\\", "INST1"}, "", 0, kSuccessText, {{"flags", "0x0005"}, {"profile", "C:\\\\profiles"}},
+     [](ScenarioTest &t) { t.world.makeDirectory("C:\\profiles"); }},
     // A clustered instance keeps its path.
     {{"INST1"}, "", 0, kSuccessText, kKeptPath, clustered},
     {{"-p", "C:\\profiles", "INST1"}, "", 0, kSuccessText, kKeptPath, clustered},
