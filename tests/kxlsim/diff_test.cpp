@@ -1,7 +1,7 @@
 // Comparing worlds: equal worlds, added keys and their values both ways, and
-// key paths. Changed values, files added, changed and removed, and other
-// machines' keys are shown exactly by the end-to-end upgrades and the product
-// library's demo-world cases.
+// key paths, a new text file's lines. Changed values, files added, changed
+// and removed, and other machines' keys are shown exactly by the end-to-end
+// upgrades and the product library's demo-world cases.
 #include "sim/kxlsim/diff.h"
 #include "sim/kxlsim/snapshot.h"
 #include "sim/kxlsim/world_reader.h"
@@ -64,6 +64,15 @@ registry + HKCU\Software\Test
   EXPECT_EQ(diff(removed, true), 1);
   std::replace(added.begin(), added.end(), '+', '-');
   EXPECT_EQ(removed, added);
+}
+
+// The end-to-end upgrades pin a new file by its size and hash only.
+TEST_F(WorldPair, ANewSmallTextFileShowsItsLines) {
+  w_.writeText("C:\\notes.log", "new\r\n");
+  std::string text;
+  EXPECT_EQ(diff(text), 1);
+  EXPECT_EQ(text.rfind("file + C:\\notes.log (5 bytes, fnv ", 0), 0u) << text;
+  EXPECT_EQ(text.substr(text.find(')')), ")\n       + new\n");
 }
 
 TEST(DisplayKeyPath, MachinesAreNamedAndRootsShortened) {
