@@ -204,40 +204,28 @@ INSTANTIATE_TEST_SUITE_P(
                       FailureCase{4, true, nullptr, "sqloopenp:4", UPGRADE_RC_SQLCA, -1042},
                       FailureCase{4, true, nullptr, "sqlowrite:3", UPGRADE_RC_SQLCA, -1042}));
 
-class PartitionZeroTest : public EnvironmentTest {
-protected:
-  void SetUp() override {
-    EnvironmentTest::SetUp();
-    if (IsSkipped())
-      return;
-    addTemplate(4);
-  }
-
-  std::string nodesFile() const { return readText(std::string(kInstanceDir) + "\\kxlnodes.cfg"); }
-  std::string profileValue(const char *name) const {
-    return getString(copyKey(kCurrentCopy) + "\\PROFILES\\" + kInstance, name);
-  }
-
+TEST_F(EnvironmentTest, PartitionZeroFilledFromThisMachine) {
+  addTemplate(4);
   PartitionRecord record{};
-};
-
-TEST_F(PartitionZeroTest, FilledFromThisMachine) {
   ASSERT_EQ(0, create(4, &record));
   EXPECT_STREQ("server7", record.hostName);
   EXPECT_STREQ("SERVER7", record.computerName);
   ASSERT_NE('\0', record.portStart[0]);
   ASSERT_NE('\0', record.portEnd[0]);
-  EXPECT_EQ("0 server7 SERVER7 0 \r\n", nodesFile());
+  EXPECT_EQ("0 server7 SERVER7 0 \r\n", readText(std::string(kInstanceDir) + "\\kxlnodes.cfg"));
   EXPECT_EQ("@echo off\r\nSET KXLINSTANCE=INST1\r\n",
             readText(std::string(kInstanceDir) + "\\kxlprofile.bat"));
-  EXPECT_EQ(std::string(record.portStart) + ":" + record.portEnd, profileValue("KXLPORTRANGE"));
-  EXPECT_EQ("SERVER7", profileValue("KXLNODECOMPUTER"));
+  EXPECT_EQ(std::string(record.portStart) + ":" + record.portEnd,
+            getString(copyKey(kCurrentCopy) + "\\PROFILES\\INST1", "KXLPORTRANGE"));
+  EXPECT_EQ("SERVER7", getString(copyKey(kCurrentCopy) + "\\PROFILES\\INST1", "KXLNODECOMPUTER"));
   EXPECT_TRUE(keyExists(serviceKey("INST1-0")));
   EXPECT_NE(std::string::npos,
             readText("C:\\windows\\system32\\drivers\\etc\\services").find(record.portStart));
 }
 
-TEST_F(PartitionZeroTest, GivenValuesAreKeptAndNoPortsReserved) {
+TEST_F(EnvironmentTest, PartitionZeroGivenValuesAreKeptAndNoPortsReserved) {
+  addTemplate(4);
+  PartitionRecord record{};
   setString("SOFTWARE\\ZAV\\KXLSIM\\Hosts\\host2", "FullName", "host2.zav.example");
   std::snprintf(record.hostName, sizeof record.hostName, "host2");
   std::snprintf(record.computerName, sizeof record.computerName, "MACH2");
@@ -246,9 +234,9 @@ TEST_F(PartitionZeroTest, GivenValuesAreKeptAndNoPortsReserved) {
   std::snprintf(record.netName, sizeof record.netName, "net2");
   failCalls("sqloUpdateServiceFile:1");
   ASSERT_EQ(0, create(4, &record));
-  EXPECT_EQ("0 host2 MACH2 0 net2\r\n", nodesFile());
-  EXPECT_EQ("60000:60003", profileValue("KXLPORTRANGE"));
-  EXPECT_EQ("MACH2", profileValue("KXLNODECOMPUTER"));
+  EXPECT_EQ("0 host2 MACH2 0 net2\r\n", readText(std::string(kInstanceDir) + "\\kxlnodes.cfg"));
+  EXPECT_EQ("60000:60003", getString(copyKey(kCurrentCopy) + "\\PROFILES\\INST1", "KXLPORTRANGE"));
+  EXPECT_EQ("MACH2", getString(copyKey(kCurrentCopy) + "\\PROFILES\\INST1", "KXLNODECOMPUTER"));
 }
 
 } // namespace
