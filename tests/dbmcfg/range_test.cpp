@@ -114,37 +114,33 @@ void expectValue(double expected, double actual, const char *what, const Row &ro
     EXPECT_FLOAT_EQ(float(expected), float(actual)) << what << " at " << row.offset << ", node type " << type;
 }
 
-void expectRow(const Row &row, uint16_t type, double fix) {
+void expectRow(const Row &row, uint16_t type) {
   expectValue(row.good, checked(type, row, row.good), "in range", row, type);
   for (double outside : {row.below, row.above})
     if (!std::isnan(outside))
-      expectValue(fix, checked(type, row, outside), "outside", row, type);
+      expectValue(row.fix, checked(type, row, outside), "outside", row, type);
 }
 
-TEST(RangeCheckTest, EveryRowForServerNodeTypes) {
-  for (uint16_t type : {1, 3, 4, 5})
-    for (const Row &row : kRows)
-      expectRow(row, type, row.fix);
-  for (const Row &row : kType4Rows) {
-    expectRow(row, 4, row.fix);
-    for (uint16_t type : {1, 3, 5})
-      expectValue(0, checked(type, row, row.good), "cleared", row, type);
+// A type-2 target gets its own value where the row gives one; the type-4
+// rows are cleared for every other type. 1948 is left as it is in a type-2
+// target, and 44 is 3 there only when it was set.
+TEST(RangeCheckTest, EveryRowForEveryNodeType) {
+  for (uint16_t type : {1, 2, 3, 4, 5}) {
+    for (const Row &row : kRows) {
+      if (type == 2 && !std::isnan(row.type2))
+        expectValue(row.type2, checked(2, row, row.good), "type 2", row, 2);
+      else
+        expectRow(row, type);
+    }
+    for (const Row &row : kType4Rows) {
+      if (type == 4)
+        expectRow(row, 4);
+      else
+        expectValue(0, checked(type, row, row.good), "cleared", row, type);
+    }
   }
-}
-
-TEST(RangeCheckTest, EveryRowForTypeTwo) {
-  for (const Row &row : kRows) {
-    if (std::isnan(row.type2))
-      expectRow(row, 2, row.fix);
-    else
-      expectValue(row.type2, checked(2, row, row.good), "type 2", row, 2);
-  }
-  for (const Row &row : kType4Rows)
-    expectValue(0, checked(2, row, row.good), "type 2", row, 2);
-  Row heap{1948, U32, 0, kNone, kNone, 0, 0};
-  EXPECT_EQ(0, checked(2, heap, 0)) << "1948 is left as it is";
-  Row unset{44, U16, 0, kNone, kNone, 0, 0};
-  EXPECT_EQ(0, checked(2, unset, 0)) << "44 is 3 only when it was set";
+  EXPECT_EQ(0, checked(2, Row{1948, U32, 0, kNone, kNone, 0, 0}, 0));
+  EXPECT_EQ(0, checked(2, Row{44, U16, 0, kNone, kNone, 0, 0}, 0));
 }
 
 // 1940 is left when 1930 is 1 and 1948 takes the value at 88; a value at 808

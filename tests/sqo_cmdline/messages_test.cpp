@@ -40,36 +40,34 @@ TEST(ReplaceMessageToken, ReplacesTheQuotedPlaceholderWithinTheBuffer) {
   replaceMessageToken(nullptr, 16, "\"<x>\"", "7");
 }
 
-// The final messages without catalogs: the fallback lines.
-class MessageWorld : public kxltest::ProductWorld {
-protected:
-  template <typename Print> static std::string captured(Print print) {
-    testing::internal::CaptureStdout();
-    print();
-    return testing::internal::GetCapturedStdout();
-  }
+using MessageWorld = kxltest::ProductWorld;
 
-  UpgradeOptions options{};
-};
+template <typename Print> std::string captured(Print print) {
+  testing::internal::CaptureStdout();
+  print();
+  return testing::internal::GetCapturedStdout();
+}
 
+// The final messages without catalogs: the fallback lines, one line only when
+// the catalog text is missing, percent signs as typed.
 TEST_F(MessageWorld, FallbackLinesWithoutCatalogs) {
-  EXPECT_EQ("KXLIMIGR:syntax error, RC = -1946\n",
-            captured([&] { printInstanceMessage("KXLIMIGR", -1946, "syntax error", &options); }));
-  EXPECT_EQ("KXLIUPGRADE: processing completed successfully.\n",
-            captured([] { printSuccessMessage("KXLIUPGRADE", 1000); }));
+  UpgradeOptions options{};
   options.partitionRecord.textSearchReasonCode = 5;
-  EXPECT_EQ("KXLIMIGR:processing completed, RC = 1273\n",
-            captured([&] { printInstanceMessage("KXLIMIGR", 1273, "processing completed", &options); }))
-      << "one line only when the catalog text is missing";
-
   sqlca status;
   sqloinca(&status);
   sqlcaSetCode(status, -1092);
-  EXPECT_EQ("KXLIMIGR:processing complete, SQLCODE=-1092\n",
-            captured([&] { printSqlcaMessage("KXLIMIGR", &status, "processing complete"); }));
-  EXPECT_EQ("KXLIMIGR:%s%n, RC = -1918\n",
-            captured([] { printInstanceMessage("KXLIMIGR", -1918, "%s%n", nullptr); }))
-      << "percent signs stay as typed";
+  EXPECT_EQ("KXLIMIGR:syntax error, RC = -1946\n"
+            "KXLIUPGRADE: processing completed successfully.\n"
+            "KXLIMIGR:processing completed, RC = 1273\n"
+            "KXLIMIGR:processing complete, SQLCODE=-1092\n"
+            "KXLIMIGR:%s%n, RC = -1918\n",
+            captured([&] {
+              printInstanceMessage("KXLIMIGR", -1946, "syntax error", &options);
+              printSuccessMessage("KXLIUPGRADE", 1000);
+              printInstanceMessage("KXLIMIGR", 1273, "processing completed", &options);
+              printSqlcaMessage("KXLIMIGR", &status, "processing complete");
+              printInstanceMessage("KXLIMIGR", -1918, "%s%n", nullptr);
+            }));
 }
 
 TEST(SpliceRecordTokens, EachTokenStandsWhereItsPlaceholderStands) {
