@@ -97,46 +97,39 @@ TEST_F(CopyList, FindsCopiesIgnoringCaseAndKeepsTheCallersCursor) {
 
 class Copy : public InstallWorld {};
 
-TEST_F(Copy, RemovesOneTrailingBackslashFromItsPath) {
+// A copy's path loses one trailing backslash. A 32-bit view copy is
+// registered in the 32-bit view of the registry, which the default view does
+// not see, and needs its Components key; without the 32-bit view that key is
+// not required.
+TEST_F(Copy, ReadsItsPathAndTellsWhyItIsUnusable) {
   registerCopy("A", "C:\\Prog\\KXL\\");
   registerCopy("B", "C:\\Prog\\KXL");
   registerCopy("C", "C:\\Prog\\KXL\\\\");
-  const struct {
-    const char *copy;
-    const char *path;
-  } cases[] = {{"A", "C:\\Prog\\KXL"}, {"B", "C:\\Prog\\KXL"}, {"C", "C:\\Prog\\KXL\\"}};
-  for (const auto &c : cases) {
-    InstallCopy copy(c.copy, false, false);
-    char path[256] = {};
-    ASSERT_EQ(0u, copy.GetPath(path, sizeof path));
-    EXPECT_STREQ(c.path, path) << c.copy;
-  }
-}
-
-TEST_F(Copy, ReportsWhyItIsUnusable) {
-  InstallCopy missing("NOPE", false, false);
-  EXPECT_EQ(KXLI_COPY_UNREADABLE, missing.GetStatus());
-  // A 32-bit view copy is registered in the 32-bit view of the registry.
+  registerCopy("KXL64", "C:\\K64");
   const std::string view32Key = "SOFTWARE\\Wow6432Node\\ZAV\\KXL\\InstalledCopies\\KXL32";
   setString(view32Key, "KXL Path Name", "C:\\K32");
-  InstallCopy noComponents("KXL32", true, false);
-  EXPECT_EQ(KXLI_COPY_NO_COMPONENTS, noComponents.GetStatus());
-  EXPECT_EQ(KXLI_VIEW32, noComponents.GetRegistryView());
-  char path[256] = {};
-  ASSERT_EQ(0u, noComponents.GetPath(path, sizeof path));
-  EXPECT_STREQ("C:\\K32", path);
-  // The default view does not see it.
-  InstallCopy defaultView("KXL32", false, false);
-  EXPECT_EQ(KXLI_COPY_UNREADABLE, defaultView.GetStatus());
+  const struct {
+    const char *copy;
+    bool view32;
+    uint32_t status;
+    const char *path;
+  } rows[] = {{"A", false, KXLI_COPY_OK, "C:\\Prog\\KXL"},        {"B", false, KXLI_COPY_OK, "C:\\Prog\\KXL"},
+              {"C", false, KXLI_COPY_OK, "C:\\Prog\\KXL\\"},      {"KXL64", false, KXLI_COPY_OK, "C:\\K64"},
+              {"NOPE", false, KXLI_COPY_UNREADABLE, ""},          {"KXL32", false, KXLI_COPY_UNREADABLE, ""},
+              {"KXL32", true, KXLI_COPY_NO_COMPONENTS, "C:\\K32"}};
+  for (const auto &row : rows) {
+    InstallCopy copy(row.copy, row.view32, false);
+    EXPECT_EQ(row.status, copy.GetStatus()) << row.copy;
+    char path[256] = {};
+    copy.GetPath(path, sizeof path);
+    EXPECT_STREQ(row.path, path) << row.copy;
+    EXPECT_EQ(0, copy.GetComponents().GetCount());
+    EXPECT_TRUE(!row.view32 || copy.GetRegistryView() == KXLI_VIEW32);
+  }
   setString(view32Key + "\\COMPONENTS", "KXL Client", "");
   InstallCopy complete("KXL32", true, false);
   EXPECT_EQ(KXLI_COPY_OK, complete.GetStatus());
   EXPECT_EQ(Names({"KXL Client"}), strings(complete.GetComponents()));
-  // Without the 32-bit view the Components key is not required.
-  registerCopy("KXL64", "C:\\K64");
-  InstallCopy bare("KXL64", false, false);
-  EXPECT_EQ(KXLI_COPY_OK, bare.GetStatus());
-  EXPECT_EQ(0, bare.GetComponents().GetCount());
 }
 
 TEST_F(Copy, ListsItsComponentsFromTheMachineOrTheUser) {
