@@ -38,37 +38,29 @@ std::string run(const std::string &script) {
   auto list = std::make_unique<ILIST<Item>>();
   std::map<int, Item *> items;
   std::istringstream ops(script);
-  std::string op, out;
-  while (ops >> op) {
+  std::string out;
+  for (std::string op; ops >> op;) {
+    const bool null = op.size() > 1 && op[1] == '0' && op.back() == 'x';
+    const int value = op.size() > 1 && !null ? std::stoi(op.substr(1)) : 0;
+    Item stranger(value, &strangers);
     std::string said;
-    if (op == "+0x" || op == "-0x") {
-      said = code(op[0] == '+' ? list->Append(nullptr) : list->Remove(nullptr));
-    } else if (op[0] == '+') {
-      items[std::stoi(op.substr(1))] = new Item(std::stoi(op.substr(1)), &destroyed);
-      said = code(list->Append(items[std::stoi(op.substr(1))]));
+    if (op[0] == '+') {
+      Item *item = null ? nullptr : items[value] = new Item(value, &destroyed);
+      said = code(list->Append(item));
     } else if (op[0] == '-') {
-      Item stranger(std::stoi(op.substr(1)), &strangers);
-      auto found = items.find(stranger.value);
-      said = code(list->Remove(found != items.end() ? found->second : &stranger));
-    } else if (op == "n") {
-      said = valueOf(list->Next());
-    } else if (op == "c") {
-      said = valueOf(list->Current());
-    } else if (op == "w") {
-      list->Rewind();
-      continue;
+      said = code(list->Remove(null ? nullptr : items.contains(value) ? items[value] : &stranger));
     } else if (op == "r") {
-      said = "<";
       for (Item *item = list->Next(); item != nullptr; item = list->Next())
         said += valueOf(item);
-      said += ">";
-    } else if (op == "k") {
-      said = "#" + std::to_string(list->GetCount());
-    } else if (op == "d") {
-      said = "d" + std::to_string(destroyed);
-    } else if (op == "~") {
-      list.reset();
+      said = "<" + said + ">";
+    } else if (op == "w" || op == "~") {
+      op == "w" ? list->Rewind() : list.reset();
       continue;
+    } else {
+      said = op == "n"   ? valueOf(list->Next())
+             : op == "c" ? valueOf(list->Current())
+             : op == "k" ? "#" + std::to_string(list->GetCount())
+                         : "d" + std::to_string(destroyed);
     }
     out += (out.empty() ? "" : " ") + said;
   }
