@@ -201,7 +201,7 @@ TEST_F(ClusterOps, RegistersATypeOnceAndOnlyOnARunningNode) {
       << "an existing type counts as registered";
 }
 
-TEST_F(ClusterOps, ListsResourcesOfExactlyTheTypeInEnumerationOrder) {
+TEST_F(ClusterOps, ListsAndTestsResourcesOfExactlyTheTypeInEnumerationOrder) {
   ClusterResourceList found;
   ASSERT_EQ(util.GetResourcesOfType("KXL Server", found), 0);
   EXPECT_EQ(names(found), (std::vector<std::string>{"A-inst@G2", "C-inst@G1"}))
@@ -210,9 +210,6 @@ TEST_F(ClusterOps, ListsResourcesOfExactlyTheTypeInEnumerationOrder) {
   EXPECT_EQ(std::u16string(found[1].wideName), u"C-inst");
   EXPECT_EQ(std::u16string(found[1].wideGroup), u"G1");
   EXPECT_EQ(ofType("No Type"), none);
-}
-
-TEST_F(ClusterOps, TestsTheTypeOfAResource) {
   EXPECT_NE(util.IsResourceOfType("C-inst", "KXL Server"), 0);
   EXPECT_EQ(util.IsResourceOfType("B-disk", "KXL Server"), 0);
   EXPECT_EQ(util.IsResourceOfType("Missing", "KXL Server"), 0);
@@ -230,14 +227,13 @@ TEST_F(ClusterOps, ListsDependenciesWithEmptyGroupsAndLeavesOutOverlongNames) {
   EXPECT_EQ(dependenciesOf("Missing"), failed);
 }
 
-TEST_F(ClusterOps, DeletesResourcesAndCountsAMissingOneAsDeleted) {
+// A missing resource counts as deleted; a new one runs in its own monitor.
+TEST_F(ClusterOps, DeletesAndCreatesResources) {
   EXPECT_EQ(util.DeleteResource("B-disk"), 0);
   EXPECT_FALSE(keyExists(kResources + "B-disk"));
   EXPECT_EQ(util.DeleteResource("B-disk"), 0);
   EXPECT_EQ(util.DeleteResource(std::string(80, 'y').c_str()), 0);
-}
 
-TEST_F(ClusterOps, CreatesResourcesInTheirOwnMonitor) {
   HRESOURCE created = util.CreateResource("G1", "New-inst", "KXL Server");
   ASSERT_NE(created, nullptr);
   EXPECT_EQ(getString(kResources + "New-inst", "Type"), "KXL Server");
