@@ -111,17 +111,6 @@ TEST_F(EnvironmentTest, ConfigurationFileFailuresGive5005AndDropTheNewInstance) 
   }
 }
 
-TEST_F(EnvironmentTest, FailedReCreationPutsTheEarlierInstanceBack) {
-  addTemplate(1);
-  addOldInstance(1);
-  Bytes before = newConfig();
-  failCalls("sqlocpum:1");
-  EXPECT_EQ(SQLO_RC_SYSTEM_ERROR, create(1));
-  EXPECT_EQ(before, newConfig());
-  EXPECT_EQ(kOldCopy, getString(instanceKey(kInstance), "Copy"));
-  EXPECT_EQ(kOldProgram, getString(serviceKey(kInstance), "ImagePath"));
-}
-
 struct NameCase {
   const char *assistantName;
   int otherProfiles;          // instance profiles besides the new instance's own
