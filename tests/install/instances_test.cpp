@@ -94,12 +94,7 @@ TEST_F(Instances, ListFailsWhenTheInstanceRegistryFails) {
   // An entry whose copy cannot be read is never taken for an instance of the
   // version-8 installation: the walk fails.
   failCalls(nullptr);
-  HKEY key = nullptr;
-  ASSERT_EQ(ERROR_SUCCESS, RegOpenKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1", 0,
-                                         KEY_ALL_ACCESS, &key));
-  DWORD unreadable = 1;
-  RegSetValueExA(key, "Copy", 0, REG_DWORD, reinterpret_cast<const BYTE *>(&unreadable), sizeof unreadable);
-  RegCloseKey(key);
+  setDword("SOFTWARE\\ZAV\\KXLSIM\\Instances\\INST1", "Copy", 1);
   IKXLINSTANCELIST listed(KXLI_V8_COPY_NAME);
   EXPECT_EQ(1u, listed.status);
   IKXLINSTANCELIST owned("KXL95");
