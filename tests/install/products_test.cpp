@@ -21,20 +21,19 @@ protected:
     writeFile(installPath + "\\cfg\\kxl" + code + ".lvl", std::string("x"));
   }
 
-  static std::vector<std::string> editions(InstalledProdList &list) {
-    std::vector<std::string> all;
+  // Each product as "code edition rank node-type key components...".
+  static Names products(InstalledProdList &list) {
+    Names all;
     for (InstalledProd *product : elements(list)) {
       char edition[129] = {};
       EXPECT_EQ(0u, product->GetEditionName(edition, sizeof edition));
-      all.push_back(edition);
+      std::string line = std::string(product->GetInfo()->code) + " " + edition + " " +
+                         std::to_string(product->GetRankNumber()) + " " +
+                         std::to_string(product->GetSupportedNodeType()) + " " + product->GetInfo()->key;
+      for (const std::string &component : strings(product->GetComponents()))
+        line += " " + component;
+      all.push_back(line);
     }
-    return all;
-  }
-
-  static std::vector<std::string> codes(InstalledProdList &list) {
-    std::vector<std::string> all;
-    for (InstalledProd *product : elements(list))
-      all.push_back(product->GetInfo()->code);
     return all;
   }
 
@@ -132,16 +131,10 @@ TEST_F(Products, OfACurrentCopyAreListedInTableOrder) {
   InstallCopy copy("KXL101", false, false);
   InstalledProdList *list = nullptr;
   ASSERT_EQ(0u, copy.GetInstalledProdList(&list));
-  EXPECT_EQ(Names({"hpe", "tlv", "cli"}), codes(*list));
-  EXPECT_EQ(Names({"HALDOR_PRIME_EDITION", "TALVEN_EDITION", "CLIENT"}), editions(*list));
-  std::vector<InstalledProd *> all = elements(*list);
-  EXPECT_EQ(1u, all[0]->GetRankNumber());
-  EXPECT_EQ(4, all[0]->GetSupportedNodeType());
-  EXPECT_STREQ(kServerCodeNext, all[0]->registeredCode);
-  EXPECT_STREQ("PROD_HALDOR_PRIME", all[0]->GetInfo()->key);
-  EXPECT_EQ(Names({"Engine"}), strings(all[0]->GetComponents()));
-  EXPECT_EQ(3, all[1]->GetSupportedNodeType());
-  EXPECT_EQ(-1, all[2]->GetSupportedNodeType());
+  EXPECT_EQ(Names({"hpe HALDOR_PRIME_EDITION 1 4 PROD_HALDOR_PRIME Engine",
+                   "tlv TALVEN_EDITION 5 3 PROD_TALVEN", "cli CLIENT 9 -1 PROD_CLIENT"}),
+            products(*list));
+  EXPECT_STREQ(kServerCodeNext, elements(*list)[0]->registeredCode);
   InstalledProdList *again = nullptr;
   ASSERT_EQ(0u, copy.GetInstalledProdList(&again));
   EXPECT_EQ(list, again);
@@ -151,7 +144,9 @@ TEST_F(Products, OfACurrentCopyAreListedInTableOrder) {
   setValue(HKEY_CURRENT_USER, productKey, "Own Engine", "");
   InstallCopy perUser("KXL101", false, false);
   ASSERT_EQ(0u, perUser.GetInstalledProdList(&list));
-  EXPECT_EQ(Names({"Own Engine"}), strings(elements(*list)[0]->GetComponents()));
+  EXPECT_EQ(Names({"hpe HALDOR_PRIME_EDITION 1 4 PROD_HALDOR_PRIME Own Engine",
+                   "tlv TALVEN_EDITION 5 3 PROD_TALVEN", "cli CLIENT 9 -1 PROD_CLIENT"}),
+            products(*list));
 }
 
 TEST_F(Products, OfTheVersion8InstallationListOneVariantPerProduct) {
@@ -161,7 +156,9 @@ TEST_F(Products, OfTheVersion8InstallationListOneVariantPerProduct) {
   InstallCopy copy(KXLI_V8_COPY_NAME, false, false);
   InstalledProdList *list = nullptr;
   ASSERT_EQ(0u, copy.GetInstalledProdList(&list));
-  EXPECT_EQ(Names({"srv", "tpd", "rtc"}), codes(*list));
+  EXPECT_EQ(Names({"srv KESSEL_SERVER 0 0 PROD_KESSEL", "tpd TAMBRO_DEVELOPER 0 0 PROD_TAMBRO",
+                   "rtc RUNTIME_CLIENT 0 0 PROD_RUNTIME"}),
+            products(*list));
   EXPECT_STREQ("KXL Server Edition.msi", elements(*list)[0]->GetInfo()->packageFile);
 }
 
