@@ -1,9 +1,8 @@
 // Files, directories and programs: open flags, copies and their failure
-// codes, whole trees, path tests and directory creation, quoted paths; the
-// command line a program receives, its exit code, and the failure codes when
-// it cannot be started. Programs run by name and with an argument block, and
-// injected failures, are driven by the command (the end-to-end upgrade's
-// program events, tests/driver).
+// codes, whole trees, path tests, quoted paths; the command line a program
+// receives, its exit code, and the failure codes when it cannot start. Runs by
+// name, argument blocks and injected failures are driven by the command
+// (the end-to-end upgrade's program events, tests/driver).
 #include "sim/product/cmdline.h"
 #include "tests/support/product_world.h"
 
@@ -192,14 +191,11 @@ TEST_F(Files, TreeCopyShowsItsProgressOnAConsoleOnly) {
   unsetenv("KXLSIM_PROGRESS_AFTER_MS");
 }
 
-TEST_F(Files, DeleteRemovesFilesOnly) {
+TEST_F(Files, DeletionPathTestsAndDirectoryCreation) {
   writeFile("C:\\d\\f.txt", "x");
   EXPECT_EQ(SQLO_RC_ACCESS_DENIED, sqlodelete("C:\\d", 0));
   EXPECT_EQ(0, sqlodelete("C:\\d\\f.txt", 0));
   EXPECT_EQ(SQLO_RC_FILE_NOT_FOUND, sqlodelete("C:\\d\\f.txt", 0));
-}
-
-TEST_F(Files, PathTestsAndDirectoryCreation) {
   writeFile("C:\\p\\file.txt", "x");
   EXPECT_EQ(0u, pathTest("C:\\p\\file.txt"));
   EXPECT_EQ(0u, pathTest("C:\\p"));

@@ -1,7 +1,6 @@
-// Service configuration on this and other machines, the services file, host
-// names and measures; the work of the audit and SSL configuration programs and
-// of the profile clean-up. What the upgrade's services step relies on is
-// driven through it in tests/services_env; here what those cases cannot see.
+// Services on this and other machines, the services file, host names,
+// measures, and the configuration programs' work: what the services step's
+// own cases (tests/services_env) cannot see.
 #include "demo_world.h"
 
 #include "sim/posix/world.h"
