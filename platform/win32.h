@@ -156,8 +156,6 @@ typedef struct _OVERLAPPED OVERLAPPED, *LPOVERLAPPED;
 #define KEY_ENUMERATE_SUB_KEYS 0x0008
 #define KEY_NOTIFY 0x0010
 #define KEY_CREATE_LINK 0x0020
-#define KEY_WOW64_64KEY 0x0100
-#define KEY_WOW64_32KEY 0x0200
 #define KEY_READ 0x20019
 #define KEY_WRITE 0x20006
 #define KEY_EXECUTE 0x20019
@@ -176,7 +174,6 @@ typedef struct _OVERLAPPED OVERLAPPED, *LPOVERLAPPED;
 #define INVALID_FILE_ATTRIBUTES ((DWORD)-1)
 #define INVALID_HANDLE_VALUE ((HANDLE)(LONG_PTR)-1)
 #define INVALID_FILE_SIZE ((DWORD)0xFFFFFFFF)
-#define INVALID_SET_FILE_POINTER ((DWORD)-1)
 
 #define GENERIC_READ 0x80000000
 #define GENERIC_WRITE 0x40000000
@@ -188,9 +185,6 @@ typedef struct _OVERLAPPED OVERLAPPED, *LPOVERLAPPED;
 #define OPEN_EXISTING 3
 #define OPEN_ALWAYS 4
 #define TRUNCATE_EXISTING 5
-#define FILE_BEGIN 0
-#define FILE_CURRENT 1
-#define FILE_END 2
 #define MOVEFILE_REPLACE_EXISTING 0x00000001
 #define MOVEFILE_WRITE_THROUGH 0x00000008
 
@@ -247,7 +241,6 @@ typedef struct _PROCESS_INFORMATION {
 
 // Code pages.
 #define CP_ACP 0
-#define CP_UTF8 65001
 
 // Windows Installer.
 typedef int INSTALLSTATE;
@@ -289,7 +282,6 @@ HANDLE FindFirstFileA(LPCSTR lpFileName, LPWIN32_FIND_DATAA lpFindFileData);
 BOOL FindNextFileA(HANDLE hFindFile, LPWIN32_FIND_DATAA lpFindFileData);
 BOOL FindClose(HANDLE hFindFile);
 DWORD GetCurrentDirectoryA(DWORD nBufferLength, LPSTR lpBuffer);
-BOOL SetCurrentDirectoryA(LPCSTR lpPathName);
 DWORD GetTempPathA(DWORD nBufferLength, LPSTR lpBuffer);
 BOOL CreateDirectoryA(LPCSTR lpPathName, LPSECURITY_ATTRIBUTES lpSecurityAttributes);
 BOOL RemoveDirectoryA(LPCSTR lpPathName);
@@ -318,7 +310,6 @@ BOOL ReadFile(HANDLE hFile, LPVOID lpBuffer, DWORD nNumberOfBytesToRead, LPDWORD
               LPOVERLAPPED lpOverlapped);
 BOOL WriteFile(HANDLE hFile, LPCVOID lpBuffer, DWORD nNumberOfBytesToWrite,
                LPDWORD lpNumberOfBytesWritten, LPOVERLAPPED lpOverlapped);
-DWORD SetFilePointer(HANDLE hFile, LONG lDistanceToMove, PLONG lpDistanceToMoveHigh, DWORD dwMoveMethod);
 DWORD GetFileSize(HANDLE hFile, LPDWORD lpFileSizeHigh);
 BOOL CloseHandle(HANDLE hObject);
 

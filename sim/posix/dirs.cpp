@@ -112,22 +112,6 @@ DWORD GetCurrentDirectoryA(DWORD nBufferLength, LPSTR lpBuffer) {
   return copyStringOut(currentWindowsDirectory(), lpBuffer, nBufferLength);
 }
 
-BOOL SetCurrentDirectoryA(LPCSTR lpPathName) {
-  if (kxlsim::shouldFail("SetCurrentDirectoryA"))
-    return failWith(ERROR_ACCESS_DENIED, FALSE);
-  std::string host;
-  if (!mapPath(lpPathName, host))
-    return FALSE;
-  struct stat info {};
-  if (stat(host.c_str(), &info) != 0)
-    return failWith(win32ErrorFromErrno(errno, host), FALSE);
-  if (!S_ISDIR(info.st_mode))
-    return failWith(kErrorDirectory, FALSE);
-  if (chdir(host.c_str()) != 0)
-    return failWith(win32ErrorFromErrno(errno, host), FALSE);
-  return TRUE;
-}
-
 DWORD GetTempPathA(DWORD nBufferLength, LPSTR lpBuffer) {
   if (kxlsim::shouldFail("GetTempPathA"))
     return failWith(ERROR_PATH_NOT_FOUND, DWORD{0});

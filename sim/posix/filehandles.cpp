@@ -25,7 +25,6 @@ FileObject::~FileObject() {
 
 namespace {
 
-constexpr DWORD kErrorNegativeSeek = 131;
 
 // open(2) flags for a creation disposition; false for an unknown one.
 bool dispositionFlags(DWORD disposition, int &flags) {
@@ -145,36 +144,6 @@ BOOL WriteFile(HANDLE hFile, LPCVOID lpBuffer, DWORD nNumberOfBytesToWrite, LPDW
   if (lpNumberOfBytesWritten != nullptr)
     *lpNumberOfBytesWritten = total;
   return TRUE;
-}
-
-DWORD SetFilePointer(HANDLE hFile, LONG lDistanceToMove, PLONG lpDistanceToMoveHigh, DWORD dwMoveMethod) {
-  if (kxlsim::shouldFail("SetFilePointer"))
-    return failWith(ERROR_INVALID_PARAMETER, INVALID_SET_FILE_POINTER);
-  FileObject *file = fileOf(hFile);
-  if (file == nullptr)
-    return failWith(ERROR_INVALID_HANDLE, INVALID_SET_FILE_POINTER);
-  static const int whence[] = {SEEK_SET, SEEK_CUR, SEEK_END};
-  if (dwMoveMethod > FILE_END)
-    return failWith(ERROR_INVALID_PARAMETER, INVALID_SET_FILE_POINTER);
-  long long distance = lDistanceToMove;
-  if (lpDistanceToMoveHigh != nullptr)
-    distance = static_cast<long long>(
-        (static_cast<unsigned long long>(static_cast<DWORD>(*lpDistanceToMoveHigh)) << 32) |
-        static_cast<DWORD>(lDistanceToMove));
-  off_t now = lseek(file->fd, 0, SEEK_CUR);
-  off_t end = lseek(file->fd, 0, SEEK_END);
-  lseek(file->fd, now, SEEK_SET);
-  long long base = dwMoveMethod == FILE_BEGIN ? 0 : dwMoveMethod == FILE_CURRENT ? now : end;
-  if (base + distance < 0)
-    return failWith(kErrorNegativeSeek, INVALID_SET_FILE_POINTER);
-  off_t moved = lseek(file->fd, static_cast<off_t>(distance), whence[dwMoveMethod]);
-  if (moved < 0)
-    return failWith(ERROR_INVALID_PARAMETER, INVALID_SET_FILE_POINTER);
-  unsigned long long position = static_cast<unsigned long long>(moved);
-  if (lpDistanceToMoveHigh != nullptr)
-    *lpDistanceToMoveHigh = static_cast<LONG>(position >> 32);
-  SetLastError(ERROR_SUCCESS);
-  return static_cast<DWORD>(position & 0xFFFFFFFFULL);
 }
 
 DWORD GetFileSize(HANDLE hFile, LPDWORD lpFileSizeHigh) {

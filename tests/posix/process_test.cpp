@@ -1,8 +1,6 @@
 // Programs of the world started through CreateProcessA, the module path, the
-// environment and the computer name.
+// computer name and the code page.
 #include "tests/support/world_access.h"
-
-#include "sim/posix/cmdline.h"
 
 #include <cstdlib>
 #include <filesystem>
@@ -18,8 +16,8 @@ class ProcessTest : public kxltest::WorldTest {
 protected:
   void SetUp() override {
     WorldTest::SetUp();
-    std::filesystem::create_directories(host("drive_c/KXL/bin"));
-    ASSERT_EQ(symlink(KXL_POSIX_CHILD, host("drive_c/KXL/bin/child.exe").c_str()), 0);
+    std::filesystem::create_directories(host("drive_c/KXL/my bin"));
+    ASSERT_EQ(symlink(KXL_POSIX_CHILD, host("drive_c/KXL/my bin/child.exe").c_str()), 0);
     setenv("KXL_CHILD_REPORT", host("report.txt").c_str(), 1);
   }
   void TearDown() override {
@@ -60,11 +58,16 @@ TEST_F(ProcessTest, ChildGetsQuotedArgumentsEnvironmentAndDirectoryAndReturnsIts
   std::filesystem::create_directories(host("drive_c/Work"));
   ASSERT_TRUE(SetEnvironmentVariableA("KXL_CHILD_VALUE", "inherited"));
   ASSERT_TRUE(SetEnvironmentVariableA("KXL_CHILD_EXIT", "200"));
-  EXPECT_EQ(run(nullptr, R"("C:\KXL\bin\child.exe" plain "with space" a\\\"b "" tail\)", "c:\\work"), 200);
-  EXPECT_EQ(reportLines("arg="), (std::vector<std::string>{"plain", "with space", "a\\\"b", "", "tail\\"}));
+  EXPECT_EQ(
+      run(nullptr,
+          R"( "C:\KXL\my bin\child.exe"  plain  "with space" a\\\"b "" a\\b a\\\\"b c" "a""b" x"y z"w tail\)",
+          "c:\\work"),
+      200);
+  EXPECT_EQ(reportLines("arg="), (std::vector<std::string>{"plain", "with space", "a\\\"b", "", "a\\\\b",
+                                                           "a\\\\b c", "a\"b", "xy zw", "tail\\"}));
   EXPECT_EQ(reportLines("value="), std::vector<std::string>{"inherited"});
   EXPECT_EQ(reportLines("cwd="), std::vector<std::string>{host("drive_c/Work")});
-  EXPECT_EQ(reportLines("module="), std::vector<std::string>{"C:\\KXL\\bin\\child.exe"})
+  EXPECT_EQ(reportLines("module="), std::vector<std::string>{"C:\\KXL\\my bin\\child.exe"})
       << "a program started through a link reports the link's location";
 }
 
@@ -84,7 +87,7 @@ TEST_F(ProcessTest, ProgramsNamedWithoutPathAreSearchedInSystemDirectoryAndPath)
 
   EXPECT_EQ(run(nullptr, "noprog.exe"), -1);
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
-  EXPECT_EQ(run("C:\\KXL\\bin\\child.exe", "", "C:\\NoSuchDir"), -1);
+  EXPECT_EQ(run("C:\\KXL\\my bin\\child.exe", "", "C:\\NoSuchDir"), -1);
   EXPECT_EQ(GetLastError(), 267u);
 }
 
@@ -92,7 +95,7 @@ TEST_F(ProcessTest, RunningChildIsStillActiveUntilItEnds) {
   setenv("KXL_CHILD_WAIT_FOR", host("go").c_str(), 1);
   STARTUPINFOA startup{};
   PROCESS_INFORMATION info{};
-  char commandLine[] = "C:\\KXL\\bin\\child.exe";
+  char commandLine[] = "\"C:\\KXL\\my bin\\child.exe\"";
   ASSERT_TRUE(
       CreateProcessA(nullptr, commandLine, nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup, &info));
   EXPECT_EQ(WaitForSingleObject(info.hProcess, 0), static_cast<DWORD>(WAIT_TIMEOUT));
@@ -119,15 +122,6 @@ TEST_F(ProcessTest, ModuleFileNameIsCutToTheBufferAsWindowsDoes) {
   EXPECT_EQ(std::string(cut), std::string(full, 4));
 }
 
-TEST_F(ProcessTest, EnvironmentNamesIgnoreCase) {
-  ASSERT_TRUE(SetEnvironmentVariableA("KxlMixedName", "value1"));
-  char buffer[16];
-  EXPECT_EQ(GetEnvironmentVariableA("KXLMIXEDNAME", buffer, sizeof buffer), 6u);
-  ASSERT_TRUE(SetEnvironmentVariableA("kxlmixedname", nullptr));
-  EXPECT_EQ(GetEnvironmentVariableA("KxlMixedName", buffer, sizeof buffer), 0u);
-  EXPECT_FALSE(SetEnvironmentVariableA("A=B", "x"));
-}
-
 TEST_F(ProcessTest, ComputerNameComesFromTheWorldsIdentity) {
   char buffer[32];
   DWORD size = sizeof buffer;
@@ -145,16 +139,20 @@ TEST_F(ProcessTest, ComputerNameComesFromTheWorldsIdentity) {
   EXPECT_STREQ(buffer, "NODE7");
 }
 
-TEST(CommandLineSplit, FollowsWindowsQuotingAndBackslashRules) {
-  using kxlsim::posix::splitArguments;
-  EXPECT_EQ(splitArguments(R"(  a  "b c"  d)"), (std::vector<std::string>{"a", "b c", "d"}));
-  EXPECT_EQ(splitArguments(R"(a\\b a\\\\"b c" a\"b)"),
-            (std::vector<std::string>{"a\\\\b", "a\\\\b c", "a\"b"}));
-  EXPECT_EQ(splitArguments(R"("a""b" "")"), (std::vector<std::string>{"a\"b", ""}));
-  EXPECT_EQ(splitArguments(R"(x"y z"w)"), std::vector<std::string>{"xy zw"});
-  std::string rest;
-  EXPECT_EQ(kxlsim::posix::programToken(R"("C:\Program Files\p.exe" -x)", rest), "C:\\Program Files\\p.exe");
-  EXPECT_EQ(rest, " -x");
+// The machine's ANSI code page is Latin-1: one byte to one unit, and what it cannot hold is marked.
+TEST(CodePages, AnsiIsOneByteToOneUnitAndMarksWhatItCannotHold) {
+  const char latin[] = "caf\xE9";
+  WCHAR wide[8];
+  ASSERT_EQ(MultiByteToWideChar(CP_ACP, 0, latin, -1, wide, 8), 5);
+  EXPECT_EQ(wide[3], 0x00E9);
+  char back[8];
+  ASSERT_EQ(WideCharToMultiByte(CP_ACP, 0, wide, -1, back, sizeof back, nullptr, nullptr), 5);
+  EXPECT_STREQ(back, latin);
+  const WCHAR foreign[] = {u'a', 0x20AC, 0};
+  BOOL usedDefault = FALSE;
+  ASSERT_EQ(WideCharToMultiByte(CP_ACP, 0, foreign, -1, back, sizeof back, nullptr, &usedDefault), 3);
+  EXPECT_STREQ(back, "a?");
+  EXPECT_TRUE(usedDefault);
 }
 
 } // namespace

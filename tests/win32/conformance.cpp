@@ -106,18 +106,13 @@ void FilesTest::SetUp() {
   if (HasFatalFailure())
     return;
   char buffer[MAX_PATH];
-  DWORD n = GetCurrentDirectoryA(sizeof buffer, buffer);
-  ASSERT_TRUE(n > 0 && n < sizeof buffer);
-  savedCwd_ = buffer;
-  n = GetTempPathA(sizeof buffer, buffer);
+  DWORD n = GetTempPathA(sizeof buffer, buffer);
   ASSERT_TRUE(n > 0 && n < sizeof buffer);
   dir_ = std::string(buffer) + uniqueName();
   ASSERT_TRUE(CreateDirectoryA(dir_.c_str(), nullptr)) << dir_ << " error " << GetLastError();
 }
 
 void FilesTest::TearDown() {
-  if (!savedCwd_.empty())
-    SetCurrentDirectoryA(savedCwd_.c_str());
   if (!dir_.empty())
     removeTree(dir_);
   Win32Test::TearDown();

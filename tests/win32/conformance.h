@@ -92,9 +92,6 @@ protected:
   static void removeTree(const std::string &path);
 
   std::string dir_;
-
-private:
-  std::string savedCwd_;
 };
 
 } // namespace kxltest

@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <functional>
 #include <set>
 #include <string>
 
@@ -12,11 +13,12 @@ namespace kxltest {
 namespace {
 
 using std::string;
+using Names = std::set<string>;
 
 // Names an enumeration finds, with the last error that ended it.
 struct Found {
-  std::set<string> names;
-  std::set<string> folders;
+  Names names;
+  Names folders;
   DWORD end = 0;
 };
 
@@ -43,129 +45,77 @@ HANDLE createWith(const string &path, DWORD access, DWORD disposition) {
                      nullptr);
 }
 
-DWORD failureOf(const string &path, DWORD access, DWORD disposition) {
-  return errorOf([&] {
-    HANDLE h = createWith(path, access, disposition);
-    return h != INVALID_HANDLE_VALUE && CloseHandle(h);
-  });
-}
-
-DWORD attributesError(const string &path) {
-  return errorOf([&] { return GetFileAttributesA(path.c_str()) != INVALID_FILE_ATTRIBUTES; });
-}
-
-// --- Attributes and folders ----------------------------------------------
-
-TEST_F(FilesTest, AttributesOfAFolderAreExactlyTheDirectoryBit) {
-  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY), GetFileAttributesA(dir_.c_str()));
-  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY), GetFileAttributesA((dir_ + "\\").c_str()));
-  // Names are matched ignoring case.
+// A folder's attributes are exactly the directory bit, a new file is marked for archiving; a
+// missing name tells a missing file from a missing folder. Names are matched ignoring case.
+TEST_F(FilesTest, AttributesTellFoldersFilesAndWhatIsMissing) {
+  ASSERT_TRUE(writeFile(at("plain.txt"), "x"));
   string upper = dir_;
   for (char &c : upper)
     c = static_cast<char>(std::toupper(static_cast<unsigned char>(c)));
-  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY), GetFileAttributesA(upper.c_str()));
-}
-
-TEST_F(FilesTest, AttributesOfANewFileMarkItForArchiving) {
-  ASSERT_TRUE(writeFile(at("plain.txt"), "x"));
-  DWORD attributes = GetFileAttributesA(at("plain.txt").c_str());
-  ASSERT_NE(INVALID_FILE_ATTRIBUTES, attributes);
-  EXPECT_EQ(0u, attributes & FILE_ATTRIBUTE_DIRECTORY);
-  EXPECT_NE(0u, attributes & FILE_ATTRIBUTE_ARCHIVE);
-}
-
-TEST_F(FilesTest, AttributesOfMissingPathsTellFileFromPath) {
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), attributesError(at("missing.txt")));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), attributesError(at("nofolder\\missing.txt")));
-}
-
-TEST_F(FilesTest, CreateDirectoryFailsOnExistingAndMissingParent) {
-  auto mkdir = [](const string &path) {
-    return errorOf([&] { return CreateDirectoryA(path.c_str(), nullptr); });
+  const struct {
+    string path;
+    DWORD attributes, error; // the attributes under the mask, or the error
+  } rows[] = {
+      {dir_, FILE_ATTRIBUTE_DIRECTORY, 0},
+      {dir_ + "\\", FILE_ATTRIBUTE_DIRECTORY, 0},
+      {upper, FILE_ATTRIBUTE_DIRECTORY, 0},
+      {at("plain.txt"), FILE_ATTRIBUTE_ARCHIVE, 0},
+      {at("missing.txt"), INVALID_FILE_ATTRIBUTES, ERROR_FILE_NOT_FOUND},
+      {at("nofolder\\missing.txt"), INVALID_FILE_ATTRIBUTES, ERROR_PATH_NOT_FOUND},
   };
-  ASSERT_TRUE(writeFile(at("file"), "x"));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), mkdir(dir_));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS), mkdir(at("file")));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), mkdir(at("missing\\child")));
-  EXPECT_TRUE(CreateDirectoryA(at("child").c_str(), nullptr));
+  for (const auto &row : rows) {
+    SetLastError(0);
+    DWORD attributes = GetFileAttributesA(row.path.c_str());
+    DWORD mask = row.attributes == FILE_ATTRIBUTE_ARCHIVE ? FILE_ATTRIBUTE_ARCHIVE | FILE_ATTRIBUTE_DIRECTORY
+                                                          : INVALID_FILE_ATTRIBUTES;
+    EXPECT_EQ(row.attributes, attributes & mask) << row.path;
+    EXPECT_EQ(row.error, row.error != 0 ? GetLastError() : 0u) << row.path;
+  }
 }
 
-// --- Finding files -------------------------------------------------------
-
-TEST_F(FilesTest, FindGivesTheStoredNameWhenAskedInAnotherCase) {
-  ASSERT_TRUE(writeFile(at("MixedName.Txt"), "12345"));
-  WIN32_FIND_DATAA entry;
-  HANDLE find = FindFirstFileA(at("MIXEDNAME.TXT").c_str(), &entry);
-  ASSERT_NE(INVALID_HANDLE_VALUE, find);
-  EXPECT_STREQ("MixedName.Txt", entry.cFileName);
-  EXPECT_EQ(5u, entry.nFileSizeLow);
-  EXPECT_EQ(0u, entry.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY);
-  EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), errorOf([&] { return FindNextFileA(find, &entry); }));
-  EXPECT_TRUE(FindClose(find));
-}
-
-TEST_F(FilesTest, WildcardsMatchIgnoringCaseAndListFolders) {
-  for (const char *name : {"a.txt", "b.TXT", "c.log"})
+TEST_F(FilesTest, FindGivesStoredNamesAndListsFolders) {
+  for (const char *name : {"a.txt", "MixedName.TXT", "c.log"})
     ASSERT_TRUE(writeFile(at(name), name));
   ASSERT_TRUE(CreateDirectoryA(at("sub").c_str(), nullptr));
 
+  WIN32_FIND_DATAA entry;
+  HANDLE find = FindFirstFileA(at("MIXEDNAME.txt").c_str(), &entry);
+  ASSERT_NE(INVALID_HANDLE_VALUE, find);
+  EXPECT_STREQ("MixedName.TXT", entry.cFileName);
+  EXPECT_EQ(13u, entry.nFileSizeLow);
+  EXPECT_EQ(0u, entry.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY);
+  EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), errorOf([&] { return FindNextFileA(find, &entry); }));
+  EXPECT_TRUE(FindClose(find));
+
   Found texts = findAll(at("*.txt"));
-  EXPECT_EQ((std::set<string>{"a.txt", "b.TXT"}), texts.names);
+  EXPECT_EQ((Names{"a.txt", "MixedName.TXT"}), texts.names);
   EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), texts.end);
-
-  // A folder other than a drive's root lists itself and its parent too.
+  // A folder other than a drive's root lists itself and its parent too, even when empty.
   Found all = findAll(at("*"));
-  EXPECT_EQ((std::set<string>{".", "..", "a.txt", "b.TXT", "c.log", "sub"}), all.names);
-  EXPECT_EQ((std::set<string>{".", "..", "sub"}), all.folders);
-
-  // An empty one lists those two as well: finding nothing there is a failure.
+  EXPECT_EQ((Names{".", "..", "a.txt", "MixedName.TXT", "c.log", "sub"}), all.names);
+  EXPECT_EQ((Names{".", "..", "sub"}), all.folders);
   Found empty = findAll(at("sub\\*"));
-  EXPECT_EQ((std::set<string>{".", ".."}), empty.names);
+  EXPECT_EQ((Names{".", ".."}), empty.names);
   EXPECT_EQ(static_cast<DWORD>(ERROR_NO_MORE_FILES), empty.end);
-}
-
-TEST_F(FilesTest, FindWithoutMatchTellsFileFromPath) {
   EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), findAll(at("*.none")).end);
   EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND), findAll(at("nofolder\\*")).end);
 }
 
-// --- Current and temporary folders ---------------------------------------
-
 // A buffer too small (or none) gets the size needed with the terminator; one that fits gets
-// the path and its length without it. Returns the path.
-string checkPathBufferRules(DWORD(WINAPI *getPath)(DWORD, LPSTR)) {
-  DWORD needed = getPath(0, nullptr);
-  EXPECT_GT(needed, 1u);
-  char buffer[MAX_PATH];
-  if (needed <= 1 || needed > sizeof buffer) {
-    ADD_FAILURE() << "needed size " << needed;
-    return string();
+// the path and its length without it. The temporary folder ends with a backslash.
+TEST_F(FilesTest, FolderPathsReportTheNeededSize) {
+  for (bool temp : {false, true}) {
+    auto getPath = temp ? GetTempPathA : GetCurrentDirectoryA;
+    DWORD needed = getPath(0, nullptr);
+    char buffer[MAX_PATH], small[MAX_PATH];
+    ASSERT_TRUE(needed > 1 && needed <= sizeof buffer) << needed;
+    EXPECT_EQ(needed - 1, getPath(needed, buffer));
+    EXPECT_EQ(needed - 1, std::strlen(buffer));
+    EXPECT_EQ(needed, getPath(needed - 1, small));
+    EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY),
+              GetFileAttributesA(buffer) & FILE_ATTRIBUTE_DIRECTORY);
+    EXPECT_TRUE(!temp || buffer[needed - 2] == '\\') << buffer;
   }
-  EXPECT_EQ(needed - 1, getPath(needed, buffer));
-  EXPECT_EQ(needed - 1, std::strlen(buffer));
-  char small[MAX_PATH];
-  EXPECT_EQ(needed, getPath(needed - 1, small));
-  return buffer;
-}
-
-TEST_F(FilesTest, CurrentDirectoryReportsTheNeededSizeWhenTooSmall) {
-  checkPathBufferRules(GetCurrentDirectoryA);
-
-  char buffer[MAX_PATH];
-  ASSERT_TRUE(SetCurrentDirectoryA(dir_.c_str()));
-  ASSERT_EQ(dir_.size(), GetCurrentDirectoryA(sizeof buffer, buffer));
-  EXPECT_EQ(dir_, string(buffer));
-  // Relative names resolve against it.
-  ASSERT_TRUE(writeFile("relative.txt", "r"));
-  EXPECT_EQ("r", readFile(at("relative.txt")));
-}
-
-TEST_F(FilesTest, TempPathEndsWithABackslashAndReportsTheNeededSize) {
-  string temp = checkPathBufferRules(GetTempPathA);
-  ASSERT_FALSE(temp.empty());
-  EXPECT_EQ('\\', temp.back());
-  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY),
-            GetFileAttributesA(temp.c_str()) & FILE_ATTRIBUTE_DIRECTORY);
 }
 
 // The run time puts names in the folder named by TMP when that is set, so the
@@ -193,43 +143,18 @@ TEST_F(FilesTest, TempnamGivesFreshNamesWithThePrefix) {
 
 TEST_F(FilesTest, AccessTellsExistingFromMissing) {
   ASSERT_TRUE(writeFile(at("present.txt"), "x"));
-  EXPECT_EQ(0, _access(at("present.txt").c_str(), 0));
-  EXPECT_EQ(0, _access(at("present.txt").c_str(), 2));
-  EXPECT_EQ(0, _access(dir_.c_str(), 0));
-  errno = 0;
-  EXPECT_EQ(-1, _access(at("missing.txt").c_str(), 0));
-  EXPECT_EQ(ENOENT, errno);
-}
-
-// --- Copying and creating files ------------------------------------------
-
-TEST_F(FilesTest, CopyFileHonoursFailIfExists) {
-  ASSERT_TRUE(writeFile(at("source"), "first"));
-  ASSERT_TRUE(writeFile(at("target"), "second"));
-  auto copy = [this](const char *from, const char *to, BOOL failIfExists) {
-    return errorOf([&] { return CopyFileA(at(from).c_str(), at(to).c_str(), failIfExists); });
-  };
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_EXISTS), copy("source", "target", TRUE));
-  EXPECT_EQ("second", readFile(at("target")));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_SUCCESS), copy("source", "target", FALSE));
-  EXPECT_EQ("first", readFile(at("target")));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_SUCCESS), copy("source", "fresh", TRUE));
-  EXPECT_EQ("first", readFile(at("fresh")));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), copy("missing", "other", FALSE));
-}
-
-TEST_F(FilesTest, CreateFileNewAndOpenExistingFailOnTheWrongState) {
-  ASSERT_TRUE(writeFile(at("exists"), "data"));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_EXISTS), failureOf(at("exists"), GENERIC_WRITE, CREATE_NEW));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), failureOf(at("missing"), GENERIC_READ, OPEN_EXISTING));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND),
-            failureOf(at("missing"), GENERIC_WRITE, TRUNCATE_EXISTING));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_PATH_NOT_FOUND),
-            failureOf(at("nofolder\\file"), GENERIC_WRITE, CREATE_ALWAYS));
-  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(at("missing").c_str())); // nothing was created
-  HANDLE h = createWith(at("new"), GENERIC_WRITE, CREATE_NEW);
-  EXPECT_NE(INVALID_HANDLE_VALUE, h);
-  CloseHandle(h);
+  const struct {
+    string path;
+    int mode, result, error;
+  } rows[] = {{at("present.txt"), 0, 0, 0},
+              {at("present.txt"), 2, 0, 0},
+              {dir_, 0, 0, 0},
+              {at("missing.txt"), 0, -1, ENOENT}};
+  for (const auto &row : rows) {
+    errno = 0;
+    EXPECT_EQ(row.result, _access(row.path.c_str(), row.mode)) << row.path;
+    EXPECT_EQ(row.error, errno) << row.path;
+  }
 }
 
 // CREATE_ALWAYS and OPEN_ALWAYS succeed either way and tell, through the last
@@ -242,14 +167,14 @@ TEST_F(FilesTest, CreateFileAlwaysReportsAnExistingFile) {
   } rows[] = {
       {"always", CREATE_ALWAYS, ERROR_SUCCESS, 0},    {"always", CREATE_ALWAYS, ERROR_ALREADY_EXISTS, 0},
       {"kept", OPEN_ALWAYS, ERROR_ALREADY_EXISTS, 7}, {"opened", OPEN_ALWAYS, ERROR_SUCCESS, 0},
-      {"kept", TRUNCATE_EXISTING, ERROR_SUCCESS, 0},
+      {"kept", TRUNCATE_EXISTING, ERROR_SUCCESS, 0},  {"new", CREATE_NEW, ERROR_SUCCESS, 0},
   };
   for (const auto &row : rows) {
     SCOPED_TRACE(row.name);
     SetLastError(ERROR_INVALID_PARAMETER);
     HANDLE h = createWith(at(row.name), GENERIC_READ | GENERIC_WRITE, row.disposition);
     ASSERT_NE(INVALID_HANDLE_VALUE, h);
-    if (row.disposition != TRUNCATE_EXISTING) {
+    if (row.disposition == CREATE_ALWAYS || row.disposition == OPEN_ALWAYS) {
       EXPECT_EQ(row.lastError, GetLastError());
     }
     EXPECT_EQ(row.size, GetFileSize(h, nullptr));
@@ -257,53 +182,79 @@ TEST_F(FilesTest, CreateFileAlwaysReportsAnExistingFile) {
     EXPECT_TRUE(WriteFile(h, "0123456789", 10, &written, nullptr));
     CloseHandle(h);
   }
-}
-
-// --- Moving, removing and reading ---------------------------------------
-
-TEST_F(FilesTest, MoveFileReplacesOnlyWhenAsked) {
-  ASSERT_TRUE(writeFile(at("from"), "moved"));
-  ASSERT_TRUE(writeFile(at("to"), "old"));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_ALREADY_EXISTS),
-            errorOf([&] { return MoveFileExA(at("from").c_str(), at("to").c_str(), 0); }));
-  EXPECT_EQ("old", readFile(at("to")));
-  EXPECT_TRUE(MoveFileExA(at("from").c_str(), at("to").c_str(), MOVEFILE_REPLACE_EXISTING));
-  EXPECT_EQ("moved", readFile(at("to")));
-  EXPECT_EQ(INVALID_FILE_ATTRIBUTES, GetFileAttributesA(at("from").c_str()));
-  // A folder moves with its contents.
-  ASSERT_TRUE(CreateDirectoryA(at("folder").c_str(), nullptr));
-  ASSERT_TRUE(writeFile(at("folder\\inside"), "in"));
-  EXPECT_TRUE(MoveFileExA(at("folder").c_str(), at("renamed").c_str(), 0));
-  EXPECT_EQ("in", readFile(at("renamed\\inside")));
-}
-
-TEST_F(FilesTest, RemovalFailuresTellWhy) {
-  ASSERT_TRUE(CreateDirectoryA(at("full").c_str(), nullptr));
-  ASSERT_TRUE(writeFile(at("full\\file"), "x"));
-  auto rmdir = [this](const char *name) {
-    return errorOf([&] { return RemoveDirectoryA(at(name).c_str()); });
-  };
-  EXPECT_EQ(static_cast<DWORD>(ERROR_DIR_NOT_EMPTY), rmdir("full"));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND), rmdir("missing"));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_FILE_NOT_FOUND),
-            errorOf([this] { return DeleteFileA(at("missing").c_str()); }));
-  EXPECT_TRUE(DeleteFileA(at("full\\file").c_str()));
-  EXPECT_TRUE(RemoveDirectoryA(at("full").c_str()));
-}
-
-TEST_F(FilesTest, ReadingPastTheEndGivesNothingAndSucceeds) {
-  ASSERT_TRUE(writeFile(at("short"), "abcdef"));
-  HANDLE h = createWith(at("short"), GENERIC_READ, OPEN_EXISTING);
-  ASSERT_NE(INVALID_HANDLE_VALUE, h);
-  EXPECT_EQ(6u, SetFilePointer(h, 0, nullptr, FILE_END));
-  char buffer[8];
-  DWORD got = 99;
+  // Reading past the end gives nothing and succeeds.
+  HANDLE h = createWith(at("kept"), GENERIC_READ, OPEN_EXISTING);
+  char buffer[16];
+  DWORD got = 0;
+  EXPECT_TRUE(ReadFile(h, buffer, sizeof buffer, &got, nullptr));
+  EXPECT_EQ("0123456789", string(buffer, got));
   EXPECT_TRUE(ReadFile(h, buffer, sizeof buffer, &got, nullptr));
   EXPECT_EQ(0u, got);
-  EXPECT_EQ(2u, SetFilePointer(h, 2, nullptr, FILE_BEGIN));
-  EXPECT_TRUE(ReadFile(h, buffer, sizeof buffer, &got, nullptr));
-  EXPECT_EQ("cdef", std::string(buffer, got));
   CloseHandle(h);
+}
+
+// Each call in order, with what it leaves: a refused copy, move or create changes nothing.
+TEST_F(FilesTest, CopyMoveCreateAndRemoveTellWhy) {
+  ASSERT_TRUE(writeFile(at("source"), "first"));
+  ASSERT_TRUE(writeFile(at("target"), "second"));
+  ASSERT_TRUE(CreateDirectoryA(at("full").c_str(), nullptr));
+  ASSERT_TRUE(writeFile(at("full\\file"), "x"));
+  auto copy = [this](const char *from, const char *to, BOOL failIfExists) {
+    return [=, this] { return CopyFileA(at(from).c_str(), at(to).c_str(), failIfExists) != FALSE; };
+  };
+  auto move = [this](const char *from, const char *to, DWORD flags) {
+    return [=, this] { return MoveFileExA(at(from).c_str(), at(to).c_str(), flags) != FALSE; };
+  };
+  auto open = [this](const char *name, DWORD access, DWORD disposition) {
+    return [=, this] {
+      HANDLE h = createWith(at(name), access, disposition);
+      return h != INVALID_HANDLE_VALUE && CloseHandle(h);
+    };
+  };
+  auto mkdir = [this](const char *name) {
+    return [=, this] { return CreateDirectoryA(at(name).c_str(), nullptr); };
+  };
+  auto rmdir = [this](const char *name) { return [=, this] { return RemoveDirectoryA(at(name).c_str()); }; };
+  auto del = [this](const char *name) { return [=, this] { return DeleteFileA(at(name).c_str()); }; };
+  const struct {
+    const char *call;
+    DWORD error;
+    std::function<bool()> run;
+    const char *file, *content; // what the file holds afterwards
+  } rows[] = {
+      {"copy onto existing", ERROR_FILE_EXISTS, copy("source", "target", TRUE), "target", "second"},
+      {"copy replacing", ERROR_SUCCESS, copy("source", "target", FALSE), "target", "first"},
+      {"copy to new", ERROR_SUCCESS, copy("source", "fresh", TRUE), "fresh", "first"},
+      {"copy missing", ERROR_FILE_NOT_FOUND, copy("missing", "other", FALSE), "other", "<missing>"},
+      {"move onto existing", ERROR_ALREADY_EXISTS, move("full\\file", "target", 0), "target", "first"},
+      {"move replacing", ERROR_SUCCESS, move("full\\file", "target", MOVEFILE_REPLACE_EXISTING), "target",
+       "x"},
+      {"moved away", ERROR_FILE_NOT_FOUND, open("full\\file", GENERIC_READ, OPEN_EXISTING), "full\\file",
+       "<missing>"},
+      {"fill folder", ERROR_SUCCESS, [this] { return writeFile(at("full\\in"), "in"); }, "full\\in", "in"},
+      {"move folder", ERROR_SUCCESS, move("full", "renamed", 0), "renamed\\in", "in"},
+      {"create existing", ERROR_FILE_EXISTS, open("target", GENERIC_WRITE, CREATE_NEW), "target", "x"},
+      {"truncate missing", ERROR_FILE_NOT_FOUND, open("missing", GENERIC_WRITE, TRUNCATE_EXISTING), "missing",
+       "<missing>"},
+      {"open missing", ERROR_FILE_NOT_FOUND, open("missing", GENERIC_READ, OPEN_EXISTING), "missing",
+       "<missing>"},
+      {"no folder", ERROR_PATH_NOT_FOUND, open("nofolder\\file", GENERIC_WRITE, CREATE_ALWAYS),
+       "nofolder\\file", "<missing>"},
+      {"mkdir existing", ERROR_ALREADY_EXISTS, mkdir("renamed"), "renamed\\in", "in"},
+      {"mkdir over file", ERROR_ALREADY_EXISTS, mkdir("target"), "target", "x"},
+      {"mkdir no parent", ERROR_PATH_NOT_FOUND, mkdir("missing\\child"), "missing", "<missing>"},
+      {"rmdir full", ERROR_DIR_NOT_EMPTY, rmdir("renamed"), "renamed\\in", "in"},
+      {"rmdir missing", ERROR_FILE_NOT_FOUND, rmdir("missing"), "missing", "<missing>"},
+      {"delete missing", ERROR_FILE_NOT_FOUND, del("missing"), "missing", "<missing>"},
+      {"delete", ERROR_SUCCESS, del("renamed\\in"), "renamed\\in", "<missing>"},
+      {"rmdir emptied", ERROR_SUCCESS, rmdir("renamed"), "renamed", "<missing>"},
+      {"mkdir", ERROR_SUCCESS, mkdir("child"), "child\\x", "<missing>"},
+  };
+  for (const auto &row : rows) {
+    EXPECT_EQ(row.error, errorOf(row.run)) << row.call;
+    EXPECT_EQ(row.content, readFile(at(row.file))) << row.call;
+  }
+  EXPECT_EQ(static_cast<DWORD>(FILE_ATTRIBUTE_DIRECTORY), GetFileAttributesA(at("child").c_str()));
 }
 
 } // namespace

@@ -2,6 +2,7 @@
 #include "conformance.h"
 
 #include <cstring>
+#include <functional>
 #include <set>
 #include <string>
 
@@ -9,10 +10,11 @@ namespace kxltest {
 namespace {
 
 using std::string;
+using Names = std::set<string>;
 
 // Names of the subkeys (or values) of a key, with the result that ended the walk.
 struct Listing {
-  std::set<string> names;
+  Names names;
   LONG end = ERROR_SUCCESS;
   bool lengthsMatch = true; // every reported length was the name's length in characters
 };
@@ -54,68 +56,30 @@ string text(HKEY key, const char *name) {
                              : "<rc " + std::to_string(rc) + ">";
 }
 
-// --- Creating and opening keys -------------------------------------------
-
-TEST_F(RegistryTest, CreateReportsNewThenExistingKey) {
-  Key key;
-  DWORD disposition = 0;
-  ASSERT_EQ(ERROR_SUCCESS, create("Fresh", key, &disposition));
-  EXPECT_EQ(static_cast<DWORD>(REG_CREATED_NEW_KEY), disposition);
-  ASSERT_EQ(ERROR_SUCCESS, create("Fresh", key, &disposition));
-  EXPECT_EQ(static_cast<DWORD>(REG_OPENED_EXISTING_KEY), disposition);
-}
-
-TEST_F(RegistryTest, CreateMakesEveryMissingIntermediateKey) {
-  Key key;
-  DWORD disposition = 0;
-  ASSERT_EQ(ERROR_SUCCESS, create("One\\Two\\Three", key, &disposition));
-  EXPECT_EQ(static_cast<DWORD>(REG_CREATED_NEW_KEY), disposition);
-  Key probe;
-  EXPECT_EQ(ERROR_SUCCESS, open("One", probe));
-  EXPECT_EQ(ERROR_SUCCESS, open("One\\Two", probe));
-  // The key created last is the one returned.
-  setString(key.get(), "Marker", "7");
-  ASSERT_EQ(ERROR_SUCCESS, open("One\\Two\\Three", probe));
+// Missing intermediate keys are made; names ignore case and keep the spelling they were made with.
+TEST_F(RegistryTest, CreateTellsNewFromExistingKeys) {
+  const struct {
+    const char *path;
+    DWORD disposition;
+  } rows[] = {{"One\\Two\\Three", REG_CREATED_NEW_KEY},
+              {"One\\Two\\Three", REG_OPENED_EXISTING_KEY},
+              {"ONE\\two", REG_OPENED_EXISTING_KEY},
+              {"one\\TWO\\Four", REG_CREATED_NEW_KEY}};
+  Key key, probe;
+  for (const auto &row : rows) {
+    DWORD disposition = 0;
+    ASSERT_EQ(ERROR_SUCCESS, create(row.path, key, &disposition)) << row.path;
+    EXPECT_EQ(row.disposition, disposition) << row.path;
+  }
+  setString(key.get(), "Marker", "7"); // the key created last is the one returned
+  ASSERT_EQ(ERROR_SUCCESS, open("One\\Two\\four", probe));
   EXPECT_EQ("7", text(probe.get(), "Marker"));
+  EXPECT_EQ(Names{"One"}, listSubkeys(root_.get()).names);
+  ASSERT_EQ(ERROR_SUCCESS, open("one\\two", probe));
+  EXPECT_EQ((Names{"Three", "Four"}), listSubkeys(probe.get()).names);
 }
 
-TEST_F(RegistryTest, OpenOfMissingKeyIsFileNotFound) {
-  Key key;
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, open("Missing", key));
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, open("Missing\\Deeper", key));
-}
-
-// --- Values --------------------------------------------------------------
-
-TEST_F(RegistryTest, MissingValueIsFileNotFound) {
-  EXPECT_EQ("<rc 2>", text(root_.get(), "Missing"));
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, RegDeleteValueA(root_.get(), "Missing"));
-}
-
-TEST_F(RegistryTest, StringSizeCountsTheTerminatorAndNullDataQueriesIt) {
-  setString(root_.get(), "Name", "abc");
-  DWORD type = REG_NONE;
-  DWORD size = 0;
-  ASSERT_EQ(ERROR_SUCCESS, RegQueryValueExA(root_.get(), "Name", nullptr, &type, nullptr, &size));
-  EXPECT_EQ(static_cast<DWORD>(REG_SZ), type);
-  EXPECT_EQ(4u, size);
-}
-
-TEST_F(RegistryTest, ShortBufferIsMoreDataWithTheNeededSize) {
-  setString(root_.get(), "Name", "abcdefgh");
-  BYTE small[3];
-  DWORD size = sizeof small;
-  EXPECT_EQ(ERROR_MORE_DATA, RegQueryValueExA(root_.get(), "Name", nullptr, nullptr, small, &size));
-  EXPECT_EQ(9u, size);
-  // An exact fit succeeds.
-  BYTE exact[9];
-  size = sizeof exact;
-  ASSERT_EQ(ERROR_SUCCESS, RegQueryValueExA(root_.get(), "Name", nullptr, nullptr, exact, &size));
-  EXPECT_EQ(9u, size);
-  EXPECT_STREQ("abcdefgh", reinterpret_cast<const char *>(exact));
-}
-
-// Reading does not expand the variables of REG_EXPAND_SZ.
+// Reading does not expand the variables of REG_EXPAND_SZ; the default value has the empty name.
 TEST_F(RegistryTest, EveryValueTypeRoundTrips) {
   const DWORD number = 0xDEADBEEF;
   const struct {
@@ -127,6 +91,7 @@ TEST_F(RegistryTest, EveryValueTypeRoundTrips) {
       {"Dword", REG_DWORD, string(reinterpret_cast<const char *>(&number), sizeof number)},
       {"Multi", REG_MULTI_SZ, string("first\0second\0", sizeof "first\0second\0")}, // two and the empty one
       {"Expand", REG_EXPAND_SZ, string("%SystemRoot%\\kxl", sizeof "%SystemRoot%\\kxl")},
+      {"", REG_SZ, string("default", sizeof "default")},
   };
   for (const auto &row : rows)
     ASSERT_EQ(ERROR_SUCCESS, RegSetValueExA(root_.get(), row.name, 0, row.type,
@@ -140,50 +105,51 @@ TEST_F(RegistryTest, EveryValueTypeRoundTrips) {
     EXPECT_EQ(row.type, type);
     EXPECT_EQ(row.data, data);
   }
-}
-
-TEST_F(RegistryTest, DefaultValueHasTheEmptyName) {
-  setString(root_.get(), "", "default");
-  EXPECT_EQ("default", text(root_.get(), ""));
   EXPECT_EQ("default", text(root_.get(), nullptr));
 }
 
-// --- Enumeration ---------------------------------------------------------
-
-TEST_F(RegistryTest, EnumKeysListsEachSubkeyThenNoMoreItems) {
-  Key key;
-  for (const char *name : {"Zulu", "alpha", "Mike"})
-    ASSERT_EQ(ERROR_SUCCESS, create(name, key));
-  Key grandchild;
-  ASSERT_EQ(ERROR_SUCCESS, create("Mike\\Inner", grandchild)); // not a direct subkey
-  Listing listing = listSubkeys(root_.get());
-  EXPECT_EQ(ERROR_NO_MORE_ITEMS, listing.end);
-  EXPECT_EQ((std::set<string>{"Zulu", "alpha", "Mike"}), listing.names);
-  EXPECT_TRUE(listing.lengthsMatch);
+// The size counts the terminator; no data buffer asks for it, a short one is refused with it.
+TEST_F(RegistryTest, QueriesReportTheSizeNeeded) {
+  setString(root_.get(), "ValueName", "first");
+  setString(root_.get(), "valuename", "abcdefgh"); // another case replaces the data, keeps the name
+  EXPECT_EQ(Names{"ValueName"}, listValues(root_.get()).names);
+  DWORD type = REG_NONE, size = 0;
+  ASSERT_EQ(ERROR_SUCCESS, RegQueryValueExA(root_.get(), "VALUENAME", nullptr, &type, nullptr, &size));
+  EXPECT_EQ(static_cast<DWORD>(REG_SZ), type);
+  EXPECT_EQ(9u, size);
+  BYTE small[3];
+  size = sizeof small;
+  EXPECT_EQ(ERROR_MORE_DATA, RegQueryValueExA(root_.get(), "ValueName", nullptr, nullptr, small, &size));
+  EXPECT_EQ(9u, size);
+  BYTE exact[9];
+  size = sizeof exact;
+  ASSERT_EQ(ERROR_SUCCESS, RegQueryValueExA(root_.get(), "ValueName", nullptr, nullptr, exact, &size));
+  EXPECT_STREQ("abcdefgh", reinterpret_cast<const char *>(exact));
 }
 
-// Windows lists values in the order they were created and Wine sorts them: the
-// command must not depend on either, so only the set of names is checked.
-TEST_F(RegistryTest, EnumValuesListsEachValueThenNoMoreItems) {
+// A name of 255 characters is the longest a key may have.
+TEST_F(RegistryTest, EnumerationListsEachNameThenNoMoreItems) {
+  const string longest(255, 'k');
+  Key key;
+  for (const char *name : {"Zulu", "alpha", "Mike\\Inner", longest.c_str()}) // Inner is not a direct subkey
+    ASSERT_EQ(ERROR_SUCCESS, create(name, key));
   setString(root_.get(), "Zeta", "1");
   setDword(root_.get(), "alpha", 2);
-  setString(root_.get(), "Mid", "three");
-  Listing listing = listValues(root_.get());
-  EXPECT_EQ(ERROR_NO_MORE_ITEMS, listing.end);
-  EXPECT_EQ((std::set<string>{"Zeta", "alpha", "Mid"}), listing.names);
-  EXPECT_TRUE(listing.lengthsMatch);
-}
+  setString(key.get(), "Only", "hello");
+  for (const Listing &listing : {listSubkeys(root_.get()), listValues(root_.get())}) {
+    EXPECT_EQ(ERROR_NO_MORE_ITEMS, listing.end);
+    EXPECT_TRUE(listing.lengthsMatch);
+  }
+  EXPECT_EQ((Names{"Zulu", "alpha", "Mike", longest}), listSubkeys(root_.get()).names);
+  // Windows lists values in the order they were made and Wine sorts them: only the set counts.
+  EXPECT_EQ((Names{"Zeta", "alpha"}), listValues(root_.get()).names);
 
-TEST_F(RegistryTest, EnumValueReportsTypeAndDataSize) {
-  setString(root_.get(), "Only", "hello");
   char name[32];
-  DWORD length = sizeof name;
-  DWORD type = REG_NONE;
+  DWORD length = sizeof name, type = REG_NONE;
   BYTE data[32];
   DWORD size = sizeof data;
-  ASSERT_EQ(ERROR_SUCCESS, RegEnumValueA(root_.get(), 0, name, &length, nullptr, &type, data, &size));
-  EXPECT_STREQ("Only", name);
-  EXPECT_EQ(4u, length);
+  ASSERT_EQ(ERROR_SUCCESS, RegEnumValueA(key.get(), 0, name, &length, nullptr, &type, data, &size));
+  EXPECT_EQ((std::pair<string, DWORD>("Only", 4)), std::make_pair(string(name), length));
   EXPECT_EQ(static_cast<DWORD>(REG_SZ), type);
   EXPECT_EQ(6u, size);
   EXPECT_STREQ("hello", reinterpret_cast<const char *>(data));
@@ -200,43 +166,21 @@ TEST_F(RegistryTest, EnumerationWithShortBuffersIsMoreData) {
   length = sizeof name;
   EXPECT_EQ(ERROR_MORE_DATA,
             RegEnumValueA(root_.get(), 0, name, &length, nullptr, nullptr, nullptr, nullptr));
-  // A data buffer too small is refused as well.
   char fullName[64];
   length = sizeof fullName;
   BYTE data[4];
   DWORD size = sizeof data;
   EXPECT_EQ(ERROR_MORE_DATA, RegEnumValueA(root_.get(), 0, fullName, &length, nullptr, nullptr, data, &size));
-  // Room for the name and its terminator is enough.
-  char fits[15];
+  // Room for the name and its terminator is enough; a key made without a class has the empty one.
+  char fits[15], keyClass[8] = "xxxxxxx";
+  DWORD classLength = sizeof keyClass;
   length = sizeof fits;
-  ASSERT_EQ(ERROR_SUCCESS, RegEnumKeyExA(root_.get(), 0, fits, &length, nullptr, nullptr, nullptr, nullptr));
+  ASSERT_EQ(ERROR_SUCCESS,
+            RegEnumKeyExA(root_.get(), 0, fits, &length, nullptr, keyClass, &classLength, nullptr));
   EXPECT_EQ(14u, length);
   EXPECT_STREQ("RatherLongName", fits);
+  EXPECT_EQ((std::pair<string, DWORD>("", 0)), std::make_pair(string(keyClass), classLength));
 }
-
-// --- Names ---------------------------------------------------------------
-
-TEST_F(RegistryTest, KeyNamesIgnoreCaseAndKeepTheirCase) {
-  Key key;
-  ASSERT_EQ(ERROR_SUCCESS, create("MixedCase", key));
-  Key other;
-  EXPECT_EQ(ERROR_SUCCESS, open("MIXEDCASE", other));
-  DWORD disposition = 0;
-  ASSERT_EQ(ERROR_SUCCESS, create("mixedcase", other, &disposition));
-  EXPECT_EQ(static_cast<DWORD>(REG_OPENED_EXISTING_KEY), disposition);
-  EXPECT_EQ((std::set<string>{"MixedCase"}), listSubkeys(root_.get()).names);
-}
-
-TEST_F(RegistryTest, ValueNamesIgnoreCaseAndKeepTheirCase) {
-  setString(root_.get(), "ValueName", "first");
-  EXPECT_EQ("first", text(root_.get(), "VALUENAME"));
-  // Writing under another case replaces the data and keeps the stored name.
-  setString(root_.get(), "valuename", "second");
-  EXPECT_EQ("second", text(root_.get(), "ValueName"));
-  EXPECT_EQ((std::set<string>{"ValueName"}), listValues(root_.get()).names);
-}
-
-// --- Copying and deleting trees ------------------------------------------
 
 TEST_F(RegistryTest, CopyKeyMergesValuesAndTheWholeSubtree) {
   Key source, inner, deepest, target;
@@ -248,12 +192,13 @@ TEST_F(RegistryTest, CopyKeyMergesValuesAndTheWholeSubtree) {
   ASSERT_EQ(ERROR_SUCCESS, create("Source\\Inner\\Deepest", deepest));
   setString(deepest.get(), "Level", "two");
   ASSERT_EQ(ERROR_SUCCESS, create("Target", target));
-  setString(target.get(), "Shared", "old");
+  setString(target.get(), "SHARED", "old");
   setString(target.get(), "Kept", "untouched");
 
   ASSERT_EQ(ERROR_SUCCESS, SHCopyKeyA(root_.get(), "Source", target.get(), 0));
   EXPECT_EQ("from source", text(target.get(), "Shared"));
   EXPECT_EQ("untouched", text(target.get(), "Kept"));
+  EXPECT_EQ((Names{"SHARED", "Kept", "Count"}), listValues(target.get()).names);
   DWORD type = 0;
   string data;
   ASSERT_EQ(ERROR_SUCCESS, query(target.get(), "Count", type, data));
@@ -263,107 +208,49 @@ TEST_F(RegistryTest, CopyKeyMergesValuesAndTheWholeSubtree) {
   EXPECT_EQ("two", text(copied.get(), "Level"));
   ASSERT_EQ(ERROR_SUCCESS, open("Target\\Inner", copied));
   EXPECT_EQ("one", text(copied.get(), "Level"));
-  // The source stays as it was.
-  EXPECT_EQ((std::set<string>{"Shared", "Count"}), listValues(source.get()).names);
+  EXPECT_EQ((Names{"Shared", "Count"}), listValues(source.get()).names); // the source stays
 }
 
-TEST_F(RegistryTest, CopyKeyFromMissingSourceIsFileNotFound) {
-  Key target;
+// Each call refused, in order, with what it leaves: a key with subkeys is not deleted, a tree is.
+TEST_F(RegistryTest, RefusedCallsTellWhy) {
+  Key key, target;
   ASSERT_EQ(ERROR_SUCCESS, create("Target", target));
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, SHCopyKeyA(root_.get(), "NoSuchSource", target.get(), 0));
-  EXPECT_TRUE(listSubkeys(target.get()).names.empty());
-}
-
-TEST_F(RegistryTest, DeleteKeyTreeRemovesTheSubtree) {
-  Key key;
-  ASSERT_EQ(ERROR_SUCCESS, create("Tree\\Branch\\Leaf", key));
-  setString(key.get(), "Value", "x");
-  key.reset();
-  EXPECT_EQ(ERROR_SUCCESS, SHDeleteKeyA(root_.get(), "Tree"));
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, open("Tree", key));
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, SHDeleteKeyA(root_.get(), "Tree"));
-}
-
-TEST_F(RegistryTest, DeleteKeyRefusesAKeyWithSubkeys) {
-  Key key;
   ASSERT_EQ(ERROR_SUCCESS, create("Parent\\Child", key));
   key.reset();
-  EXPECT_EQ(ERROR_ACCESS_DENIED, RegDeleteKeyA(root_.get(), "Parent"));
-  EXPECT_EQ(ERROR_SUCCESS, open("Parent\\Child", key));
-  key.reset();
-  EXPECT_EQ(ERROR_SUCCESS, RegDeleteKeyA(root_.get(), "Parent\\Child"));
-  EXPECT_EQ(ERROR_SUCCESS, RegDeleteKeyA(root_.get(), "Parent"));
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, RegDeleteKeyA(root_.get(), "Parent"));
-}
-
-TEST_F(RegistryTest, CloseOfABadHandleIsInvalidHandle) {
-  EXPECT_EQ(ERROR_INVALID_HANDLE, RegCloseKey(nullptr));
-  HKEY key = nullptr;
-  ASSERT_EQ(ERROR_SUCCESS, RegOpenKeyExA(root_.get(), "", 0, KEY_READ, &key));
-  EXPECT_EQ(ERROR_SUCCESS, RegCloseKey(key));
-  EXPECT_EQ(ERROR_INVALID_HANDLE, RegCloseKey(key));
-}
-
-// --- The 32-bit view of HKLM\SOFTWARE ------------------------------------
-
-class RegistryViewTest : public Win32Test {
-protected:
-  void SetUp() override {
-    Win32Test::SetUp();
-    if (HasFatalFailure())
-      return;
-    path_ = "SOFTWARE\\KxlConformance\\" + uniqueName();
-  }
-  void TearDown() override {
-    for (REGSAM view : {static_cast<REGSAM>(KEY_WOW64_32KEY), static_cast<REGSAM>(KEY_WOW64_64KEY)}) {
-      Key software;
-      if (RegOpenKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE", 0, KEY_ALL_ACCESS | view, software.put()) == 0) {
-        SHDeleteKeyA(software.get(), path_.c_str() + std::strlen("SOFTWARE\\"));
-        RegDeleteKeyA(software.get(), "KxlConformance");
-      }
-    }
-    Win32Test::TearDown();
-  }
-  LONG createIn(REGSAM view, Key &key, DWORD *disposition) {
-    return RegCreateKeyExA(HKEY_LOCAL_MACHINE, path_.c_str(), 0, nullptr, REG_OPTION_NON_VOLATILE,
-                           KEY_ALL_ACCESS | view, nullptr, key.put(), disposition);
-  }
-  LONG openIn(REGSAM view, Key &key) {
-    return RegOpenKeyExA(HKEY_LOCAL_MACHINE, path_.c_str(), 0, KEY_READ | view, key.put());
-  }
-  // Writing HKLM needs administrator rights on Windows.
-  bool mayWrite(LONG rc) { return rc != ERROR_ACCESS_DENIED; }
-
-  string path_;
-};
-
-TEST_F(RegistryViewTest, ThirtyTwoBitViewIsSeparateFromTheSixtyFourBitView) {
-  Key key;
-  DWORD disposition = 0;
-  LONG rc = createIn(KEY_WOW64_32KEY, key, &disposition);
-  if (!mayWrite(rc))
-    GTEST_SKIP() << "HKEY_LOCAL_MACHINE is not writable for this account";
-  ASSERT_EQ(ERROR_SUCCESS, rc);
-  EXPECT_EQ(static_cast<DWORD>(REG_CREATED_NEW_KEY), disposition);
-  Key probe;
-  EXPECT_EQ(ERROR_SUCCESS, openIn(KEY_WOW64_32KEY, probe));
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, openIn(0, probe));
-  EXPECT_EQ(ERROR_FILE_NOT_FOUND, openIn(KEY_WOW64_64KEY, probe));
-  // The same path in the 64-bit view is a key of its own.
-  Key native;
-  ASSERT_EQ(ERROR_SUCCESS, createIn(0, native, &disposition));
-  EXPECT_EQ(static_cast<DWORD>(REG_CREATED_NEW_KEY), disposition);
-}
-
-TEST_F(RegistryViewTest, ThirtyTwoBitViewLiesUnderWow6432Node) {
-  Key key;
-  LONG rc = createIn(KEY_WOW64_32KEY, key, nullptr);
-  if (!mayWrite(rc))
-    GTEST_SKIP() << "HKEY_LOCAL_MACHINE is not writable for this account";
-  ASSERT_EQ(ERROR_SUCCESS, rc);
-  string redirected = "SOFTWARE\\WOW6432Node\\" + path_.substr(std::strlen("SOFTWARE\\"));
-  Key probe;
-  EXPECT_EQ(ERROR_SUCCESS, RegOpenKeyExA(HKEY_LOCAL_MACHINE, redirected.c_str(), 0, KEY_READ, probe.put()));
+  HKEY closed = nullptr;
+  ASSERT_EQ(ERROR_SUCCESS, RegOpenKeyExA(root_.get(), "", 0, KEY_READ, &closed));
+  const struct {
+    const char *call;
+    LONG expected;
+    std::function<LONG()> run;
+  } rows[] = {
+      {"open missing", ERROR_FILE_NOT_FOUND, [&] { return open("Missing\\Deeper", key); }},
+      {"query missing", ERROR_FILE_NOT_FOUND,
+       [&] { return RegQueryValueExA(root_.get(), "Missing", nullptr, nullptr, nullptr, nullptr); }},
+      {"delete missing value", ERROR_FILE_NOT_FOUND, [&] { return RegDeleteValueA(root_.get(), "Missing"); }},
+      {"copy missing", ERROR_FILE_NOT_FOUND,
+       [&] { return SHCopyKeyA(root_.get(), "None", target.get(), 0); }},
+      {"delete with subkeys", ERROR_ACCESS_DENIED, [&] { return RegDeleteKeyA(root_.get(), "Parent"); }},
+      {"still there", ERROR_SUCCESS, [&] { return open("Parent\\Child", key); }},
+      {"delete leaf", ERROR_SUCCESS,
+       [&] { return key.reset(), RegDeleteKeyA(root_.get(), "Parent\\Child"); }},
+      {"delete emptied", ERROR_SUCCESS, [&] { return RegDeleteKeyA(root_.get(), "Parent"); }},
+      {"delete deleted", ERROR_FILE_NOT_FOUND, [&] { return RegDeleteKeyA(root_.get(), "Parent"); }},
+      {"make tree", ERROR_SUCCESS,
+       [&] {
+         LONG rc = create("Tree\\Branch\\Leaf", key);
+         return rc != ERROR_SUCCESS ? rc : RegSetValueExA(key.get(), "V", 0, REG_SZ, (const BYTE *)"x", 2);
+       }},
+      {"delete tree", ERROR_SUCCESS, [&] { return key.reset(), SHDeleteKeyA(root_.get(), "Tree"); }},
+      {"tree gone", ERROR_FILE_NOT_FOUND, [&] { return open("Tree", key); }},
+      {"delete tree again", ERROR_FILE_NOT_FOUND, [&] { return SHDeleteKeyA(root_.get(), "Tree"); }},
+      {"close null", ERROR_INVALID_HANDLE, [] { return RegCloseKey(nullptr); }},
+      {"close", ERROR_SUCCESS, [&] { return RegCloseKey(closed); }},
+      {"close again", ERROR_INVALID_HANDLE, [&] { return RegCloseKey(closed); }},
+  };
+  for (const auto &row : rows)
+    EXPECT_EQ(row.expected, row.run()) << row.call;
+  EXPECT_TRUE(listSubkeys(target.get()).names.empty());
 }
 
 } // namespace

@@ -2,26 +2,18 @@
 #include "conformance.h"
 
 #include <cstring>
+#include <functional>
 #include <string>
 
 namespace kxltest {
 namespace {
 
-// "héllo" in UTF-8 and in UTF-16.
-const char utf8[] = "h\xC3\xA9llo";
-const WCHAR utf16[] = {'h', 0xE9, 'l', 'l', 'o', 0};
-
 // A product code no machine has registered.
 const char unknownProduct[] = "{5B6C1E2A-0F3D-4A77-9C21-6D8E0A4B3F19}";
 
-// --- Modules -------------------------------------------------------------
-
-TEST_F(Win32Test, LoadOfAMissingModuleIsModNotFound) {
+TEST_F(Win32Test, MissingModulesAndEntryPointsAreNotFound) {
   EXPECT_EQ(static_cast<DWORD>(ERROR_MOD_NOT_FOUND),
             errorOf([] { return LoadLibraryA("kxlnosuchmodule.dll") != nullptr; }));
-}
-
-TEST_F(Win32Test, MissingEntryPointIsProcNotFound) {
   HMODULE module = LoadLibraryA("odbc32.dll");
   ASSERT_NE(nullptr, module) << "error " << GetLastError();
   EXPECT_EQ(static_cast<DWORD>(ERROR_PROC_NOT_FOUND),
@@ -29,52 +21,57 @@ TEST_F(Win32Test, MissingEntryPointIsProcNotFound) {
   EXPECT_TRUE(FreeLibrary(module));
 }
 
-// --- Environment ---------------------------------------------------------
-
-TEST_F(Win32Test, EnvironmentVariableSizesFollowTheBufferRules) {
-  const char *name = "KXL_CONFORMANCE_PROBE";
+// A buffer too small gets the size needed with the terminator; one that fits the length without it.
+TEST_F(Win32Test, EnvironmentVariablesIgnoreTheNamesCase) {
+  const char *name = "KxlConformanceProbe";
   ASSERT_TRUE(SetEnvironmentVariableA(name, "value"));
   char small[3];
-  EXPECT_EQ(6u, GetEnvironmentVariableA(name, small, sizeof small)); // needed size with the terminator
+  EXPECT_EQ(6u, GetEnvironmentVariableA("KXLCONFORMANCEPROBE", small, sizeof small));
   char buffer[16];
-  EXPECT_EQ(5u, GetEnvironmentVariableA(name, buffer, sizeof buffer)); // length without it
+  EXPECT_EQ(5u, GetEnvironmentVariableA(name, buffer, sizeof buffer));
   EXPECT_STREQ("value", buffer);
-  ASSERT_TRUE(SetEnvironmentVariableA(name, nullptr));
+  ASSERT_TRUE(SetEnvironmentVariableA("kxlconformanceprobe", nullptr));
   EXPECT_EQ(static_cast<DWORD>(ERROR_ENVVAR_NOT_FOUND),
             errorOf([&] { return GetEnvironmentVariableA(name, buffer, sizeof buffer) != 0; }));
 }
 
-// --- Text ----------------------------------------------------------------
-
-TEST_F(Win32Test, MultiByteToWideCharCountsTheTerminatorOnlyForMinusOne) {
-  EXPECT_EQ(6, MultiByteToWideChar(CP_UTF8, 0, utf8, -1, nullptr, 0));
-  EXPECT_EQ(5, MultiByteToWideChar(CP_UTF8, 0, utf8, static_cast<int>(std::strlen(utf8)), nullptr, 0));
-  WCHAR wide[8] = {};
-  ASSERT_EQ(6, MultiByteToWideChar(CP_UTF8, 0, utf8, -1, wide, 8));
-  EXPECT_EQ(0, std::memcmp(utf16, wide, sizeof utf16));
-  EXPECT_EQ(static_cast<DWORD>(ERROR_INSUFFICIENT_BUFFER),
-            errorOf([&] { return MultiByteToWideChar(CP_UTF8, 0, utf8, -1, wide, 3) != 0; }));
-}
-
-TEST_F(Win32Test, WideCharToMultiByteCountsTheTerminatorOnlyForMinusOne) {
-  EXPECT_EQ(7, WideCharToMultiByte(CP_UTF8, 0, utf16, -1, nullptr, 0, nullptr, nullptr));
-  EXPECT_EQ(6, WideCharToMultiByte(CP_UTF8, 0, utf16, 5, nullptr, 0, nullptr, nullptr));
-  char narrow[8] = {};
-  ASSERT_EQ(7, WideCharToMultiByte(CP_UTF8, 0, utf16, -1, narrow, sizeof narrow, nullptr, nullptr));
-  EXPECT_STREQ(utf8, narrow);
-  EXPECT_EQ(static_cast<DWORD>(ERROR_INSUFFICIENT_BUFFER), errorOf([&] {
-              return WideCharToMultiByte(CP_UTF8, 0, utf16, -1, narrow, 3, nullptr, nullptr) != 0;
-            }));
-}
-
-// --- Windows Installer ---------------------------------------------------
-
-TEST_F(Win32Test, UnknownProductIsUnknownToTheInstaller) {
-  EXPECT_EQ(INSTALLSTATE_UNKNOWN, MsiQueryProductStateA(unknownProduct));
-  char location[MAX_PATH] = {};
-  DWORD size = sizeof location;
-  EXPECT_EQ(static_cast<UINT>(ERROR_UNKNOWN_PRODUCT),
-            MsiGetProductInfoA(unknownProduct, INSTALLPROPERTY_INSTALLLOCATION, location, &size));
+// The terminator is counted only for a length of -1; the text here is the same in every code page.
+TEST_F(Win32Test, ConversionsCountTheTerminatorOnlyForMinusOne) {
+  const char narrow[] = "hello";
+  const WCHAR wide[] = {'h', 'e', 'l', 'l', 'o', 0};
+  WCHAR wideOut[8] = {};
+  char narrowOut[8] = {};
+  const struct {
+    const char *call;
+    int expected;
+    std::function<int()> run;
+  } rows[] = {
+      {"wide size", 6, [&] { return MultiByteToWideChar(CP_ACP, 0, narrow, -1, nullptr, 0); }},
+      {"wide size unterminated", 5, [&] { return MultiByteToWideChar(CP_ACP, 0, narrow, 5, nullptr, 0); }},
+      {"wide", 6, [&] { return MultiByteToWideChar(CP_ACP, 0, narrow, -1, wideOut, 8); }},
+      {"narrow size", 6,
+       [&] { return WideCharToMultiByte(CP_ACP, 0, wide, -1, nullptr, 0, nullptr, nullptr); }},
+      {"narrow size unterminated", 5,
+       [&] { return WideCharToMultiByte(CP_ACP, 0, wide, 5, nullptr, 0, nullptr, nullptr); }},
+      {"narrow", 6, [&] { return WideCharToMultiByte(CP_ACP, 0, wide, -1, narrowOut, 8, nullptr, nullptr); }},
+  };
+  for (const auto &row : rows)
+    EXPECT_EQ(row.expected, row.run()) << row.call;
+  EXPECT_EQ(0, std::memcmp(wide, wideOut, sizeof wide));
+  EXPECT_STREQ(narrow, narrowOut);
+  const struct {
+    const char *call;
+    DWORD error;
+    std::function<bool()> run;
+  } refused[] = {
+      {"wide short", ERROR_INSUFFICIENT_BUFFER,
+       [&] { return MultiByteToWideChar(CP_ACP, 0, narrow, -1, wideOut, 3); }},
+      {"narrow short", ERROR_INSUFFICIENT_BUFFER,
+       [&] { return WideCharToMultiByte(CP_ACP, 0, wide, -1, narrowOut, 3, nullptr, nullptr); }},
+      {"empty", ERROR_INVALID_PARAMETER, [&] { return MultiByteToWideChar(CP_ACP, 0, "", 0, wideOut, 8); }},
+  };
+  for (const auto &row : refused)
+    EXPECT_EQ(row.error, errorOf([&] { return row.run() != 0; })) << row.call;
 }
 
 // A product registered the way Windows Installer registers a machine-wide
@@ -121,53 +118,45 @@ protected:
   }
 };
 
-TEST_F(InstallerTest, RegisteredProductIsInstalledAtItsLocationWithTheTrailingBackslash) {
-  advertise();
-  installProperties();
-  EXPECT_EQ(INSTALLSTATE_DEFAULT, MsiQueryProductStateA(registeredProduct));
-  char value[MAX_PATH] = {};
-  DWORD size = sizeof value;
-  ASSERT_EQ(static_cast<UINT>(ERROR_SUCCESS),
-            MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, value, &size));
-  EXPECT_STREQ(location, value);
-  EXPECT_EQ(std::strlen(location), size); // characters, without the terminator
-
-  char shortBuffer[8] = {};
-  size = sizeof shortBuffer;
-  EXPECT_EQ(static_cast<UINT>(ERROR_MORE_DATA),
-            MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, shortBuffer, &size));
-  EXPECT_EQ(std::strlen(location), size); // what the value needs; the buffer's content is not defined
-}
-
-// What the installer makes of each partial registration; only the installer's
-// own keys count, never the list of installed programs.
-TEST_F(InstallerTest, PartialRegistrationsAreNotInstalled) {
-  struct Case {
+// What the installer makes of a whole registration and of each part of one; only the
+// installer's own keys count, never the list of installed programs.
+TEST_F(InstallerTest, OnlyAWholeRegistrationIsInstalled) {
+  const struct {
     const char *name;
     bool advertised, properties, uninstallEntry;
     INSTALLSTATE state;
     UINT locationRc;
-  };
-  const Case cases[] = {
+  } rows[] = {
+      {"whole", true, true, false, INSTALLSTATE_DEFAULT, ERROR_SUCCESS},
       {"advertisement only", true, false, false, INSTALLSTATE_ADVERTISED, ERROR_UNKNOWN_PROPERTY},
       {"properties only", false, true, false, INSTALLSTATE_UNKNOWN, ERROR_UNKNOWN_PRODUCT},
       {"uninstall entry only", false, false, true, INSTALLSTATE_UNKNOWN, ERROR_UNKNOWN_PRODUCT},
   };
-  for (const Case &c : cases) {
-    SCOPED_TRACE(c.name);
-    if (c.advertised)
+  for (const auto &row : rows) {
+    SCOPED_TRACE(row.name);
+    if (row.advertised)
       advertise();
-    if (c.properties)
+    if (row.properties)
       installProperties();
-    if (c.uninstallEntry)
+    if (row.uninstallEntry)
       write(uninstallKey, "InstallLocation", location);
-    EXPECT_EQ(c.state, MsiQueryProductStateA(registeredProduct));
+    EXPECT_EQ(row.state, MsiQueryProductStateA(registeredProduct));
     char value[MAX_PATH] = {};
     DWORD size = sizeof value;
-    EXPECT_EQ(c.locationRc,
+    EXPECT_EQ(row.locationRc,
               MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, value, &size));
+    if (row.locationRc == ERROR_SUCCESS) {
+      EXPECT_STREQ(location, value);          // with the trailing backslash
+      EXPECT_EQ(std::strlen(location), size); // characters, without the terminator
+      char shortBuffer[8] = {};
+      size = sizeof shortBuffer;
+      EXPECT_EQ(static_cast<UINT>(ERROR_MORE_DATA),
+                MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, shortBuffer, &size));
+      EXPECT_EQ(std::strlen(location), size); // what the value needs; the buffer's content is not defined
+    }
     unregister();
   }
+  EXPECT_EQ(INSTALLSTATE_UNKNOWN, MsiQueryProductStateA(unknownProduct));
 }
 
 } // namespace
