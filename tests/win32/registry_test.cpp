@@ -191,6 +191,7 @@ TEST_F(RegistryTest, CopyKeyMergesValuesAndTheWholeSubtree) {
   setString(inner.get(), "Level", "one");
   ASSERT_EQ(ERROR_SUCCESS, create("Source\\Inner\\Deepest", deepest));
   setString(deepest.get(), "Level", "two");
+  ASSERT_EQ(ERROR_SUCCESS, create("Target\\INNER", target));
   ASSERT_EQ(ERROR_SUCCESS, create("Target", target));
   setString(target.get(), "SHARED", "old");
   setString(target.get(), "Kept", "untouched");
@@ -198,7 +199,8 @@ TEST_F(RegistryTest, CopyKeyMergesValuesAndTheWholeSubtree) {
   ASSERT_EQ(ERROR_SUCCESS, SHCopyKeyA(root_.get(), "Source", target.get(), 0));
   EXPECT_EQ("from source", text(target.get(), "Shared"));
   EXPECT_EQ("untouched", text(target.get(), "Kept"));
-  EXPECT_EQ((Names{"SHARED", "Kept", "Count"}), listValues(target.get()).names);
+  EXPECT_EQ((Names{"SHARED", "Kept", "Count"}), listValues(target.get()).names); // names keep their case
+  EXPECT_EQ(Names{"INNER"}, listSubkeys(target.get()).names);
   DWORD type = 0;
   string data;
   ASSERT_EQ(ERROR_SUCCESS, query(target.get(), "Count", type, data));

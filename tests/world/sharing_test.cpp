@@ -1,10 +1,12 @@
 // Several processes over one world: every change is seen by the others at once,
-// concurrent writers lose nothing, and a writer killed at any moment leaves a
-// whole hive behind.
+// concurrent writers lose nothing, a writer killed at any moment leaves a whole
+// hive behind, and events appended at once never mix.
 #include "platform/win32.h"
+#include "sim/common/events.h"
 #include "sim/posix/regfile.h"
 #include "tests/support/world_access.h"
 
+#include <nlohmann/json.hpp>
 #include <signal.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -30,6 +32,21 @@ int inChild(const std::function<bool()> &body) {
   int status = 0;
   waitpid(pid, &status, 0);
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
+// Runs body(i) in n child processes at once; true when every one returned true.
+bool inChildren(int n, const std::function<bool(int)> &body) {
+  std::vector<pid_t> children;
+  for (int i = 0; i < n; ++i)
+    if ((children.emplace_back(fork())) == 0)
+      _exit(body(i) ? 0 : 1);
+  bool ok = true;
+  for (pid_t child : children) {
+    int status = 0;
+    waitpid(child, &status, 0);
+    ok = ok && WIFEXITED(status) && WEXITSTATUS(status) == 0;
+  }
+  return ok;
 }
 
 // Runs `forever` in a child process and kills it 20 to 100 ms later.
@@ -84,21 +101,13 @@ TEST_F(SharingTest, AnOpenKeySeesAnotherProcessChanges) {
 
 TEST_F(SharingTest, ConcurrentWritersLoseNothing) {
   constexpr int kWriters = 3, kValues = 40;
-  std::vector<pid_t> children;
-  for (int writer = 0; writer < kWriters; ++writer)
-    if ((children.emplace_back(fork())) == 0) {
-      HKEY key = createKey("SOFTWARE\\Busy");
-      for (int i = 0; i < kValues; ++i)
-        if (putDword(key, ("w" + std::to_string(writer) + "_" + std::to_string(i)).c_str(), i) !=
-            ERROR_SUCCESS)
-          _exit(1);
-      _exit(0);
-    }
-  for (pid_t child : children) {
-    int status = 0;
-    waitpid(child, &status, 0);
-    ASSERT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
-  }
+  ASSERT_TRUE(inChildren(kWriters, [](int writer) {
+    HKEY key = createKey("SOFTWARE\\Busy");
+    for (int i = 0; i < kValues; ++i)
+      if (putDword(key, ("w" + std::to_string(writer) + "_" + std::to_string(i)).c_str(), i) != ERROR_SUCCESS)
+        return false;
+    return true;
+  }));
   HiveFile file(worldRoot() + "/system.reg", kHive);
   ASSERT_EQ(file.read([](const Key &tree) -> LONG {
     const Key *busy = posix::hive::findKey(tree, {"SOFTWARE", "Busy"});
@@ -176,6 +185,8 @@ TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
     EXPECT_EQ(seen, 2u);
     EXPECT_EQ(readHostFile(worldRoot() + "/system.reg"), before);
     EXPECT_FALSE(othersSee("First"));
+    writeHostFile(worldRoot() + "/system.reg", before + "; changed by another process\n");
+    EXPECT_EQ(queryDword(key, "Second", seen), ERROR_SUCCESS) << "the batch's own changes stay its content";
     EXPECT_TRUE(outer.commit());
     EXPECT_TRUE(othersSee("First"));
     EXPECT_TRUE(othersSee("Second"));
@@ -333,30 +344,50 @@ TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
-// A log writer killed at random leaves a prefix of its changes; the next process goes on from it.
-TEST_F(SharingTest, KilledLogWriterLeavesAPrefixOfItsChanges) {
-  const std::string hivePath = worldRoot() + "/system.reg";
-  std::mt19937 random(777);
-  DWORD highest = 0;
-  for (int round = 0; round < 6; ++round) {
-    killMidway(random, [&] {
-      HKEY key = createKey("SOFTWARE\\Prefix");
-      for (DWORD n = highest + 1;; ++n)
-        putDword(key, ("V" + std::to_string(n)).c_str(), n);
-    });
-    Key tree;
-    std::string error;
-    ASSERT_TRUE(posix::hive::loadHive(hivePath, kHive, tree, error)) << error;
-    ASSERT_TRUE(posix::hive::parseHive(readHostFile(hivePath), kHive, tree, error)) << error;
-    ASSERT_TRUE(posix::hive::loadHive(hivePath, kHive, tree, error)) << error;
-    const Key *prefix = posix::hive::findKey(tree, {"SOFTWARE", "Prefix"});
-    size_t count = prefix == nullptr ? 0 : prefix->values.size();
-    ASSERT_GE(count, highest);
-    for (DWORD n = 1; n <= count; ++n)
-      ASSERT_EQ(prefix->values.count("v" + std::to_string(n)), 1u) << "V" << n << " of " << count;
-    highest = static_cast<DWORD>(count);
+// Events are whole JSON lines, also when several processes append at once.
+using EventTest = kxltest::WorldTest;
+
+std::vector<nlohmann::json> readEvents(const std::string &path) {
+  std::vector<nlohmann::json> events;
+  std::istringstream lines(readHostFile(path));
+  std::string line;
+  while (std::getline(lines, line))
+    events.push_back(nlohmann::json::parse(line, nullptr, false));
+  return events;
+}
+
+TEST_F(EventTest, EachEventIsOneJsonLine) {
+  ASSERT_EQ(eventsPath(), worldRoot() + "/events.jsonl");
+  ASSERT_TRUE(appendEvent("run", {{"program", "kxlset.exe"}, {"args", "-cleanup \"x\"\nsecond line"}}));
+  ASSERT_TRUE(appendEvent("audit", {{"path", std::string("C:\\caf\xe9")}})); // not UTF-8
+  auto events = readEvents(eventsPath());
+  ASSERT_EQ(events.size(), 2u);
+  EXPECT_EQ(events[0]["event"], "run");
+  EXPECT_EQ(events[0]["args"], "-cleanup \"x\"\nsecond line");
+  ASSERT_FALSE(events[1].is_discarded());
+  EXPECT_EQ(events[1]["event"], "audit");
+  EXPECT_EQ(events[1]["path"].get<std::string>().rfind("C:\\caf", 0), 0u);
+}
+
+TEST_F(EventTest, AppendsFromSeveralProcessesNeverMix) {
+  constexpr int kWriters = 3, kEvents = 100;
+  ASSERT_TRUE(inChildren(kWriters, [](int writer) {
+    for (int i = 0; i < kEvents; ++i)
+      if (!appendEvent("load", {{"writer", std::to_string(writer)},
+                                {"n", std::to_string(i)},
+                                {"fill", std::string(6000, static_cast<char>('a' + writer))}}))
+        return false;
+    return true;
+  }));
+  auto events = readEvents(eventsPath());
+  ASSERT_EQ(events.size(), static_cast<size_t>(kWriters * kEvents));
+  std::vector<int> next(kWriters, 0);
+  for (const auto &event : events) {
+    ASSERT_FALSE(event.is_discarded());
+    int writer = std::stoi(event["writer"].get<std::string>());
+    EXPECT_EQ(event["n"], std::to_string(next[writer]++)); // each writer's order kept
+    EXPECT_EQ(event["fill"], std::string(6000, static_cast<char>('a' + writer)));
   }
-  EXPECT_GT(highest, 0u);
 }
 
 } // namespace
