@@ -257,19 +257,6 @@ ProcessState *processOf(HANDLE handle) {
   return process == nullptr ? nullptr : process->state.get();
 }
 
-void sleepMilliseconds(long ms) {
-  struct timespec pause {
-    0, ms * 1000000L
-  };
-  nanosleep(&pause, nullptr);
-}
-
-long long monotonicMilliseconds() {
-  struct timespec now {};
-  clock_gettime(CLOCK_MONOTONIC, &now);
-  return static_cast<long long>(now.tv_sec) * 1000LL + now.tv_nsec / 1000000L;
-}
-
 HANDLE processHandle(const std::shared_ptr<ProcessState> &state) {
   auto object = std::make_unique<ProcessObject>();
   object->state = state;
@@ -303,24 +290,14 @@ BOOL CreateProcessA(LPCSTR lpApplicationName, LPSTR lpCommandLine, LPSECURITY_AT
   return TRUE;
 }
 
-DWORD WaitForSingleObject(HANDLE hHandle, DWORD dwMilliseconds) {
+// Every wait lasts until the program ends: the command never waits with a limit.
+DWORD WaitForSingleObject(HANDLE hHandle, DWORD) {
   if (kxlsim::shouldFail("WaitForSingleObject"))
     return failWith(ERROR_INVALID_HANDLE, WAIT_FAILED);
   ProcessState *state = processOf(hHandle);
   if (state == nullptr)
     return failWith(ERROR_INVALID_HANDLE, WAIT_FAILED);
-  if (dwMilliseconds == INFINITE)
-    return pollEnded(*state, true) ? WAIT_OBJECT_0 : WAIT_FAILED;
-  long long deadline = monotonicMilliseconds() + dwMilliseconds;
-  long pause = 1;
-  while (!pollEnded(*state, false)) {
-    long long left = deadline - monotonicMilliseconds();
-    if (left <= 0)
-      return WAIT_TIMEOUT;
-    sleepMilliseconds(pause < left ? pause : static_cast<long>(left));
-    pause = pause < 20 ? pause * 2 : 20;
-  }
-  return WAIT_OBJECT_0;
+  return pollEnded(*state, true) ? WAIT_OBJECT_0 : WAIT_FAILED;
 }
 
 BOOL GetExitCodeProcess(HANDLE hProcess, LPDWORD lpExitCode) {

@@ -1,12 +1,9 @@
 // Started by the launch tests. Writes what it was given to the file named by
-// KXL_CHILD_REPORT (one "key=value" line each), waits for the file named by
-// KXL_CHILD_WAIT_FOR when set, and exits with the code in KXL_CHILD_EXIT.
+// KXL_CHILD_REPORT (one "key=value" line each) and exits with the code in KXL_CHILD_EXIT.
 #include "platform/win32.h"
 
-#include <chrono>
 #include <cstdio>
 #include <cstdlib>
-#include <thread>
 #include <unistd.h>
 
 namespace {
@@ -16,17 +13,9 @@ const char *envOr(const char *name, const char *fallback) {
   return value != nullptr ? value : fallback;
 }
 
-void waitForFile(const char *path) {
-  while (access(path, F_OK) != 0)
-    std::this_thread::sleep_for(std::chrono::milliseconds(5));
-}
-
 } // namespace
 
 int main(int argc, char **argv) {
-  const char *waitFor = std::getenv("KXL_CHILD_WAIT_FOR");
-  if (waitFor != nullptr)
-    waitForFile(waitFor);
   FILE *report = std::fopen(envOr("KXL_CHILD_REPORT", "/dev/null"), "w");
   if (report == nullptr)
     return 99;

@@ -1,10 +1,9 @@
-// The run-time modules: loading by the world's files, the cluster API over
-// the world's cluster, and the ODBC data source list.
+// The run-time modules: the cluster API over the world's cluster and the ODBC data source
+// list. Loading and binding them is stated by the cluster step's cases (tests/cluster).
 #include "tests/support/world_access.h"
 
 #include "platform/clusapi.h"
 #include "platform/odbc.h"
-#include "sim/posix/modules.h"
 
 #include <functional>
 #include <string>
@@ -22,30 +21,6 @@ class ModulesTest : public kxltest::WorldTest {
 protected:
   ModulesTest() : WorldTest(kxltestsupport::Machine::kModules) {}
 };
-
-TEST_F(ModulesTest, ModulesLoadOnlyWhenTheWorldHasTheirFiles) {
-  HMODULE clusapi = LoadLibraryA("CLUSAPI.DLL");
-  HMODULE resutils = LoadLibraryA("C:\\Windows\\System32\\resutils");
-  ASSERT_NE(clusapi, nullptr);
-  ASSERT_NE(resutils, nullptr);
-  EXPECT_NE(GetProcAddress(resutils, "ResUtilResourceTypesEqual"), nullptr);
-  EXPECT_EQ(GetProcAddress(clusapi, "ResUtilResourceTypesEqual"), nullptr)
-      << "exports belong to their module";
-  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_PROC_NOT_FOUND));
-
-  char path[MAX_PATH];
-  ASSERT_GT(GetModuleFileNameA(clusapi, path, sizeof path), 0u);
-  EXPECT_STREQ(path, "C:\\windows\\system32\\CLUSAPI.DLL");
-  EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 1);
-  EXPECT_TRUE(FreeLibrary(clusapi));
-  EXPECT_TRUE(FreeLibrary(resutils));
-  EXPECT_EQ(kxlsim::posix::moduleLoadCount("clusapi.dll"), 0);
-  EXPECT_FALSE(FreeLibrary(clusapi)) << "a freed module handle is no longer valid";
-  EXPECT_EQ(GetProcAddress(clusapi, "OpenCluster"), nullptr);
-  ASSERT_TRUE(DeleteFileA("C:\\windows\\system32\\clusapi.dll"));
-  EXPECT_EQ(LoadLibraryA("clusapi.dll"), nullptr) << "the world no longer has the module";
-  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_MOD_NOT_FOUND));
-}
 
 // The entry points the cluster case uses, bound by name as the command does.
 #define KXL_BOUND(module, name) PFN_##name name = entry<PFN_##name>(module, #name)

@@ -21,7 +21,7 @@ protected:
     setenv("KXL_CHILD_REPORT", host("report.txt").c_str(), 1);
   }
   void TearDown() override {
-    for (const char *name : {"KXL_CHILD_REPORT", "KXL_CHILD_EXIT", "KXL_CHILD_VALUE", "KXL_CHILD_WAIT_FOR"})
+    for (const char *name : {"KXL_CHILD_REPORT", "KXL_CHILD_EXIT", "KXL_CHILD_VALUE"})
       unsetenv(name);
     WorldTest::TearDown();
   }
@@ -89,26 +89,6 @@ TEST_F(ProcessTest, ProgramsNamedWithoutPathAreSearchedInSystemDirectoryAndPath)
   EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_FILE_NOT_FOUND));
   EXPECT_EQ(run("C:\\KXL\\my bin\\child.exe", "", "C:\\NoSuchDir"), -1);
   EXPECT_EQ(GetLastError(), 267u);
-}
-
-TEST_F(ProcessTest, RunningChildIsStillActiveUntilItEnds) {
-  setenv("KXL_CHILD_WAIT_FOR", host("go").c_str(), 1);
-  STARTUPINFOA startup{};
-  PROCESS_INFORMATION info{};
-  char commandLine[] = "\"C:\\KXL\\my bin\\child.exe\"";
-  ASSERT_TRUE(
-      CreateProcessA(nullptr, commandLine, nullptr, nullptr, FALSE, 0, nullptr, nullptr, &startup, &info));
-  EXPECT_EQ(WaitForSingleObject(info.hProcess, 0), static_cast<DWORD>(WAIT_TIMEOUT));
-  DWORD code = 0;
-  EXPECT_TRUE(GetExitCodeProcess(info.hProcess, &code));
-  EXPECT_EQ(code, static_cast<DWORD>(STILL_ACTIVE));
-  kxltestsupport::writeHostFile(host("go"), "");
-  EXPECT_EQ(WaitForSingleObject(info.hThread, INFINITE), static_cast<DWORD>(WAIT_OBJECT_0));
-  EXPECT_TRUE(GetExitCodeProcess(info.hProcess, &code));
-  EXPECT_EQ(code, 0u);
-  CloseHandle(info.hThread);
-  CloseHandle(info.hProcess);
-  EXPECT_EQ(WaitForSingleObject(info.hProcess, 0), WAIT_FAILED);
 }
 
 TEST_F(ProcessTest, ModuleFileNameIsCutToTheBufferAsWindowsDoes) {
