@@ -74,87 +74,61 @@ TEST_F(Win32Test, ConversionsCountTheTerminatorOnlyForMinusOne) {
     EXPECT_EQ(row.error, errorOf([&] { return row.run() != 0; })) << row.call;
 }
 
-// A product registered the way Windows Installer registers a machine-wide
-// installation, under its code's packed form (worked out by hand here).
-const char registeredProduct[] = "{0A1B2C3D-4E5F-4061-8273-94A5B6C7D8E9}";
-const char productKey[] = "SOFTWARE\\Classes\\Installer\\Products\\D3C2B1A0F5E416042837495A6B7C8D9E";
-#define KXL_USERDATA_PRODUCT                                                                                 \
-  "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Installer\\UserData\\S-1-5-18\\Products\\"                  \
-  "D3C2B1A0F5E416042837495A6B7C8D9E"
-const char userDataKey[] = KXL_USERDATA_PRODUCT;
-const char propertiesKey[] = KXL_USERDATA_PRODUCT "\\InstallProperties";
-const char uninstallKey[] =
-    "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\{0A1B2C3D-4E5F-4061-8273-94A5B6C7D8E9}";
-const char location[] = "C:\\Program Files\\KxlConformance\\";
-
-class InstallerTest : public Win32Test {
-protected:
-  void TearDown() override {
-    unregister();
-    Win32Test::TearDown();
-  }
-
-  static void unregister() {
-    for (const char *key : {productKey, userDataKey, uninstallKey})
-      SHDeleteKeyA(HKEY_LOCAL_MACHINE, key);
-  }
-
-  static void write(const char *key, const char *name, DWORD type, const void *data, DWORD size) {
+// A product registered as Windows Installer registers a machine-wide installation, under its
+// code's packed form (worked out by hand here): only a whole registration is installed, and only
+// the installer's own keys count, never the list of installed programs.
+TEST_F(Win32Test, OnlyAWholeInstallerRegistrationIsInstalled) {
+  const char product[] = "{0A1B2C3D-4E5F-4061-8273-94A5B6C7D8E9}", location[] = "C:\\Program Files\\Kxl\\";
+  const std::string packed = "D3C2B1A0F5E416042837495A6B7C8D9E";
+  const std::string advertisement = "SOFTWARE\\Classes\\Installer\\Products\\" + packed;
+  const std::string userData =
+      "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Installer\\UserData\\S-1-5-18\\Products\\" + packed;
+  const std::string uninstall =
+      "SOFTWARE\\Microsoft\\Windows\\CurrentVersion\\Uninstall\\" + std::string(product);
+  auto write = [](const std::string &key, const char *name, DWORD type, const void *data, DWORD size) {
     HKEY handle = nullptr;
-    ASSERT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, key, 0, nullptr, 0, KEY_ALL_ACCESS, nullptr,
-                                             &handle, nullptr));
-    ASSERT_EQ(ERROR_SUCCESS, RegSetValueExA(handle, name, 0, type, static_cast<const BYTE *>(data), size));
+    EXPECT_EQ(ERROR_SUCCESS, RegCreateKeyExA(HKEY_LOCAL_MACHINE, key.c_str(), 0, nullptr, 0, KEY_ALL_ACCESS,
+                                             nullptr, &handle, nullptr));
+    EXPECT_EQ(ERROR_SUCCESS, RegSetValueExA(handle, name, 0, type, static_cast<const BYTE *>(data), size));
     RegCloseKey(handle);
-  }
-  static void write(const char *key, const char *name, const char *text) {
-    write(key, name, REG_SZ, text, static_cast<DWORD>(std::strlen(text) + 1));
-  }
-
-  static void advertise() { write(productKey, "ProductName", "KxlConformance"); }
-  static void installProperties() {
-    write(propertiesKey, "InstallLocation", location);
-    const DWORD one = 1;
-    write(propertiesKey, "WindowsInstaller", REG_DWORD, &one, sizeof one);
-  }
-};
-
-// What the installer makes of a whole registration and of each part of one; only the
-// installer's own keys count, never the list of installed programs.
-TEST_F(InstallerTest, OnlyAWholeRegistrationIsInstalled) {
+  };
+  enum { kAdvertised = 1, kProperties = 2, kUninstallEntry = 4 };
   const struct {
     const char *name;
-    bool advertised, properties, uninstallEntry;
+    int parts;
     INSTALLSTATE state;
     UINT locationRc;
   } rows[] = {
-      {"whole", true, true, false, INSTALLSTATE_DEFAULT, ERROR_SUCCESS},
-      {"advertisement only", true, false, false, INSTALLSTATE_ADVERTISED, ERROR_UNKNOWN_PROPERTY},
-      {"properties only", false, true, false, INSTALLSTATE_UNKNOWN, ERROR_UNKNOWN_PRODUCT},
-      {"uninstall entry only", false, false, true, INSTALLSTATE_UNKNOWN, ERROR_UNKNOWN_PRODUCT},
+      {"whole", kAdvertised | kProperties, INSTALLSTATE_DEFAULT, ERROR_SUCCESS},
+      {"advertisement only", kAdvertised, INSTALLSTATE_ADVERTISED, ERROR_UNKNOWN_PROPERTY},
+      {"properties only", kProperties, INSTALLSTATE_UNKNOWN, ERROR_UNKNOWN_PRODUCT},
+      {"uninstall entry only", kUninstallEntry, INSTALLSTATE_UNKNOWN, ERROR_UNKNOWN_PRODUCT},
   };
+  const DWORD one = 1;
   for (const auto &row : rows) {
     SCOPED_TRACE(row.name);
-    if (row.advertised)
-      advertise();
-    if (row.properties)
-      installProperties();
-    if (row.uninstallEntry)
-      write(uninstallKey, "InstallLocation", location);
-    EXPECT_EQ(row.state, MsiQueryProductStateA(registeredProduct));
-    char value[MAX_PATH] = {};
+    if (row.parts & kAdvertised)
+      write(advertisement, "ProductName", REG_SZ, "Kxl", 4);
+    if (row.parts & kProperties) {
+      write(userData + "\\InstallProperties", "InstallLocation", REG_SZ, location, sizeof location);
+      write(userData + "\\InstallProperties", "WindowsInstaller", REG_DWORD, &one, sizeof one);
+    }
+    if (row.parts & kUninstallEntry)
+      write(uninstall, "InstallLocation", REG_SZ, location, sizeof location);
+    EXPECT_EQ(row.state, MsiQueryProductStateA(product));
+    char value[MAX_PATH] = {}, shortBuffer[8] = {};
     DWORD size = sizeof value;
-    EXPECT_EQ(row.locationRc,
-              MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, value, &size));
+    EXPECT_EQ(row.locationRc, MsiGetProductInfoA(product, INSTALLPROPERTY_INSTALLLOCATION, value, &size));
     if (row.locationRc == ERROR_SUCCESS) {
       EXPECT_STREQ(location, value);          // with the trailing backslash
       EXPECT_EQ(std::strlen(location), size); // characters, without the terminator
-      char shortBuffer[8] = {};
       size = sizeof shortBuffer;
       EXPECT_EQ(static_cast<UINT>(ERROR_MORE_DATA),
-                MsiGetProductInfoA(registeredProduct, INSTALLPROPERTY_INSTALLLOCATION, shortBuffer, &size));
+                MsiGetProductInfoA(product, INSTALLPROPERTY_INSTALLLOCATION, shortBuffer, &size));
       EXPECT_EQ(std::strlen(location), size); // what the value needs; the buffer's content is not defined
     }
-    unregister();
+    for (const std::string &key : {advertisement, userData, uninstall})
+      SHDeleteKeyA(HKEY_LOCAL_MACHINE, key.c_str());
   }
   EXPECT_EQ(INSTALLSTATE_UNKNOWN, MsiQueryProductStateA(unknownProduct));
 }
