@@ -5,7 +5,6 @@
 
 #include <gtest/gtest.h>
 
-#include <cstring>
 #include <sstream>
 
 namespace kxlsim::posix::hive {
@@ -20,24 +19,7 @@ std::vector<BYTE> bytes(const std::string &text, bool terminated = true) {
   return data;
 }
 
-bool sameTree(const Key &a, const Key &b) {
-  if (a.name != b.name || a.values.size() != b.values.size() || a.subkeys.size() != b.subkeys.size())
-    return false;
-  for (const auto &[folded, value] : a.values) {
-    auto it = b.values.find(folded);
-    if (it == b.values.end() || it->second.name != value.name || it->second.type != value.type ||
-        it->second.data != value.data)
-      return false;
-  }
-  for (const auto &[folded, child] : a.subkeys) {
-    auto it = b.subkeys.find(folded);
-    if (it == b.subkeys.end() || !sameTree(child, it->second))
-      return false;
-  }
-  return true;
-}
-
-Key sampleTree() {
+TEST(HiveText, EveryValueTypeRoundTrips) {
   Key root;
   bool created = false;
   Key &zav = createKey(root, {"SOFTWARE", "ZAV", "KXL"}, created);
@@ -60,17 +42,11 @@ Key sampleTree() {
   setValue(zav, "a", REG_SZ, bytes("a"));
   createKey(root, {"SOFTWARE", "Empty Key"}, created);
   createKey(root, {"SOFTWARE", "aaa"}, created);
-  return root;
-}
-
-TEST(HiveText, EveryValueTypeRoundTrips) {
-  Key tree = sampleTree();
-  std::string text = formatHive(tree, kRoot);
+  std::string text = formatHive(root, kRoot);
   Key parsed;
   std::string error;
   ASSERT_TRUE(parseHive(text, kRoot, parsed, error)) << error << "\n" << text;
-  EXPECT_TRUE(sameTree(tree, parsed)) << text;
-  EXPECT_EQ(formatHive(parsed, kRoot), text);
+  EXPECT_EQ(formatHive(parsed, kRoot), text); // the text names every byte: the same text is the same tree
 
   EXPECT_EQ(text.rfind("REGEDIT4\n", 0), 0u);
   for (const char *line :

@@ -2,13 +2,12 @@
 #include "platform/win32.h"
 #include "tests/support/world_access.h"
 
-#include <fcntl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <climits>
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <vector>
 
 namespace kxlsim::testing {
@@ -66,33 +65,37 @@ TEST_F(PathTest, WindowsPathsMapIgnoringCaseAndNeverLeaveTheirDriveOrShare) {
 // A folder's listing is kept between lookups: changes by other processes (and
 // by hand) are still seen at once, and so are this process's own.
 TEST_F(PathTest, KeptListingsFollowEveryChangeOfTheFolder) {
-  const std::string bin = host("drive_c/Program Files/KXL/bin");
-  const std::string windowsBin = "C:\\Program Files\\KXL\\bin\\";
-  EXPECT_EQ(mapped(windowsBin + "Tool.exe"), bin + "/Tool.exe") << "listed, not there";
-  pid_t child = fork();
-  if (child == 0)
-    _exit(std::ofstream(bin + "/TOOL.EXE") ? 0 : 1);
-  int status = 0;
-  ASSERT_EQ(waitpid(child, &status, 0), child);
-  EXPECT_EQ(mapped(windowsBin + "Tool.exe"), bin + "/TOOL.EXE") << "another process's file";
-  std::filesystem::remove(bin + "/TOOL.EXE");
-  EXPECT_EQ(mapped(windowsBin + "tool.exe"), bin + "/tool.exe") << "removed by hand";
-
-  // This process's own changes through the file calls.
-  ASSERT_TRUE(CreateDirectoryA((windowsBin + "Sub").c_str(), nullptr));
-  EXPECT_EQ(mapped("C:\\Program Files\\KXL\\BIN\\sub\\x"), bin + "/Sub/x");
-  HANDLE file = CreateFileA((windowsBin + "Made.txt").c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW,
-                            FILE_ATTRIBUTE_NORMAL, nullptr);
-  ASSERT_NE(file, INVALID_HANDLE_VALUE);
-  CloseHandle(file);
-  EXPECT_EQ(mapped(windowsBin + "MADE.TXT"), bin + "/Made.txt");
-  ASSERT_TRUE(CopyFileA((windowsBin + "made.txt").c_str(), (windowsBin + "Copy.txt").c_str(), TRUE));
-  EXPECT_EQ(mapped(windowsBin + "COPY.txt"), bin + "/Copy.txt");
-  ASSERT_TRUE(MoveFileExA((windowsBin + "copy.txt").c_str(), (windowsBin + "Moved.txt").c_str(), 0));
-  EXPECT_EQ(mapped(windowsBin + "copy.txt"), bin + "/copy.txt");
-  EXPECT_EQ(mapped(windowsBin + "moved.TXT"), bin + "/Moved.txt");
-  ASSERT_TRUE(DeleteFileA((windowsBin + "MOVED.txt").c_str()));
-  EXPECT_EQ(mapped(windowsBin + "moved.txt"), bin + "/moved.txt");
+  const std::string bin = host("drive_c/Program Files/KXL/bin"), windowsBin = "C:\\Program Files\\KXL\\bin\\";
+  auto made = [](HANDLE file) { return file != INVALID_HANDLE_VALUE && CloseHandle(file); };
+  const struct {
+    const char *change;
+    std::function<bool()> run;
+    const char *windows, *found;
+  } steps[] = {
+      {"listed, not there", [] { return true; }, "Tool.exe", "Tool.exe"},
+      {"made by another process", [&] { return std::ofstream(bin + "/TOOL.EXE").good(); }, "Tool.exe",
+       "TOOL.EXE"},
+      {"removed by hand", [&] { return std::filesystem::remove(bin + "/TOOL.EXE"); }, "tool.exe", "tool.exe"},
+      {"folder", [&] { return CreateDirectoryA((windowsBin + "Sub").c_str(), nullptr); }, "SUB\\x", "Sub/x"},
+      {"file",
+       [&] {
+         return made(CreateFileA((windowsBin + "Made.txt").c_str(), GENERIC_WRITE, 0, nullptr, CREATE_NEW,
+                                 FILE_ATTRIBUTE_NORMAL, nullptr));
+       },
+       "MADE.TXT", "Made.txt"},
+      {"copy",
+       [&] { return CopyFileA((windowsBin + "made.txt").c_str(), (windowsBin + "Copy.txt").c_str(), 1); },
+       "COPY.txt", "Copy.txt"},
+      {"move",
+       [&] { return MoveFileExA((windowsBin + "copy.txt").c_str(), (windowsBin + "Moved.txt").c_str(), 0); },
+       "copy.txt", "copy.txt"},
+      {"moved", [] { return true; }, "moved.TXT", "Moved.txt"},
+      {"delete", [&] { return DeleteFileA((windowsBin + "MOVED.txt").c_str()); }, "moved.txt", "moved.txt"},
+  };
+  for (const auto &step : steps) {
+    ASSERT_TRUE(step.run()) << step.change;
+    EXPECT_EQ(mapped(windowsBin + step.windows), bin + "/" + step.found) << step.change;
+  }
 }
 
 // The current directory is the working one as a Windows path, C:\ outside the world.
@@ -140,28 +143,11 @@ TEST(WorldProbe, Report) {
 
 // Runs this test program through `link` without KXLSIM_ROOT; returns its exit status.
 int runProbe(const std::string &link, const std::string &report, bool require, const std::string &errors) {
-  char self[PATH_MAX];
-  ssize_t n = readlink("/proc/self/exe", self, sizeof self - 1);
-  if (n <= 0)
-    return -1;
-  self[n] = '\0';
-  std::filesystem::create_symlink(self, link);
-  pid_t pid = fork();
-  if (pid == 0) {
-    unsetenv("KXLSIM_ROOT");
-    setenv("KXL_WORLD_PROBE", report.c_str(), 1);
-    if (require)
-      setenv("KXL_WORLD_PROBE_REQUIRE", "1", 1);
-    int err = open(errors.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-    int null = open("/dev/null", O_WRONLY);
-    dup2(err, 2);
-    dup2(null, 1);
-    std::string filter = "--gtest_filter=WorldProbe.Report";
-    execl(link.c_str(), link.c_str(), filter.c_str(), static_cast<char *>(nullptr));
-    _exit(127);
-  }
-  int status = 0;
-  waitpid(pid, &status, 0);
+  std::filesystem::create_symlink(std::filesystem::read_symlink("/proc/self/exe"), link);
+  std::string command = "env -u KXLSIM_ROOT KXL_WORLD_PROBE='" + report + "'" +
+                        (require ? " KXL_WORLD_PROBE_REQUIRE=1 '" : " '") + link +
+                        "' --gtest_filter=WorldProbe.Report >/dev/null 2>'" + errors + "'";
+  int status = std::system(command.c_str());
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 

@@ -24,16 +24,6 @@ using kxltestsupport::writeHostFile;
 using posix::hive::HiveFile;
 using posix::hive::Key;
 
-// Runs `body` in a child process; its exit code (0 when body returned true).
-int inChild(const std::function<bool()> &body) {
-  pid_t pid = fork();
-  if (pid == 0)
-    _exit(body() ? 0 : 1);
-  int status = 0;
-  waitpid(pid, &status, 0);
-  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-}
-
 // Runs body(i) in n child processes at once; true when every one returned true.
 bool inChildren(int n, const std::function<bool(int)> &body) {
   std::vector<pid_t> children;
@@ -86,14 +76,15 @@ TEST_F(SharingTest, AnOpenKeySeesAnotherProcessChanges) {
   ASSERT_EQ(putDword(key, "Value", 0), ERROR_SUCCESS);
   // Same-sized rewrites in quick succession: each must still be noticed.
   for (DWORD round = 1; round <= 20; ++round) {
-    ASSERT_EQ(
-        inChild([&] { return putDword(createKey("SOFTWARE\\SHARED"), "value", round) == ERROR_SUCCESS; }), 0);
+    ASSERT_TRUE(inChildren(
+        1, [&](int) { return putDword(createKey("SOFTWARE\\SHARED"), "value", round) == ERROR_SUCCESS; }));
     DWORD seen = 0;
     ASSERT_EQ(queryDword(key, "Value", seen), ERROR_SUCCESS);
     ASSERT_EQ(seen, round);
   }
   // A key deleted by another process is gone for this process's handle too.
-  ASSERT_EQ(inChild([] { return SHDeleteKeyA(HKEY_LOCAL_MACHINE, "Software\\Shared") == ERROR_SUCCESS; }), 0);
+  ASSERT_TRUE(inChildren(
+      1, [](int) { return SHDeleteKeyA(HKEY_LOCAL_MACHINE, "Software\\Shared") == ERROR_SUCCESS; }));
   DWORD seen = 0;
   EXPECT_EQ(queryDword(key, "Value", seen), ERROR_KEY_DELETED);
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
@@ -288,7 +279,8 @@ TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
 TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
   const std::string hivePath = worldRoot() + "/system.reg";
   // No clean-up in the child: the log stays.
-  ASSERT_EQ(inChild([] { return putDword(createKey("SOFTWARE\\Cut"), "Whole", 1) == ERROR_SUCCESS; }), 0);
+  ASSERT_TRUE(
+      inChildren(1, [](int) { return putDword(createKey("SOFTWARE\\Cut"), "Whole", 1) == ERROR_SUCCESS; }));
   const std::string whole = replayed(hivePath);
   ASSERT_NE(whole.find("\"Whole\"=dword:00000001"), std::string::npos);
   const std::string record = "[HKEY_LOCAL_MACHINE\\SOFTWARE\\Cut]\n\"Torn\"=dword:00000002\n";
@@ -315,14 +307,13 @@ TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
 // values if replayed: readers ignore it and the next change starts a new one.
 TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
   const std::string hivePath = worldRoot() + "/system.reg";
-  ASSERT_EQ(inChild([&] {
-              HKEY key = createKey("SOFTWARE\\Stale");
-              bool ok = putDword(key, "Value", 1) == ERROR_SUCCESS;
-              std::string oldLog = readHostFile(hivePath + ".log");
-              ok = ok && RegDeleteValueA(key, "Value") == ERROR_SUCCESS;
-              return writeHostFile(worldRoot() + "/old.log", oldLog) && ok;
-            }),
-            0);
+  ASSERT_TRUE(inChildren(1, [&](int) {
+    HKEY key = createKey("SOFTWARE\\Stale");
+    bool ok = putDword(key, "Value", 1) == ERROR_SUCCESS;
+    std::string oldLog = readHostFile(hivePath + ".log");
+    ok = ok && RegDeleteValueA(key, "Value") == ERROR_SUCCESS;
+    return writeHostFile(worldRoot() + "/old.log", oldLog) && ok;
+  }));
   {
     HiveFile fold(hivePath, kHive); // folds when it ends, as a process does
     ASSERT_EQ(fold.change([](const Key &, posix::hive::Change &c) -> LONG {
