@@ -4,6 +4,7 @@
 
 #include <cstdlib>
 #include <filesystem>
+#include <sstream>
 #include <string>
 #include <unistd.h>
 #include <vector>
@@ -42,14 +43,12 @@ protected:
     return code;
   }
 
-  std::vector<std::string> reportLines(const char *prefix) const {
+  std::vector<std::string> reportLines(const std::string &prefix) const {
     std::vector<std::string> lines;
-    std::string text = readHostFile(host("report.txt"));
-    size_t start = 0;
-    for (size_t end; (end = text.find('\n', start)) != std::string::npos; start = end + 1)
-      if (text.compare(start, std::string(prefix).size(), prefix) == 0)
-        lines.push_back(
-            text.substr(start + std::string(prefix).size(), end - start - std::string(prefix).size()));
+    std::istringstream text(readHostFile(host("report.txt")));
+    for (std::string line; std::getline(text, line);)
+      if (line.rfind(prefix, 0) == 0)
+        lines.push_back(line.substr(prefix.size()));
     return lines;
   }
 };

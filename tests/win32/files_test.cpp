@@ -47,6 +47,7 @@ HANDLE createWith(const string &path, DWORD access, DWORD disposition) {
 
 // A folder's attributes are exactly the directory bit, a new file is marked for archiving; a
 // missing name tells a missing file from a missing folder. Names are matched ignoring case.
+// The run time's _access tells the same for reading (mode 0) and writing (mode 2).
 TEST_F(FilesTest, AttributesTellFoldersFilesAndWhatIsMissing) {
   ASSERT_TRUE(writeFile(at("plain.txt"), "x"));
   string upper = dir_;
@@ -55,13 +56,14 @@ TEST_F(FilesTest, AttributesTellFoldersFilesAndWhatIsMissing) {
   const struct {
     string path;
     DWORD attributes, error; // the attributes under the mask, or the error
+    int access;              // errno of _access, 0 for found
   } rows[] = {
-      {dir_, FILE_ATTRIBUTE_DIRECTORY, 0},
-      {dir_ + "\\", FILE_ATTRIBUTE_DIRECTORY, 0},
-      {upper, FILE_ATTRIBUTE_DIRECTORY, 0},
-      {at("plain.txt"), FILE_ATTRIBUTE_ARCHIVE, 0},
-      {at("missing.txt"), INVALID_FILE_ATTRIBUTES, ERROR_FILE_NOT_FOUND},
-      {at("nofolder\\missing.txt"), INVALID_FILE_ATTRIBUTES, ERROR_PATH_NOT_FOUND},
+      {dir_, FILE_ATTRIBUTE_DIRECTORY, 0, 0},
+      {dir_ + "\\", FILE_ATTRIBUTE_DIRECTORY, 0, 0},
+      {upper, FILE_ATTRIBUTE_DIRECTORY, 0, 0},
+      {at("plain.txt"), FILE_ATTRIBUTE_ARCHIVE, 0, 0},
+      {at("missing.txt"), INVALID_FILE_ATTRIBUTES, ERROR_FILE_NOT_FOUND, ENOENT},
+      {at("nofolder\\missing.txt"), INVALID_FILE_ATTRIBUTES, ERROR_PATH_NOT_FOUND, ENOENT},
   };
   for (const auto &row : rows) {
     SetLastError(0);
@@ -70,7 +72,11 @@ TEST_F(FilesTest, AttributesTellFoldersFilesAndWhatIsMissing) {
                                                           : INVALID_FILE_ATTRIBUTES;
     EXPECT_EQ(row.attributes, attributes & mask) << row.path;
     EXPECT_EQ(row.error, row.error != 0 ? GetLastError() : 0u) << row.path;
+    errno = 0;
+    int found = _access(row.path.c_str(), 0);
+    EXPECT_EQ(row.access, found == 0 ? 0 : found == -1 ? errno : -1) << row.path;
   }
+  EXPECT_EQ(0, _access(at("plain.txt").c_str(), 2));
 }
 
 TEST_F(FilesTest, FindGivesStoredNamesAndListsFolders) {
@@ -139,22 +145,6 @@ TEST_F(FilesTest, TempnamGivesFreshNamesWithThePrefix) {
   if (runningUnderWine() && a == b)
     GTEST_SKIP() << "Wine derives the name from the clock and frees it at once: two quick calls may match";
   EXPECT_NE(a, b);
-}
-
-TEST_F(FilesTest, AccessTellsExistingFromMissing) {
-  ASSERT_TRUE(writeFile(at("present.txt"), "x"));
-  const struct {
-    string path;
-    int mode, result, error;
-  } rows[] = {{at("present.txt"), 0, 0, 0},
-              {at("present.txt"), 2, 0, 0},
-              {dir_, 0, 0, 0},
-              {at("missing.txt"), 0, -1, ENOENT}};
-  for (const auto &row : rows) {
-    errno = 0;
-    EXPECT_EQ(row.result, _access(row.path.c_str(), row.mode)) << row.path;
-    EXPECT_EQ(row.error, errno) << row.path;
-  }
 }
 
 // CREATE_ALWAYS and OPEN_ALWAYS succeed either way and tell, through the last
