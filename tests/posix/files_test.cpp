@@ -124,12 +124,18 @@ TEST_F(FilesTest, TempPathIsAFolderOfDriveCOrTheOneTmpNames) {
 
 TEST_F(FilesTest, InjectedFaultFailsOnlyTheNamedCall) {
   std::filesystem::create_directories(host("drive_c/D"));
-  failCalls("GetFileAttributesA:1,CreateDirectoryA:1");
+  failCalls("GetFileAttributesA:1,CreateDirectoryA:1,RegCreateKeyExA:1");
   EXPECT_EQ(GetFileAttributesA("C:\\D"), INVALID_FILE_ATTRIBUTES);
   EXPECT_NE(GetLastError(), 0u);
   EXPECT_FALSE(CreateDirectoryA("C:\\D\\E", nullptr));
   EXPECT_FALSE(exists("drive_c/D/E")) << "a failed call changes nothing";
   EXPECT_TRUE(CreateDirectoryA("C:\\D\\E", nullptr));
+  HKEY key = reinterpret_cast<HKEY>(1); // a failed registry call fails as Windows would and leaves no handle
+  EXPECT_EQ(RegCreateKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE\\B", 0, nullptr, 0, KEY_ALL_ACCESS, nullptr, &key,
+                            nullptr),
+            ERROR_ACCESS_DENIED);
+  EXPECT_EQ(key, nullptr);
+  EXPECT_FALSE(keyExists("SOFTWARE\\B"));
 
   // A failed listing is told from its end by its code.
   failCalls("FindNextFileA:1");
