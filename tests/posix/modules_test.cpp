@@ -5,7 +5,6 @@
 #include "platform/clusapi.h"
 #include "platform/odbc.h"
 
-#include <functional>
 #include <string>
 #include <vector>
 
@@ -73,22 +72,14 @@ TEST_F(ModulesTest, ClusterResourcesFollowTheirServicesAndDependencies) {
   EXPECT_FALSE(api.ResUtilResourceTypesEqual(u"KXL", inst1));
 
   EXPECT_EQ(api.AddClusterResourceDependency(inst1, disk), 0u);
-  const struct {
-    const char *step;
-    HRESOURCE resource;
-    DWORD expected;
-    std::function<void()> then; // what changes before the next step
-  } rows[] = {
-      {"depended on", disk, ERROR_DEPENDENT_RESOURCE_EXISTS, [] {}},
-      {"online", inst1, ERROR_RESOURCE_ONLINE, [&] { setDword(services + "INST1", "State", 1); }},
-      {"stopped", inst1, 0, [&] { setDword(remoteServices + "INST2", "State", 4); }},
-      {"online on its owner node", inst2, ERROR_RESOURCE_ONLINE, [] {}},
-      {"no longer depended on", disk, 0, [] {}},
-  };
-  for (const auto &row : rows) {
-    EXPECT_EQ(api.DeleteClusterResource(row.resource), row.expected) << row.step;
-    row.then();
-  }
+  EXPECT_EQ(api.DeleteClusterResource(disk), DWORD(ERROR_DEPENDENT_RESOURCE_EXISTS));
+  EXPECT_EQ(api.DeleteClusterResource(inst1), DWORD(ERROR_RESOURCE_ONLINE));
+  setDword(services + "INST1", "State", 1);
+  EXPECT_EQ(api.DeleteClusterResource(inst1), 0u);
+  setDword(remoteServices + "INST2", "State", 4);
+  EXPECT_EQ(api.DeleteClusterResource(inst2), DWORD(ERROR_RESOURCE_ONLINE))
+      << "the service of its owner node";
+  EXPECT_EQ(api.DeleteClusterResource(disk), 0u) << "no longer depended on";
   for (HRESOURCE resource : {inst1, inst2, disk})
     EXPECT_TRUE(api.CloseClusterResource(resource));
 }

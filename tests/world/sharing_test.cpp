@@ -69,6 +69,18 @@ HKEY createKey(const char *path) {
   return key;
 }
 
+// The registry as a reader with a cache of its own (another process) finds it: hive and log.
+Key loaded(const std::string &hivePath) {
+  Key tree;
+  std::string error;
+  EXPECT_TRUE(posix::hive::loadHive(hivePath, kHive, tree, error)) << error;
+  return tree;
+}
+
+std::string replayed(const std::string &hivePath) {
+  return posix::hive::formatHive(loaded(hivePath), kHive);
+}
+
 using SharingTest = kxltest::WorldTest;
 
 TEST_F(SharingTest, AnOpenKeySeesAnotherProcessChanges) {
@@ -99,14 +111,10 @@ TEST_F(SharingTest, ConcurrentWritersLoseNothing) {
         return false;
     return true;
   }));
-  HiveFile file(worldRoot() + "/system.reg", kHive);
-  ASSERT_EQ(file.read([](const Key &tree) -> LONG {
-    const Key *busy = posix::hive::findKey(tree, {"SOFTWARE", "Busy"});
-    EXPECT_NE(busy, nullptr);
-    EXPECT_EQ(busy == nullptr ? 0u : busy->values.size(), static_cast<size_t>(kWriters * kValues));
-    return ERROR_SUCCESS;
-  }),
-            ERROR_SUCCESS);
+  Key tree = loaded(worldRoot() + "/system.reg");
+  const Key *busy = posix::hive::findKey(tree, {"SOFTWARE", "Busy"});
+  ASSERT_NE(busy, nullptr);
+  EXPECT_EQ(busy->values.size(), static_cast<size_t>(kWriters * kValues));
 }
 
 // Every key of a large hive carries the same generation number; a writer bumps
@@ -154,11 +162,8 @@ TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
 
 // A batch writes each changed hive once when it ends; others see none of it before, all after.
 TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
-  // What a reader with a cache of its own (as another process) finds.
   auto othersSee = [this](const char *value) {
-    Key tree;
-    std::string error;
-    EXPECT_TRUE(posix::hive::loadHive(worldRoot() + "/system.reg", kHive, tree, error)) << error;
+    Key tree = loaded(worldRoot() + "/system.reg");
     const Key *batch = posix::hive::findKey(tree, {"SOFTWARE", "Batch"});
     return batch != nullptr && batch->values.count(posix::hive::fold(value)) != 0;
   };
@@ -188,20 +193,6 @@ TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
   ASSERT_EQ(putDword(key, "Third", 3), ERROR_SUCCESS);
   EXPECT_TRUE(othersSee("Third"));
   EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
-}
-
-// ---- the change log beside the hive
-
-std::string formatted(const Key &tree) {
-  return posix::hive::formatHive(tree, kHive);
-}
-
-// The registry as a reader with a cache of its own finds it: hive and log.
-std::string replayed(const std::string &hivePath) {
-  Key tree;
-  std::string error;
-  EXPECT_TRUE(posix::hive::loadHive(hivePath, kHive, tree, error)) << error;
-  return formatted(tree);
 }
 
 bool exists(const std::string &path) {
@@ -261,7 +252,7 @@ TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
       }),
                 ERROR_SUCCESS);
       ASSERT_EQ(file.read([&](const Key &tree) -> LONG {
-        writerTree = formatted(tree);
+        writerTree = posix::hive::formatHive(tree, kHive);
         return ERROR_SUCCESS;
       }),
                 ERROR_SUCCESS);
