@@ -127,11 +127,13 @@ TEST_F(RegistryTest, QueriesReportTheSizeNeeded) {
   EXPECT_STREQ("abcdefgh", reinterpret_cast<const char *>(exact));
 }
 
-// A name of 255 characters is the longest a key may have.
+// A name of 255 characters is the longest a key may have. A buffer without room for the name
+// and its terminator, or for the data, is refused with ERROR_MORE_DATA.
 TEST_F(RegistryTest, EnumerationListsEachNameThenNoMoreItems) {
   const string longest(255, 'k');
   Key key;
-  for (const char *name : {"Zulu", "alpha", "Mike\\Inner", longest.c_str()}) // Inner is not a direct subkey
+  for (const char *name :
+       {"Zulu", "alpha", longest.c_str(), "Mike\\Inner", "Mike"}) // Inner is not a direct subkey
     ASSERT_EQ(ERROR_SUCCESS, create(name, key));
   setString(root_.get(), "Zeta", "1");
   setDword(root_.get(), "alpha", 2);
@@ -144,41 +146,25 @@ TEST_F(RegistryTest, EnumerationListsEachNameThenNoMoreItems) {
   // Windows lists values in the order they were made and Wine sorts them: only the set counts.
   EXPECT_EQ((Names{"Zeta", "alpha"}), listValues(root_.get()).names);
 
-  char name[32];
-  DWORD length = sizeof name, type = REG_NONE;
-  BYTE data[32];
-  DWORD size = sizeof data;
+  char name[5], keyClass[8] = "xxxxxxx";
+  BYTE data[6];
+  DWORD length = sizeof name - 1, type = REG_NONE, size = sizeof data - 1, classLength = sizeof keyClass;
+  EXPECT_EQ(ERROR_MORE_DATA, RegEnumKeyExA(key.get(), 0, name, &length, nullptr, nullptr, nullptr, nullptr));
+  length = sizeof name - 1;
+  EXPECT_EQ(ERROR_MORE_DATA, RegEnumValueA(key.get(), 0, name, &length, nullptr, nullptr, nullptr, nullptr));
+  length = sizeof name;
+  EXPECT_EQ(ERROR_MORE_DATA, RegEnumValueA(key.get(), 0, name, &length, nullptr, nullptr, data, &size));
+  length = size = sizeof data;
   ASSERT_EQ(ERROR_SUCCESS, RegEnumValueA(key.get(), 0, name, &length, nullptr, &type, data, &size));
   EXPECT_EQ((std::pair<string, DWORD>("Only", 4)), std::make_pair(string(name), length));
-  EXPECT_EQ(static_cast<DWORD>(REG_SZ), type);
-  EXPECT_EQ(6u, size);
+  EXPECT_EQ((std::pair<DWORD, DWORD>(REG_SZ, 6)), std::make_pair(type, size));
   EXPECT_STREQ("hello", reinterpret_cast<const char *>(data));
-}
-
-TEST_F(RegistryTest, EnumerationWithShortBuffersIsMoreData) {
-  Key key;
-  ASSERT_EQ(ERROR_SUCCESS, create("RatherLongName", key));
-  setString(root_.get(), "RatherLongValueName", "long enough data");
-  char name[4];
-  DWORD length = sizeof name;
-  EXPECT_EQ(ERROR_MORE_DATA,
-            RegEnumKeyExA(root_.get(), 0, name, &length, nullptr, nullptr, nullptr, nullptr));
-  length = sizeof name;
-  EXPECT_EQ(ERROR_MORE_DATA,
-            RegEnumValueA(root_.get(), 0, name, &length, nullptr, nullptr, nullptr, nullptr));
-  char fullName[64];
-  length = sizeof fullName;
-  BYTE data[4];
-  DWORD size = sizeof data;
-  EXPECT_EQ(ERROR_MORE_DATA, RegEnumValueA(root_.get(), 0, fullName, &length, nullptr, nullptr, data, &size));
-  // Room for the name and its terminator is enough; a key made without a class has the empty one.
-  char fits[15], keyClass[8] = "xxxxxxx";
-  DWORD classLength = sizeof keyClass;
-  length = sizeof fits;
+  // A key made without a class has the empty one.
+  char inner[6];
+  length = sizeof inner;
   ASSERT_EQ(ERROR_SUCCESS,
-            RegEnumKeyExA(root_.get(), 0, fits, &length, nullptr, keyClass, &classLength, nullptr));
-  EXPECT_EQ(14u, length);
-  EXPECT_STREQ("RatherLongName", fits);
+            RegEnumKeyExA(key.get(), 0, inner, &length, nullptr, keyClass, &classLength, nullptr));
+  EXPECT_EQ((std::pair<string, DWORD>("Inner", 5)), std::make_pair(string(inner), length));
   EXPECT_EQ((std::pair<string, DWORD>("", 0)), std::make_pair(string(keyClass), classLength));
 }
 
