@@ -1,5 +1,5 @@
 // The file calls over the world's host files, beyond the Win32 conformance suite: permissions as
-// attributes, renames and copies, the temporary folder as a Windows path, injected faults.
+// attributes, copies, the temporary folder as a Windows path, injected faults.
 #include "tests/support/world_access.h"
 
 #include <fcntl.h>
@@ -34,13 +34,6 @@ TEST_F(FilesTest, AHostFileWithoutWritePermissionIsReadOnly) {
   EXPECT_EQ(errno, EACCES);
   EXPECT_EQ(_access("C:\\A\\ro.txt", 1), -1);
   EXPECT_EQ(errno, EINVAL);
-}
-
-TEST_F(FilesTest, RenameInAnotherLetterCaseRenamesTheHostFile) {
-  writeHostFile(host("drive_c/M/dst.txt"), "old");
-  EXPECT_TRUE(MoveFileExA("C:\\M\\dst.txt", "C:\\M\\DST.TXT", 0));
-  EXPECT_TRUE(exists("drive_c/M/DST.TXT"));
-  EXPECT_FALSE(exists("drive_c/M/dst.txt"));
 }
 
 // A copy keeps what cp -a keeps (exact mode whatever the umask, extended attributes where

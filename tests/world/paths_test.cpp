@@ -83,6 +83,9 @@ TEST_F(PathTest, KeptListingsFollowEveryChangeOfTheFolder) {
                                  FILE_ATTRIBUTE_NORMAL, nullptr));
        },
        "MADE.TXT", "Made.txt"},
+      {"renamed in another case",
+       [&] { return MoveFileExA((windowsBin + "Made.txt").c_str(), (windowsBin + "MADE.TXT").c_str(), 0); },
+       "made.txt", "MADE.TXT"},
       {"copy",
        [&] { return CopyFileA((windowsBin + "made.txt").c_str(), (windowsBin + "Copy.txt").c_str(), 1); },
        "COPY.txt", "Copy.txt"},
