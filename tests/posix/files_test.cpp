@@ -120,6 +120,7 @@ TEST_F(FilesTest, InjectedFaultFailsOnlyTheNamedCall) {
   failCalls("GetFileAttributesA:1,CreateDirectoryA:1,RegCreateKeyExA:1");
   EXPECT_EQ(GetFileAttributesA("C:\\D"), INVALID_FILE_ATTRIBUTES);
   EXPECT_NE(GetLastError(), 0u);
+  EXPECT_EQ(GetFileAttributesA("C:\\D"), DWORD(FILE_ATTRIBUTE_DIRECTORY)) << "the next call works";
   EXPECT_FALSE(CreateDirectoryA("C:\\D\\E", nullptr));
   EXPECT_FALSE(exists("drive_c/D/E")) << "a failed call changes nothing";
   EXPECT_TRUE(CreateDirectoryA("C:\\D\\E", nullptr));
@@ -129,7 +130,7 @@ TEST_F(FilesTest, InjectedFaultFailsOnlyTheNamedCall) {
             ERROR_ACCESS_DENIED);
   EXPECT_EQ(key, nullptr);
   EXPECT_FALSE(keyExists("SOFTWARE\\B"));
-
+  setDword("SOFTWARE\\B", "Rerun", 1);
   // A failed listing is told from its end by its code.
   failCalls("FindNextFileA:1");
   WIN32_FIND_DATAA data;
