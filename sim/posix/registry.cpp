@@ -91,6 +91,17 @@ LONG lookupKey(HKEY hKey, OpenKey &out) {
   return ERROR_SUCCESS;
 }
 
+// On a 64-bit system the 32-bit view of HKEY_LOCAL_MACHINE\SOFTWARE lives in
+// its Wow6432Node subkey.
+void applyView(REGSAM sam, OpenKey &key) {
+  if ((sam & KEY_WOW64_32KEY) == 0 || key.hiveId != HiveId::Machine || key.path.empty() ||
+      hive::fold(key.path[0]) != "software")
+    return;
+  if (key.path.size() > 1 && hive::fold(key.path[1]) == "wow6432node")
+    return;
+  key.path.insert(key.path.begin() + 1, "Wow6432Node");
+}
+
 // The key a handle names, or why there is none.
 LONG keyOfHandle(const Key &root, const OpenKey &handle, const Key *&out) {
   out = hive::findKey(root, handle.path);
@@ -132,8 +143,8 @@ LONG changeKey(HKEY hKey, const std::function<LONG(const Key &, const KeyPath &,
   });
 }
 
-// The handle and path of `subKey` below `hKey`.
-LONG resolveSubKey(HKEY hKey, const char *subKey, OpenKey &base, OpenKey &target) {
+// The handle and path of `subKey` below `hKey`, in the view `sam` asks for.
+LONG resolveSubKey(HKEY hKey, const char *subKey, REGSAM sam, OpenKey &base, OpenKey &target) {
   if (LONG rc = lookupKey(hKey, base); rc != ERROR_SUCCESS)
     return rc;
   target = base;
@@ -142,6 +153,7 @@ LONG resolveSubKey(HKEY hKey, const char *subKey, OpenKey &base, OpenKey &target
     target.path.push_back(std::move(name));
   if (!allStorable(target.path))
     return ERROR_INVALID_PARAMETER;
+  applyView(sam, target);
   return ERROR_SUCCESS;
 }
 
@@ -189,7 +201,7 @@ LONG copyName(const std::string &name, LPSTR lpName, LPDWORD lpcch) {
 // that has subkeys is refused, as RegDeleteKeyA does.
 LONG deleteKey(HKEY hKey, const char *subKey, bool onlyLeaf) {
   OpenKey base, target;
-  if (LONG rc = resolveSubKey(hKey, subKey, base, target); rc != ERROR_SUCCESS)
+  if (LONG rc = resolveSubKey(hKey, subKey, 0, base, target); rc != ERROR_SUCCESS)
     return rc;
   if (target.path.empty())
     return ERROR_ACCESS_DENIED; // a root key cannot be deleted
@@ -207,12 +219,13 @@ LONG deleteKey(HKEY hKey, const char *subKey, bool onlyLeaf) {
 }
 
 // Opens (or with `create`, creates) `subKey` below `hKey`.
-LONG openOrCreate(HKEY hKey, const char *subKey, bool create, PHKEY phkResult, LPDWORD lpdwDisposition) {
+LONG openOrCreate(HKEY hKey, const char *subKey, REGSAM sam, bool create, PHKEY phkResult,
+                  LPDWORD lpdwDisposition) {
   if (phkResult == nullptr)
     return ERROR_INVALID_PARAMETER;
   *phkResult = nullptr;
   OpenKey base, target;
-  if (LONG rc = resolveSubKey(hKey, subKey, base, target); rc != ERROR_SUCCESS)
+  if (LONG rc = resolveSubKey(hKey, subKey, sam, base, target); rc != ERROR_SUCCESS)
     return rc;
   bool created = false;
   // ERROR_SUCCESS when the key is there, ERROR_FILE_NOT_FOUND when it is not.
@@ -276,7 +289,7 @@ EnumCursor<std::map<std::string, hive::Value>> valueCursor;
 LONG reg::writeKey(HKEY root, const std::string &path, const std::vector<KeyValue> &values) {
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
   OpenKey base, target;
-  if (LONG rc = resolveSubKey(root, path.c_str(), base, target); rc != ERROR_SUCCESS)
+  if (LONG rc = resolveSubKey(root, path.c_str(), 0, base, target); rc != ERROR_SUCCESS)
     return rc;
   for (const KeyValue &value : values)
     if (!isStorableName(value.name))
@@ -299,25 +312,25 @@ using namespace kxlsim::posix;
 
 extern "C" {
 
-LONG RegOpenKeyExA(HKEY hKey, LPCSTR lpSubKey, DWORD, REGSAM, PHKEY phkResult) {
+LONG RegOpenKeyExA(HKEY hKey, LPCSTR lpSubKey, DWORD, REGSAM samDesired, PHKEY phkResult) {
   if (injectedFailure("RegOpenKeyExA")) {
     if (phkResult != nullptr)
       *phkResult = nullptr;
     return ERROR_ACCESS_DENIED;
   }
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
-  return openOrCreate(hKey, lpSubKey, false, phkResult, nullptr);
+  return openOrCreate(hKey, lpSubKey, samDesired, false, phkResult, nullptr);
 }
 
-LONG RegCreateKeyExA(HKEY hKey, LPCSTR lpSubKey, DWORD, LPSTR, DWORD, REGSAM, LPSECURITY_ATTRIBUTES,
-                     PHKEY phkResult, LPDWORD lpdwDisposition) {
+LONG RegCreateKeyExA(HKEY hKey, LPCSTR lpSubKey, DWORD, LPSTR, DWORD, REGSAM samDesired,
+                     LPSECURITY_ATTRIBUTES, PHKEY phkResult, LPDWORD lpdwDisposition) {
   if (injectedFailure("RegCreateKeyExA")) {
     if (phkResult != nullptr)
       *phkResult = nullptr;
     return ERROR_ACCESS_DENIED;
   }
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
-  return openOrCreate(hKey, lpSubKey, true, phkResult, lpdwDisposition);
+  return openOrCreate(hKey, lpSubKey, samDesired, true, phkResult, lpdwDisposition);
 }
 
 LONG RegQueryValueExA(HKEY hKey, LPCSTR lpValueName, LPDWORD, LPDWORD lpType, LPBYTE lpData,
@@ -424,7 +437,7 @@ LONG SHCopyKeyA(HKEY hkeySrc, LPCSTR pszSrcSubKey, HKEY hkeyDest, DWORD) {
     return ERROR_ACCESS_DENIED;
   std::lock_guard<std::recursive_mutex> lock(registryMutex);
   OpenKey base, source;
-  if (LONG rc = resolveSubKey(hkeySrc, pszSrcSubKey, base, source); rc != ERROR_SUCCESS)
+  if (LONG rc = resolveSubKey(hkeySrc, pszSrcSubKey, 0, base, source); rc != ERROR_SUCCESS)
     return rc;
   // Take the source whole first, so copying a key into its own subtree ends.
   hive::Key copy;

@@ -241,5 +241,36 @@ TEST_F(RegistryTest, RefusedCallsTellWhy) {
   EXPECT_TRUE(listSubkeys(target.get()).names.empty());
 }
 
+// The 32-bit view of HKLM\SOFTWARE is a tree of its own below WOW6432Node. Writing HKLM needs
+// administrator rights on Windows.
+TEST_F(Win32Test, ThirtyTwoBitViewLiesUnderWow6432Node) {
+  const string name = "KxlConformance\\" + uniqueName();
+  Key key, software;
+  DWORD disposition = 0;
+  LONG rc = RegCreateKeyExA(HKEY_LOCAL_MACHINE, ("SOFTWARE\\" + name).c_str(), 0, nullptr, 0,
+                            KEY_ALL_ACCESS | KEY_WOW64_32KEY, nullptr, key.put(), &disposition);
+  if (rc == ERROR_ACCESS_DENIED)
+    GTEST_SKIP() << "HKEY_LOCAL_MACHINE is not writable for this account";
+  ASSERT_EQ(ERROR_SUCCESS, rc);
+  EXPECT_EQ(static_cast<DWORD>(REG_CREATED_NEW_KEY), disposition);
+  const struct {
+    string path;
+    REGSAM view;
+    LONG expected;
+  } rows[] = {{"SOFTWARE\\" + name, KEY_WOW64_32KEY, ERROR_SUCCESS},
+              {"SOFTWARE\\WOW6432Node\\" + name, 0, ERROR_SUCCESS},
+              {"SOFTWARE\\" + name, 0, ERROR_FILE_NOT_FOUND},
+              {"SOFTWARE\\" + name, KEY_WOW64_64KEY, ERROR_FILE_NOT_FOUND}};
+  for (const auto &row : rows)
+    EXPECT_EQ(row.expected,
+              RegOpenKeyExA(HKEY_LOCAL_MACHINE, row.path.c_str(), 0, KEY_READ | row.view, key.put()))
+        << row.path << " " << row.view;
+  key.reset();
+  ASSERT_EQ(ERROR_SUCCESS, RegOpenKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE", 0, KEY_ALL_ACCESS | KEY_WOW64_32KEY,
+                                         software.put()));
+  EXPECT_EQ(ERROR_SUCCESS, SHDeleteKeyA(software.get(), name.c_str()));
+  RegDeleteKeyA(software.get(), "KxlConformance"); // only when no other run has keys there
+}
+
 } // namespace
 } // namespace kxltest
