@@ -21,7 +21,7 @@ namespace {
 
 using CallPlan = std::map<std::string, std::set<unsigned long>, std::less<>>; // name -> call numbers
 
-constexpr const char *kOwnSettings[] = {"KXLSIM_FAIL", "KXLSIM_KILL", "KXLSIM_COUNT", "KXLSIM_CHILD_FAIL"};
+constexpr const char *kOwnSettings[] = {"KXLSIM_FAIL", "KXLSIM_KILL", "KXLSIM_COUNT"};
 
 struct FaultPlan {
   bool loaded = false;
@@ -29,7 +29,6 @@ struct FaultPlan {
   CallPlan failing;
   CallPlan killing;
   std::string countFile;
-  std::string childPlan;
   std::map<std::string, unsigned long, std::less<>> calls;
 };
 
@@ -96,8 +95,6 @@ void keepSettingsFromChildren() {
 #ifdef _WIN32
   for (const char *name : kOwnSettings)
     SetEnvironmentVariableA(name, nullptr);
-  if (!thePlan().childPlan.empty())
-    SetEnvironmentVariableA("KXLSIM_FAIL", thePlan().childPlan.c_str());
 #endif
 }
 
@@ -107,7 +104,6 @@ void loadPlan(FaultPlan &into) {
   readCallPlan("KXLSIM_FAIL", into.failing);
   readCallPlan("KXLSIM_KILL", into.killing);
   into.countFile = variableText("KXLSIM_COUNT");
-  into.childPlan = variableText("KXLSIM_CHILD_FAIL");
   into.counting = !into.failing.empty() || !into.killing.empty() || !into.countFile.empty();
   if (!into.countFile.empty()) {
     static bool registered = false;
@@ -183,13 +179,6 @@ bool isOwnProcessSetting(const char *entry) {
       return true;
   }
   return false;
-}
-
-const char *childFaultPlan() {
-  std::lock_guard<std::mutex> lock(planMutex);
-  if (!thePlan().loaded)
-    loadPlan(thePlan());
-  return thePlan().childPlan.c_str();
 }
 
 } // namespace kxlsim

@@ -16,8 +16,7 @@
 // "name count" per function or hook called in this process.
 //
 // All three belong to the process they are set for: programs it starts do not
-// inherit them. KXLSIM_CHILD_FAIL=plan is handed to those programs as their
-// KXLSIM_FAIL, for the cases where a fault is meant for them.
+// inherit them.
 #pragma once
 
 namespace kxlsim {
@@ -61,8 +60,5 @@ void resetFaults();
 // True for an environment entry ("NAME=value") that a started program must
 // not inherit from this process.
 bool isOwnProcessSetting(const char *entry);
-
-// The KXLSIM_FAIL entry a started program gets instead ("" for none).
-const char *childFaultPlan();
 
 } // namespace kxlsim

@@ -143,8 +143,6 @@ std::vector<std::string> environmentFromBlock(const char *block) {
       if (!kxlsim::isOwnProcessSetting(*entry))
         entries.emplace_back(*entry);
     }
-    if (*kxlsim::childFaultPlan() != '\0')
-      entries.push_back(std::string("KXLSIM_FAIL=") + kxlsim::childFaultPlan());
     return entries;
   }
   for (const char *entry = block; *entry != '\0'; entry += std::strlen(entry) + 1)

@@ -21,9 +21,9 @@ namespace kxltestsupport {
 namespace {
 
 // Variables of the test's own environment that the command must not inherit.
-constexpr const char *kScrubbed[] = {
-    "KXLSIM_ROOT",       "KXLTRACE",    "KXLSIM_FAIL",    "KXLSIM_KILL", "KXLSIM_COUNT",
-    "KXLSIM_CHILD_FAIL", "KXLINSTANCE", "KXLTEST_DRIVER", "TMP",         "TEMP"};
+constexpr const char *kScrubbed[] = {"KXLSIM_ROOT",    "KXLTRACE",     "KXLSIM_FAIL",
+                                     "KXLSIM_KILL",    "KXLSIM_COUNT", "KXLINSTANCE",
+                                     "KXLTEST_DRIVER", "TMP",          "TEMP"};
 
 bool scrubbed(const char *entry) {
   return std::any_of(std::begin(kScrubbed), std::end(kScrubbed), [entry](const char *name) {

@@ -253,18 +253,13 @@ TEST_F(Win32Test, ThirtyTwoBitViewLiesUnderWow6432Node) {
     GTEST_SKIP() << "HKEY_LOCAL_MACHINE is not writable for this account";
   ASSERT_EQ(ERROR_SUCCESS, rc);
   EXPECT_EQ(static_cast<DWORD>(REG_CREATED_NEW_KEY), disposition);
-  const struct {
-    string path;
-    REGSAM view;
-    LONG expected;
-  } rows[] = {{"SOFTWARE\\" + name, KEY_WOW64_32KEY, ERROR_SUCCESS},
-              {"SOFTWARE\\WOW6432Node\\" + name, 0, ERROR_SUCCESS},
-              {"SOFTWARE\\" + name, 0, ERROR_FILE_NOT_FOUND},
-              {"SOFTWARE\\" + name, KEY_WOW64_64KEY, ERROR_FILE_NOT_FOUND}};
-  for (const auto &row : rows)
-    EXPECT_EQ(row.expected,
-              RegOpenKeyExA(HKEY_LOCAL_MACHINE, row.path.c_str(), 0, KEY_READ | row.view, key.put()))
-        << row.path << " " << row.view;
+  auto opens = [&](const string &path, REGSAM view) {
+    return RegOpenKeyExA(HKEY_LOCAL_MACHINE, path.c_str(), 0, KEY_READ | view, key.put());
+  };
+  EXPECT_EQ(ERROR_SUCCESS, opens("SOFTWARE\\" + name, KEY_WOW64_32KEY));
+  EXPECT_EQ(ERROR_SUCCESS, opens("SOFTWARE\\WOW6432Node\\" + name, 0));
+  EXPECT_EQ(ERROR_FILE_NOT_FOUND, opens("SOFTWARE\\" + name, 0));
+  EXPECT_EQ(ERROR_FILE_NOT_FOUND, opens("SOFTWARE\\" + name, KEY_WOW64_64KEY));
   key.reset();
   ASSERT_EQ(ERROR_SUCCESS, RegOpenKeyExA(HKEY_LOCAL_MACHINE, "SOFTWARE", 0, KEY_ALL_ACCESS | KEY_WOW64_32KEY,
                                          software.put()));
