@@ -8,9 +8,6 @@
 namespace kxltest {
 namespace {
 
-// A product code no machine has registered.
-const char unknownProduct[] = "{5B6C1E2A-0F3D-4A77-9C21-6D8E0A4B3F19}";
-
 TEST_F(Win32Test, MissingModulesAndEntryPointsAreNotFound) {
   EXPECT_EQ(static_cast<DWORD>(ERROR_MOD_NOT_FOUND),
             errorOf([] { return LoadLibraryA("kxlnosuchmodule.dll") != nullptr; }));
@@ -130,7 +127,7 @@ TEST_F(Win32Test, OnlyAWholeInstallerRegistrationIsInstalled) {
     for (const std::string &key : {advertisement, userData, uninstall})
       SHDeleteKeyA(HKEY_LOCAL_MACHINE, key.c_str());
   }
-  EXPECT_EQ(INSTALLSTATE_UNKNOWN, MsiQueryProductStateA(unknownProduct));
+  EXPECT_EQ(INSTALLSTATE_UNKNOWN, MsiQueryProductStateA("{5B6C1E2A-0F3D-4A77-9C21-6D8E0A4B3F19}"));
 }
 
 } // namespace

@@ -154,10 +154,7 @@ TEST_F(SharingTest, KilledWriterLeavesAWholeHive) {
     for (const auto &[name, key] : load->subkeys)
       ASSERT_EQ(key.values.at("generation").data, first) << name;
   }
-  // The hive stays writable after the kills.
-  HKEY key = createKey("SOFTWARE\\After");
-  EXPECT_EQ(putDword(key, "Fine", 1), ERROR_SUCCESS);
-  EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
+  setDword("SOFTWARE\\After", "Fine", 1); // the hive stays writable after the kills
 }
 
 // A batch writes each changed hive once when it ends; others see none of it before, all after.
@@ -189,14 +186,8 @@ TEST_F(SharingTest, ABatchIsWrittenOnceWhenItEnds) {
     EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
   }
   // After the batch, changes reach the others at once again.
-  HKEY key = createKey("SOFTWARE\\Batch");
-  ASSERT_EQ(putDword(key, "Third", 3), ERROR_SUCCESS);
+  setDword("SOFTWARE\\Batch", "Third", 3);
   EXPECT_TRUE(othersSee("Third"));
-  EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
-}
-
-bool exists(const std::string &path) {
-  return std::filesystem::exists(path);
 }
 
 // Each kind of change, with names the text form must escape: the log replays to the writer's
@@ -258,12 +249,12 @@ TEST_F(SharingTest, EveryKindOfChangeReplaysToTheWritersTree) {
                 ERROR_SUCCESS);
       ASSERT_EQ(replayed(hivePath), writerTree);
     }
-    EXPECT_TRUE(exists(hivePath + ".log"));
+    EXPECT_TRUE(std::filesystem::exists(hivePath + ".log"));
     EXPECT_EQ(writerTree.find("Gone"), std::string::npos);
     EXPECT_NE(writerTree.find("\"Number\"=dword:09090909"), std::string::npos) << "first spelling kept";
   }
   EXPECT_EQ(readHostFile(hivePath), writerTree);
-  EXPECT_FALSE(exists(hivePath + ".log"));
+  EXPECT_FALSE(std::filesystem::exists(hivePath + ".log"));
 }
 
 // A record cut off by a kill is ignored; the next writer writes the hive whole instead of appending.
@@ -284,14 +275,12 @@ TEST_F(SharingTest, ACutOffRecordIsIgnoredAndTheNextChangeFoldsTheLog) {
     writeHostFile(hivePath + ".log", log);
   }
   writeHostFile(hivePath + ".log", readHostFile(hivePath + ".log") + record.substr(0, 20));
-  HKEY key = createKey("SOFTWARE\\Cut");
-  ASSERT_EQ(putDword(key, "After", 3), ERROR_SUCCESS);
-  EXPECT_FALSE(exists(hivePath + ".log")) << "folded";
+  setDword("SOFTWARE\\Cut", "After", 3);
+  EXPECT_FALSE(std::filesystem::exists(hivePath + ".log")) << "folded";
   std::string text = readHostFile(hivePath);
   EXPECT_NE(text.find("\"Whole\"=dword:00000001"), std::string::npos);
   EXPECT_NE(text.find("\"After\"=dword:00000003"), std::string::npos);
   EXPECT_EQ(text.find("Torn"), std::string::npos);
-  EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
 // A log left beside the hive it was folded into would bring back later-changed
@@ -313,17 +302,15 @@ TEST_F(SharingTest, ALogLeftBesideTheHiveItWasFoldedIntoIsIgnored) {
     }),
               ERROR_SUCCESS);
   }
-  ASSERT_FALSE(exists(hivePath + ".log"));
+  ASSERT_FALSE(std::filesystem::exists(hivePath + ".log"));
   std::filesystem::rename(worldRoot() + "/old.log", hivePath + ".log");
   const std::string folded = replayed(hivePath);
   EXPECT_EQ(folded, readHostFile(hivePath));
   EXPECT_EQ(folded.find("\"Value\""), std::string::npos);
-  HKEY key = createKey("SOFTWARE\\Stale");
-  ASSERT_EQ(putDword(key, "Next", 2), ERROR_SUCCESS);
+  setDword("SOFTWARE\\Stale", "Next", 2);
   const std::string next = replayed(hivePath);
   EXPECT_EQ(next.find("\"Value\""), std::string::npos);
   EXPECT_NE(next.find("\"Next\"=dword:00000002"), std::string::npos);
-  EXPECT_EQ(RegCloseKey(key), ERROR_SUCCESS);
 }
 
 // Events are whole JSON lines, also when several processes append at once.

@@ -8,7 +8,6 @@ namespace kxlsim::testing {
 namespace {
 
 using kxltestsupport::readHostFile;
-using kxltestsupport::writeHostFile;
 
 using FaultTest = kxltest::WorldTest;
 
