@@ -95,10 +95,14 @@ public:
     entered_ = true;
     forgetProcessState();
   }
+  // A temporary folder a case named inside the world is no host folder: left
+  // set, it would break the next world's making in the same process.
   void leave() {
     if (chdir(startCwd_.c_str()) != 0)
       startCwd_.clear();
     unsetenv("KXLSIM_ROOT");
+    unsetenv("TMP");
+    unsetenv("TEMP");
     entered_ = false;
     forgetProcessState();
   }
