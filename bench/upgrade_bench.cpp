@@ -141,7 +141,7 @@ void addCopiesAndInstances(WorldWriter &w, int copies, int instances) {
   }
   for (int i = 0; i + 3 < instances; ++i) {
     const kxlsim::CopySpec &copy = extra.empty() ? kxlsim::CopySpec{} : extra[i % extra.size()];
-    kxlsim::InstanceSpec inst;
+    kxlsim::InstanceRecord inst;
     inst.name = numbered("I", i, 5);
     inst.copy = extra.empty() ? "KXL95" : copy.name;
     inst.directory = (extra.empty() ? std::string(kOldCopyPath) : copy.path) + "\\" + inst.name;
@@ -179,7 +179,7 @@ void addPartitionedInstance(WorldWriter &w, int partitions, int machines) {
     kxlsim::addCopyRegistration(w, kxlsim::remoteMachine(id.computerName), current);
     names.push_back(id.computerName);
   }
-  kxlsim::InstanceSpec inst;
+  kxlsim::InstanceRecord inst;
   inst.name = "PINST";
   inst.copy = "KXL95";
   inst.directory = std::string(kOldCopyPath) + "\\PINST";

@@ -161,7 +161,7 @@ void addCopy(WorldWriter &w, const CopySpec &copy, const InstallSources &sources
   addProducts(w, copy);
 }
 
-void addInstance(WorldWriter &w, const InstanceSpec &instance) {
+void addInstance(WorldWriter &w, const InstanceRecord &instance) {
   std::string registryKey = std::string(kSimRoot) + "\\Instances\\" + instance.name;
   w.setString(localMachine(), registryKey, "Directory", instance.directory);
   w.setString(localMachine(), registryKey, "Copy", instance.copy);

@@ -40,7 +40,7 @@ struct CopySpec {
   bool installCommand = false;
 };
 
-struct InstanceSpec {
+struct InstanceRecord {
   std::string name;
   std::string copy; // copy name; "" for the version-8 installation
   std::string directory;
@@ -111,7 +111,7 @@ void addCopyFiles(WorldWriter &w, const CopySpec &copy, const InstallSources &so
 void addCopy(WorldWriter &w, const CopySpec &copy, const InstallSources &sources);
 
 // The instance's registry entries, profile and files.
-void addInstance(WorldWriter &w, const InstanceSpec &instance);
+void addInstance(WorldWriter &w, const InstanceRecord &instance);
 void addService(WorldWriter &w, const ServiceSpec &service);
 
 // Lines appended to the services file (created with standard entries).

@@ -76,7 +76,7 @@ std::string serviceImage(const CopySpec &copy) {
 }
 
 void addVersion8Instance(WorldWriter &w, const CopySpec &copy) {
-  InstanceSpec inst;
+  InstanceRecord inst;
   inst.name = "V8INST";
   inst.directory = copy.path + "\\V8INST";
   inst.nodeType = 3;
@@ -89,7 +89,7 @@ void addVersion8Instance(WorldWriter &w, const CopySpec &copy) {
 }
 
 void addSinglePartitionInstance(WorldWriter &w, const CopySpec &copy) {
-  InstanceSpec inst;
+  InstanceRecord inst;
   inst.name = "INST1";
   inst.copy = copy.name;
   inst.directory = copy.path + "\\INST1";
@@ -111,7 +111,7 @@ void addSinglePartitionInstance(WorldWriter &w, const CopySpec &copy) {
 
 // Partitions 0 on this machine, 1 and 2 (logical port 1) on the other one.
 void addPartitionedInstance(WorldWriter &w, const CopySpec &copy) {
-  InstanceSpec inst;
+  InstanceRecord inst;
   inst.name = "INST2";
   inst.copy = copy.name;
   inst.directory = copy.path + "\\INST2";
@@ -153,7 +153,7 @@ void addTwoMachines(WorldWriter &w, const InstallSources &sources, const CopySpe
 
 // A clustered instance's profile and cluster profile on both nodes, and one
 // stopped service per partition on each node (the cluster starts them).
-void addClusteredInstance(WorldWriter &w, const CopySpec &copy, InstanceSpec inst,
+void addClusteredInstance(WorldWriter &w, const CopySpec &copy, InstanceRecord inst,
                           const std::vector<std::string> &services) {
   std::string profilePath = windowsParent(inst.directory);
   inst.profile.insert(inst.profile.begin(), {"KXLCLUSTER", kClusterName});
@@ -171,7 +171,7 @@ void addClusteredInstance(WorldWriter &w, const CopySpec &copy, InstanceSpec ins
 
 // CINST1, single partition, on the shared disk E: in its own group.
 void addClusteredSingleInstance(WorldWriter &w, const CopySpec &copy) {
-  InstanceSpec inst;
+  InstanceRecord inst;
   inst.name = "CINST1";
   inst.copy = copy.name;
   inst.directory = "E:\\KXLPROF\\CINST1";
@@ -188,7 +188,7 @@ void addClusteredSingleInstance(WorldWriter &w, const CopySpec &copy) {
 // on the shared disk F:; a group per node, partition 2 served by a resource
 // of another type.
 void addClusteredPartitionedInstance(WorldWriter &w, const CopySpec &copy) {
-  InstanceSpec inst;
+  InstanceRecord inst;
   inst.name = "CINST2";
   inst.copy = copy.name;
   inst.directory = "F:\\KXLPROF\\CINST2";

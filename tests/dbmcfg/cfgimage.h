@@ -48,12 +48,12 @@ inline std::string rtext(const Bytes &image, uint32_t at, size_t most = kFull) {
   return std::string(text, strnlen(text, most));
 }
 
-// The image's fields as `spec` names them, in the same form: "h36=5000
+// The image's fields as `wanted` names them, in the same form: "h36=5000
 // w3124=4096 f808=0.5 t458=NAME" for a 16-bit word, a 32-bit word, a float
 // and a string ('_' for a blank) at their offsets; so that one comparison
-// shows every field that differs from the expected spec.
-inline std::string fieldsAt(const Bytes &image, const std::string &spec) {
-  std::istringstream items(spec);
+// shows every field that differs from the expected list.
+inline std::string fieldsAt(const Bytes &image, const std::string &wanted) {
+  std::istringstream items(wanted);
   std::string item, out;
   while (items >> item) {
     uint32_t at = uint32_t(std::stoul(item.substr(1)));

@@ -7,12 +7,12 @@ namespace {
 
 class ConvertTest : public DbmWorld {
 protected:
-  // Converts and compares the target's fields named by `spec` (see fieldsAt).
-  static void expectConverted(const Bytes &target, const Bytes &source, const std::string &spec,
+  // Converts and compares the target's fields named by `wanted` (see fieldsAt).
+  static void expectConverted(const Bytes &target, const Bytes &source, const std::string &wanted,
                               Bytes *result = nullptr) {
     Bytes out;
     ASSERT_EQ(0, convert(target, source, &out));
-    EXPECT_EQ(spec, fieldsAt(out, spec));
+    EXPECT_EQ(wanted, fieldsAt(out, wanted));
     if (result != nullptr)
       *result = out;
   }

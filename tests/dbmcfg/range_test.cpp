@@ -153,10 +153,10 @@ TEST(RangeCheckTest, RowsThatDependOnOtherFields) {
       {Cfg(2, 0x0D00).u16(1930, 1).u16(1940, 1).u32(76, 9), "h1940=0 w76=0"},
       {Cfg(4, 0x0D00).u32(808, 0x7FC00000), "w808=942130604"} // 0x3827C5AC,
   };
-  for (const auto &[cfg, spec] : rows) {
+  for (const auto &[cfg, wanted] : rows) {
     Bytes image = cfg.sealed();
     kxldbm::rangeCheck(image.data());
-    EXPECT_EQ(spec, fieldsAt(image, spec));
+    EXPECT_EQ(wanted, fieldsAt(image, wanted));
   }
 }
 

@@ -40,10 +40,10 @@ public:
   // Registers an instance of `copy` (at version.release) in `directory`.
   void addInstance(const std::string &name, const std::string &copy, const std::string &directory,
                    int version, int release) {
-    kxlsim::InstanceSpec spec;
-    spec.name = name, spec.copy = copy, spec.directory = directory, spec.version = version,
-    spec.release = release;
-    kxlsim::addInstance(world, spec);
+    kxlsim::InstanceRecord entry;
+    entry.name = name, entry.copy = copy, entry.directory = directory, entry.version = version,
+    entry.release = release;
+    kxlsim::addInstance(world, entry);
     ASSERT_TRUE(world.ok());
   }
 

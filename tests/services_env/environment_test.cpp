@@ -38,7 +38,7 @@ struct ImageCase {
   uint16_t nodeType;
   bool clientAndJava;       // the copy has the client component and a Java kit
   uint32_t workstationFlag; // 1: the workstation setting is asked for
-  const char *spec;         // the new file's fields; null: the file is the template
+  const char *wanted;       // the new file's fields; null: the file is the template
   const char *fault = nullptr;
 };
 
@@ -61,10 +61,10 @@ TEST_P(ImageTest, TemplateTunedToTheMachine) {
   EXPECT_EQ(kCurrentCopy, getString(instanceKey(kInstance), "Copy"));
   EXPECT_EQ(kInstance, environmentValue("KXLINSTANCE"));
   EXPECT_EQ(kProfilePath, environmentValue("KXLINSTPROF"));
-  if (c.spec == nullptr)
+  if (c.wanted == nullptr)
     EXPECT_EQ(validImage(c.nodeType, 0x22), newConfig());
   else
-    expectConfig(c.spec);
+    expectConfig(c.wanted);
   // Without a partition record no partition is set up.
   EXPECT_FALSE(pathExists(std::string(kInstanceDir) + "\\kxlnodes.cfg"));
 }

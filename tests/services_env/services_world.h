@@ -63,11 +63,11 @@ protected:
   }
 
   // The instance's configuration file: whole, sealed, and with the fields
-  // `spec` names (see dbmtest::fieldsAt).
-  static void expectConfig(const std::string &spec) {
+  // `wanted` names (see dbmtest::fieldsAt).
+  static void expectConfig(const std::string &wanted) {
     Bytes image = newConfig();
     ASSERT_EQ(dbmtest::kFull, image.size());
-    EXPECT_EQ(spec, dbmtest::fieldsAt(image, spec));
+    EXPECT_EQ(wanted, dbmtest::fieldsAt(image, wanted));
     EXPECT_EQ(dbmtest::r32(image, 0), dbmtest::byteSum(image)) << "checksum";
   }
 
